@@ -1,0 +1,74 @@
+#include "backupset/ManifestWatcher.h"
+
+#include <wx/log.h>
+
+#include "backupset/StoredManifest.h"
+#include "core/Boundary.h"
+#include "core/InstallPaths.h"
+#include "statedb/Database.h"
+
+namespace tavi {
+namespace {
+
+constexpr std::uint32_t kNapMilliseconds = 500;
+constexpr int kNapsPerCycle = 10;
+constexpr std::uint32_t kCyclesPerExclusionBuild = 18;
+
+// A null result, from an invalid text, leaves the manifest in force where it is: its readers lose nothing by a text that the
+// service is about to replace.
+void publish(WatcherState& state, const Manifest* manifest)
+{
+    if (!manifest)
+        return;
+    manifest->AddRef();
+    state.manifest.replace(manifest);
+}
+
+} // namespace
+
+const Manifest* loadStoredManifest()
+{
+    try {
+        DbConnection database;
+        database.open(GetDataFilePath(kStateDatabase));
+        DbQuery rows = database.execQuery("SELECT contents FROM manifest LIMIT 1");
+        if (rows.nextRow()) {
+            const char* blob = nullptr;
+            const int length = rows.fieldText(0, blob);
+            if (length > 0)
+                return parseStoredManifest(blob, static_cast<std::size_t>(length));
+        }
+    } catch (const DbException& error) {
+        wxLogWarning("Failed to retrieve stored manifest (%d: %s)", error.code(), error.message());
+    }
+    return Manifest::Parse(wxString());
+}
+
+void RunManifestWatcher(WatcherState& state, WatcherServices& services)
+{
+    const auto stopping = [&] { return state.stopFlag.load() != 0; };
+    std::int64_t lastLoad = 0;
+    const auto load = [&] {
+        guarded("manifest load", [&] { publish(state, services.loadManifest()); });
+        lastLoad = services.now();
+    };
+
+    guarded("exclusion build", [&] { services.buildExclusions(true); });
+    load();
+    for (std::uint32_t cycles = 0; !stopping();) {
+        for (int naps = 0; naps < kNapsPerCycle; ++naps) {
+            if (stopping())
+                return;
+            services.sleep(kNapMilliseconds);
+        }
+        if (stopping())
+            return;
+        std::int64_t changed = 0;
+        if (services.manifestTime(changed) && changed > lastLoad)
+            load();
+        if (++cycles % kCyclesPerExclusionBuild == 0)
+            guarded("exclusion build", [&] { services.buildExclusions(false); });
+    }
+}
+
+} // namespace tavi

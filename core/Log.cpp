@@ -1,0 +1,102 @@
+#include "core/Log.h"
+
+#include <cstdio>
+#include <memory>
+#include <mutex>
+
+#include <windows.h>
+#include <wx/log.h>
+
+#include "core/InstallPaths.h"
+
+namespace tavi {
+namespace {
+
+constexpr int kInstallReads = 31;
+constexpr DWORD kInstallReadInterval = 1000;
+constexpr std::size_t kLongestMessage = 4095;
+// Above the longest line in bytes, so that each line is one write and processes that share the file do not tear it.
+constexpr std::size_t kFileBuffer = 32768;
+
+std::mutex silencerLock;
+int silencers = 0;
+bool loggingBefore = true;
+
+wxLog* previousTarget = nullptr;
+bool targetInstalled = false;
+
+class FileLogTarget : public wxLogStderr {
+  public:
+    explicit FileLogTarget(std::FILE* file) : wxLogStderr(file), file_(file)
+    {
+    }
+    FileLogTarget(const FileLogTarget&) = delete;
+    FileLogTarget& operator=(const FileLogTarget&) = delete;
+    ~FileLogTarget() override
+    {
+        if (file_ && file_ != stderr)
+            std::fclose(file_);
+    }
+
+  protected:
+    void DoLogRecord(wxLogLevel level, const wxString& message, const wxLogRecordInfo& info) override
+    {
+        const std::lock_guard<std::mutex> hold(lock_);
+        wxLogStderr::DoLogRecord(level, message.length() > kLongestMessage ? message.Left(kLongestMessage) : message,
+                                 info);
+    }
+
+  private:
+    std::FILE* file_;
+    std::mutex lock_;
+};
+
+} // namespace
+
+bool OpenLog(unsigned long level)
+{
+    // The host may be up before the service has been installed; the wait inside process attach is deliberate.
+    for (int reads = 1; GetDataFilePath(kDataDirectory).empty(); ++reads) {
+        if (reads == kInstallReads)
+            return false;
+        Sleep(kInstallReadInterval);
+    }
+    const wxString path = GetDataFilePath(kLogFile);
+    if (std::FILE* file = _wfopen(path.wc_str(), L"a")) {
+        std::setvbuf(file, nullptr, _IOFBF, kFileBuffer);
+        wxLog* const before = wxLog::SetActiveTarget(new FileLogTarget(file));
+        if (!targetInstalled)
+            previousTarget = before;
+        targetInstalled = true;
+    } else {
+        wxLogError("Unable to open logfile %s", path);
+    }
+    wxLog::SetLogLevel(level);
+    wxLog::SetTimestamp("%d%b%Y %H:%M:%S");
+    return true;
+}
+
+void CloseLog() noexcept
+{
+    if (!targetInstalled)
+        return;
+    targetInstalled = false;
+    std::unique_ptr<wxLog> ours(wxLog::SetActiveTarget(previousTarget));
+}
+
+LogSilencer::LogSilencer()
+{
+    // The library's flag is one for the process: two plain save-and-restore pairs that overlap could leave it off for good.
+    const std::lock_guard<std::mutex> hold(silencerLock);
+    if (silencers++ == 0)
+        loggingBefore = wxLog::EnableLogging(false);
+}
+
+LogSilencer::~LogSilencer()
+{
+    const std::lock_guard<std::mutex> hold(silencerLock);
+    if (--silencers == 0)
+        wxLog::EnableLogging(loggingBefore);
+}
+
+} // namespace tavi

@@ -1,0 +1,90 @@
+#include "core/Module.h"
+
+#include <memory>
+#include <utility>
+
+#include <shlobj.h>
+
+#include "core/Boundary.h"
+#include "core/Handles.h"
+
+namespace tavi {
+namespace {
+
+std::atomic<HINSTANCE> theInstance{nullptr};
+std::atomic<IMalloc*> theAllocator{nullptr};
+std::atomic<std::int32_t> theRefCount{0};
+
+struct ThreadStart {
+    ThreadBody body;
+    void* argument;
+    // The mapping that the thread runs in; null in a program that is not loaded and freed as a module.
+    HMODULE mapping;
+};
+
+DWORD WINAPI runModuleThread(void* parameter)
+{
+    ThreadStart start{};
+    guarded("module thread", [&] {
+        std::unique_ptr<ThreadStart> owned(static_cast<ThreadStart*>(parameter));
+        start = *owned;
+        owned.reset();
+        start.body(start.argument);
+    });
+    // A plain return would run through code that this very release may unmap.
+    FreeLibraryAndExitThread(start.mapping, 0);
+}
+
+} // namespace
+
+HINSTANCE moduleInstance() noexcept
+{
+    return theInstance;
+}
+
+void setModuleInstance(HINSTANCE instance) noexcept
+{
+    theInstance = instance;
+}
+
+IMalloc* shellAllocator() noexcept
+{
+    return theAllocator;
+}
+
+void acquireShellAllocator() noexcept
+{
+    IMalloc* allocator = nullptr;
+    if (SUCCEEDED(SHGetMalloc(&allocator)))
+        theAllocator = allocator;
+}
+
+void releaseShellAllocator() noexcept
+{
+    if (IMalloc* allocator = theAllocator.exchange(nullptr))
+        allocator->Release();
+}
+
+std::atomic<std::int32_t>& moduleRefCount() noexcept
+{
+    return theRefCount;
+}
+
+HANDLE startModuleThread(ThreadBody body, void* argument, bool suspended) noexcept
+{
+    return guarded("thread start", static_cast<HANDLE>(nullptr), [&]() -> HANDLE {
+        auto start = std::make_unique<ThreadStart>(ThreadStart{body, argument, nullptr});
+        if (!GetModuleHandleExW(GET_MODULE_HANDLE_EX_FLAG_FROM_ADDRESS,
+                                reinterpret_cast<const wchar_t*>(&runModuleThread), &start->mapping))
+            return nullptr;
+        const HMODULE mapping = start->mapping;
+        HANDLE thread = CreateThread(nullptr, 0, runModuleThread, start.get(), suspended ? CREATE_SUSPENDED : 0, nullptr);
+        if (thread)
+            static_cast<void>(start.release());
+        else
+            FreeLibrary(mapping);
+        return thread;
+    });
+}
+
+} // namespace tavi

@@ -1,0 +1,43 @@
+#include <windows.h>
+#include <objbase.h>
+
+#include "core/Boundary.h"
+#include "core/Handles.h"
+#include "core/Module.h"
+#include "shell/ClassFactory.h"
+#include "shell/Lifecycle.h"
+#include "shell/Registration.h"
+
+using namespace tavi;
+
+STDAPI DllGetClassObject(REFCLSID classId, REFIID interfaceId, void** object)
+{
+    return guarded("DllGetClassObject", E_FAIL, [&]() -> HRESULT {
+        if (!object)
+            return E_POINTER;
+        *object = nullptr;
+        const ComPtr<IClassFactory> factory(makeClassFactory(classId));
+        return factory ? factory->QueryInterface(interfaceId, object) : CLASS_E_CLASSNOTAVAILABLE;
+    });
+}
+
+STDAPI DllCanUnloadNow()
+{
+    return guarded("DllCanUnloadNow", S_FALSE, []() -> HRESULT {
+        if (moduleRefCount() != 0)
+            return S_FALSE;
+        requestThreadsStop();
+        return S_OK;
+    });
+}
+
+// Both return raw system error codes, not results: registration tools show them as they are.
+STDAPI DllRegisterServer()
+{
+    return guarded("DllRegisterServer", E_FAIL, [] { return static_cast<HRESULT>(registerServer()); });
+}
+
+STDAPI DllUnregisterServer()
+{
+    return guarded("DllUnregisterServer", E_FAIL, [] { return static_cast<HRESULT>(unregisterServer()); });
+}

@@ -1,0 +1,28 @@
+#pragma once
+
+#include <windows.h>
+
+#include "core/Module.h"
+
+// The module's start and end in a host process. Called under the loader lock, which is why each of these does no more than it must.
+namespace tavi {
+
+enum class HostKind { refused, toolOnly, fileManager };
+
+// By the host's executable name; a prefix comparison, so that "explorer.exe.old" passes as well.
+HostKind hostKindOf(const wchar_t* executablePath) noexcept;
+
+void attachToFileManager(HINSTANCE instance, const wchar_t* hostPath);
+void detachFromFileManager();
+
+// The status listener's thread. The body is set before attach by whoever implements it; without one no thread starts.
+void setStatusListener(ThreadBody body) noexcept;
+bool statusStopRequested() noexcept;
+void StartStatusThread() noexcept;
+// Gives the thread half a second, then terminates it.
+void StopStatusThread() noexcept;
+
+// Asks both background threads to end, without waiting.
+void requestThreadsStop() noexcept;
+
+} // namespace tavi

@@ -1,0 +1,64 @@
+#include "shell/Lifecycle.h"
+
+#include <gtest/gtest.h>
+
+#include "core/Handles.h"
+
+namespace tavi {
+namespace {
+
+TEST(Lifecycle, TheGateComparesTheBeginningOfTheName)
+{
+    const struct {
+        const wchar_t* path;
+        HostKind kind;
+    } cases[] = {{L"C:\\Windows\\explorer.exe", HostKind::fileManager},
+                 {L"EXPLORER.EXE", HostKind::fileManager},
+                 {L"D:\\x\\explorer.exe.old", HostKind::fileManager},
+                 {L"C:\\explorer.exe\\other.exe", HostKind::refused},
+                 {L"C:\\windows\\regsvr32.exe", HostKind::toolOnly},
+                 {L"C:\\VerClsid.exe", HostKind::toolOnly},
+                 {L"C:\\t\\_regdll.TMP", HostKind::toolOnly},
+                 {L"C:\\t\\_RegDLL.tm", HostKind::refused},
+                 {L"C:\\windows\\rundll32.exe", HostKind::refused},
+                 {L"C:\\", HostKind::refused},
+                 {L"", HostKind::refused}};
+    for (const auto& test : cases)
+        EXPECT_EQ(hostKindOf(test.path), test.kind) << test.path;
+
+    wchar_t path[MAX_PATH];
+    GetModuleFileNameW(nullptr, path, MAX_PATH);
+    const std::wstring exe(path);
+    EXPECT_EQ(LoadLibraryW((exe.substr(0, exe.rfind(L"\\tests\\")) + L"\\tavishell.dll").c_str()), nullptr);
+    EXPECT_EQ(GetLastError(), DWORD{ERROR_DLL_INIT_FAILED});
+}
+
+TEST(Lifecycle, AStatusThreadGetsHalfASecond)
+{
+    const struct {
+        ThreadBody body;
+        DWORD atLeast, atMost;
+    } cases[] = {{nullptr, 0, 100},
+                 {[](void*) {
+                      while (!statusStopRequested())
+                          Sleep(10);
+                  },
+                  0, 400},
+                 {[](void*) { Sleep(60000); }, 450, 2000}};
+    for (const auto& test : cases) {
+        setStatusListener(test.body);
+        StartStatusThread();
+        Sleep(50);
+        const DWORD start = GetTickCount();
+        requestThreadsStop();
+        StopStatusThread();
+        const DWORD taken = GetTickCount() - start;
+        EXPECT_GE(taken, test.atLeast);
+        EXPECT_LE(taken, test.atMost);
+        StopStatusThread();
+    }
+    setStatusListener(nullptr);
+}
+
+} // namespace
+} // namespace tavi

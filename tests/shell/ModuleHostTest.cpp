@@ -1,0 +1,340 @@
+// Runs as explorer.exe: the module is loaded, used and freed as the file manager does it.
+#include <fstream>
+#include <map>
+#include <thread>
+
+#include <windows.h>
+#include <shlobj.h>
+#include <sqlite3.h>
+#include <tlhelp32.h>
+
+#include <gtest/gtest.h>
+
+#include "core/Handles.h"
+#include "core/Text.h"
+#include "shell/ClassIds.h"
+#include "tests/support/Registry.h"
+
+namespace tavi {
+namespace {
+
+std::wstring modulePath()
+{
+    wchar_t path[MAX_PATH];
+    GetModuleFileNameW(nullptr, path, MAX_PATH);
+    const std::wstring exe(path);
+    return exe.substr(0, exe.rfind(L"\\tests\\")) + L"\\tavishell.dll";
+}
+
+void runSql(const std::wstring& path, const char* sql)
+{
+    sqlite3* database = nullptr;
+    ASSERT_EQ(sqlite3_open(toUtf8(path).c_str(), &database), SQLITE_OK);
+    ASSERT_EQ(sqlite3_exec(database, sql, nullptr, nullptr, nullptr), SQLITE_OK);
+    sqlite3_close(database);
+}
+
+// The module, loaded for as long as it lives.
+class LoadedModule {
+  public:
+    LoadedModule() : module_(LoadLibraryW(modulePath().c_str()))
+    {
+        load(getClassObject_, "DllGetClassObject");
+        load(canUnloadNow_, "DllCanUnloadNow");
+    }
+    ~LoadedModule()
+    {
+        FreeLibrary(module_);
+    }
+    HRESULT classObject(REFCLSID classId, REFIID interfaceId, void** object)
+    {
+        return getClassObject_(classId, interfaceId, object);
+    }
+    HRESULT canUnload()
+    {
+        return canUnloadNow_();
+    }
+    ComPtr<IClassFactory> factory(REFCLSID classId)
+    {
+        ComPtr<IClassFactory> made;
+        EXPECT_EQ(classObject(classId, IID_IClassFactory, made.outVoid()), S_OK);
+        return made;
+    }
+
+  private:
+    template <class Function>
+    void load(Function& function, const char* name)
+    {
+        const FARPROC address = GetProcAddress(module_, name);
+        EXPECT_NE(address, nullptr) << name;
+        std::memcpy(&function, &address, sizeof(function));
+    }
+
+    HMODULE module_;
+    HRESULT(STDAPICALLTYPE* getClassObject_)(REFCLSID, REFIID, void**) = nullptr;
+    HRESULT(STDAPICALLTYPE* canUnloadNow_)() = nullptr;
+};
+
+bool moduleIsMapped()
+{
+    return GetModuleHandleW(L"tavishell.dll") != nullptr;
+}
+
+bool moduleGoesWithin(DWORD milliseconds)
+{
+    for (const DWORD start = GetTickCount(); GetTickCount() - start < milliseconds; Sleep(10)) {
+        if (!moduleIsMapped())
+            return true;
+    }
+    return false;
+}
+
+struct Counts {
+    DWORD handles = 0;
+    DWORD gdi = 0;
+    unsigned threads = 0;
+};
+
+Counts countNow()
+{
+    Counts counts;
+    GetProcessHandleCount(GetCurrentProcess(), &counts.handles);
+    counts.gdi = GetGuiResources(GetCurrentProcess(), GR_GDIOBJECTS);
+    const KernelHandle snapshot(CreateToolhelp32Snapshot(TH32CS_SNAPTHREAD, 0));
+    THREADENTRY32 entry{};
+    entry.dwSize = sizeof(entry);
+    for (BOOL more = Thread32First(snapshot.get(), &entry); more; more = Thread32Next(snapshot.get(), &entry))
+        counts.threads += entry.th32OwnerProcessID == GetCurrentProcessId();
+    --counts.handles; // the snapshot itself
+    return counts;
+}
+
+class ModuleHost : public testing::Test {
+  protected:
+    ModuleHost()
+    {
+        CoInitialize(nullptr);
+        runSql(service_.file(L"taviconf.dat"), "CREATE TABLE filesystem(state INTEGER, folder TEXT PRIMARY KEY)");
+        runSql(service_.file(L"tavistate.dat"), "CREATE TABLE manifest(contents BLOB);"
+                                                "CREATE TABLE file_states(filename TEXT, state INTEGER);"
+                                                "INSERT INTO file_states VALUES('C:\\in',1),('C:\\out',2)");
+    }
+    ~ModuleHost() override
+    {
+        moduleGoesWithin(3000); // the log file must be closed before its folder goes
+        CoUninitialize();
+    }
+    std::string log() const
+    {
+        std::ifstream file(toUtf8(service_.file(L"tavi.log")));
+        return {std::istreambuf_iterator<char>(file), {}};
+    }
+
+    test::InstalledService service_;
+};
+
+TEST_F(ModuleHost, AnswersAsAComServer)
+{
+    LoadedModule module;
+    void* object = &module;
+    EXPECT_EQ(module.classObject(IID_IContextMenu, IID_IClassFactory, &object), CLASS_E_CLASSNOTAVAILABLE);
+    EXPECT_EQ(object, nullptr);
+    EXPECT_EQ(module.classObject(kShellExtClassId, IID_IClassFactory, nullptr), E_POINTER);
+    EXPECT_EQ(module.classObject(kShellExtClassId, IID_IContextMenu, &object), E_NOINTERFACE);
+    EXPECT_EQ(module.canUnload(), S_OK); // the factory that was asked in vain is gone
+
+    const struct {
+        CLSID classId;
+        IID interfaceId;
+        HRESULT result;
+    } answers[] = {
+        {kShellExtClassId, IID_IUnknown, S_OK},
+        {kShellExtClassId, IID_IShellExtInit, S_OK},
+        {kShellExtClassId, IID_IContextMenu, S_OK},
+        {kShellExtClassId, IID_IShellPropSheetExt, E_NOINTERFACE}, // both tables exist and stay unreachable
+        {kShellExtClassId, IID_IShellIconOverlayIdentifier, E_NOINTERFACE},
+        {kStubFolderClassId, IID_IUnknown, S_OK},
+        {kStubFolderClassId, IID_IPersist, S_OK},
+        {kStubFolderClassId, IID_IPersistFolder, S_OK},
+        {kStubFolderClassId, IID_IPersistFolder2, S_OK},
+        {kStubFolderClassId, IID_IShellFolder, S_OK},
+        {kStubFolderClassId, IID_IShellFolder2, E_NOINTERFACE},
+    };
+    for (const auto& answer : answers) {
+        auto factory = module.factory(answer.classId);
+        ComPtr<IUnknown> made;
+        EXPECT_EQ(factory->CreateInstance(nullptr, answer.interfaceId, made.outVoid()), answer.result);
+        EXPECT_EQ(static_cast<bool>(made), answer.result == S_OK);
+        EXPECT_EQ(factory->CreateInstance(factory.get(), answer.interfaceId, made.outVoid()), CLASS_E_NOAGGREGATION);
+        EXPECT_EQ(factory->LockServer(TRUE), S_OK);
+        EXPECT_EQ(module.canUnload(), S_FALSE);
+    }
+    EXPECT_EQ(module.canUnload(), S_OK);
+}
+
+TEST_F(ModuleHost, CarriesTheOverlayTableBehindTheOthers)
+{
+    LoadedModule module;
+    ComPtr<IUnknown> object;
+    ASSERT_EQ(module.factory(kShellExtClassId)->CreateInstance(nullptr, IID_IUnknown, object.outVoid()), S_OK);
+    auto** const tables = reinterpret_cast<void**>(object.get());
+    ComPtr<IContextMenu> menu;
+    object->QueryInterface(IID_IContextMenu, menu.outVoid());
+    EXPECT_EQ(static_cast<void*>(menu.get()), tables + 2);
+
+    auto* const sheet = reinterpret_cast<IShellPropSheetExt*>(tables);
+    EXPECT_EQ(sheet->ReplacePage(0, nullptr, 0), E_FAIL);
+    auto* const overlay = reinterpret_cast<IShellIconOverlayIdentifier*>(tables + 3);
+    EXPECT_EQ(overlay->IsMemberOf(L"C:\\in", 0), S_OK);
+    EXPECT_EQ(overlay->IsMemberOf(L"C:\\out", 0), S_FALSE);
+    EXPECT_EQ(overlay->IsMemberOf(L"C:\\unknown", 0), S_FALSE);
+    EXPECT_EQ(overlay->IsMemberOf(nullptr, 0), S_FALSE);
+    int number = 0;
+    DWORD flags = 0;
+    wchar_t file[MAX_PATH];
+    EXPECT_EQ(overlay->GetPriority(&number), S_OK);
+    EXPECT_EQ(number, 99);
+    EXPECT_EQ(overlay->GetOverlayInfo(file, 10, &number, &flags), HRESULT(0x8007007A));
+    EXPECT_EQ(overlay->GetOverlayInfo(file, -1, &number, &flags), E_INVALIDARG);
+    EXPECT_EQ(overlay->GetOverlayInfo(file, MAX_PATH, &number, &flags), S_OK);
+    EXPECT_EQ(number, 3);
+    EXPECT_EQ(flags, 3u);
+    EXPECT_EQ(_wcsicmp(file, modulePath().c_str()), 0);
+    HICON icon = nullptr;
+    EXPECT_EQ(ExtractIconExW(file, number, &icon, nullptr, 1), 1u);
+    DestroyIcon(icon);
+}
+
+TEST_F(ModuleHost, ServesTheStubFolder)
+{
+    LoadedModule module;
+    ComPtr<IPersistFolder> persist;
+    ASSERT_EQ(module.factory(kStubFolderClassId)->CreateInstance(nullptr, IID_IPersistFolder, persist.outVoid()), S_OK);
+    CLSID classId{};
+    EXPECT_EQ(persist->GetClassID(&classId), S_OK);
+    EXPECT_TRUE(IsEqualCLSID(classId, kStubFolderClassId));
+    const ITEMIDLIST empty{};
+    EXPECT_EQ(persist->Initialize(static_cast<PCIDLIST_ABSOLUTE>(&empty)), S_OK);
+    ComPtr<IShellFolder> folder;
+    persist->QueryInterface(IID_IShellFolder, folder.outVoid());
+    wchar_t name[] = L"anything";
+    PIDLIST_RELATIVE items = nullptr;
+    ULONG eaten = 9, attributes = ~0ul;
+    ASSERT_EQ(folder->ParseDisplayName(nullptr, nullptr, name, &eaten, &items, &attributes), S_OK);
+    EXPECT_EQ(items->mkid.cb, 0);
+    EXPECT_EQ(eaten, 0u);
+    EXPECT_EQ(attributes, 0x01C43E88u);
+    CoTaskMemFree(items);
+    EXPECT_EQ(folder->GetAttributesOf(0, nullptr, &attributes), E_FAIL);
+}
+
+TEST_F(ModuleHost, AnObjectThatCannotBeMadeLeavesNothingBehind)
+{
+    LoadedModule module;
+    {
+        auto factory = module.factory(kShellExtClassId);
+        for (const wchar_t* directory : {L"C:\\no such folder", service_.file(L"").c_str()}) {
+            service_.install().SetValue(L"ConfigPath", wxString(directory));
+            DeleteFileW(service_.file(L"taviconf.dat").c_str());
+            void* object = factory.get();
+            EXPECT_TRUE(FAILED(factory->CreateInstance(nullptr, IID_IUnknown, &object)));
+            EXPECT_EQ(object, nullptr);
+        }
+    }
+    EXPECT_EQ(module.canUnload(), S_OK);
+    EXPECT_NE(log().find("DB_CANTOPEN[14]"), std::string::npos) << log();
+}
+
+TEST_F(ModuleHost, TwentyRoundsOfLoadAndUnloadLeaveNothingBehind)
+{
+    Counts before;
+    constexpr int kRounds = 23, kWarmUp = 3;
+    for (int round = 0; round < kRounds; ++round) {
+        if (round == kWarmUp)
+            before = countNow();
+        {
+            LoadedModule module;
+            ComPtr<IShellExtInit> init;
+            ASSERT_EQ(module.factory(kShellExtClassId)->CreateInstance(nullptr, IID_IShellExtInit, init.outVoid()),
+                      S_OK);
+            ComPtr<IContextMenu> menu;
+            init->QueryInterface(IID_IContextMenu, menu.outVoid());
+            EXPECT_EQ(init->Initialize(nullptr, nullptr, nullptr), S_OK);
+            const HMENU popup = CreatePopupMenu();
+            EXPECT_EQ(menu->QueryContextMenu(popup, 0, 1, 9, 0), 0);
+            DestroyMenu(popup);
+            EXPECT_EQ(module.canUnload(), S_FALSE);
+            init = {};
+            menu = {};
+            EXPECT_EQ(module.canUnload(), S_OK);
+            // Freed at once, in rounds at different points of the watcher's way.
+            Sleep(static_cast<DWORD>(round % 5) * 30);
+        }
+        ASSERT_TRUE(moduleGoesWithin(5000)) << "round " << round;
+    }
+    const Counts after = countNow();
+    EXPECT_LE(after.handles, before.handles);
+    EXPECT_LE(after.gdi, before.gdi);
+    EXPECT_LE(after.threads, before.threads);
+}
+
+DWORD runRegistrationTool(const std::wstring& arguments)
+{
+    std::wstring command = L"C:\\windows\\system32\\regsvr32.exe /s " + arguments + L" \"" + modulePath() + L"\"";
+    STARTUPINFOW startup{};
+    startup.cb = sizeof(startup);
+    PROCESS_INFORMATION process{};
+    if (!CreateProcessW(nullptr, command.data(), nullptr, nullptr, FALSE, 0, nullptr, nullptr, &startup, &process))
+        return ~0u;
+    const KernelHandle owned(process.hProcess), thread(process.hThread);
+    WaitForSingleObject(process.hProcess, 30000);
+    DWORD code = ~0u;
+    GetExitCodeProcess(process.hProcess, &code);
+    return code;
+}
+
+TEST_F(ModuleHost, RegistersAndLeavesTheRequiredKeysBehind)
+{
+    const wxString classId = L"{5e0c31a7-8d42-4b19-a6f3-2c7d90e1b845}";
+    const std::map<wxString, wxString> defaults = {
+        {L"HKCR\\CLSID\\" + classId, L"Tavi Remote Backup Shell Extension"},
+        {L"HKCR\\CLSID\\" + classId + L"\\InProcServer32", modulePath()},
+        {L"HKCR\\AllFilesystemObjects\\shellex\\ContextMenuHandlers\\Tavi", classId},
+        {L"HKCR\\Drive\\shellex\\ContextMenuHandlers\\Tavi", classId},
+        {L"HKCR\\Directory\\shellex\\ContextMenuHandlers\\Tavi", classId},
+        {L"HKCR\\Directory\\Background\\shellex\\ContextMenuHandlers\\Tavi", classId},
+        {L"HKCR\\Folder\\shellex\\ContextMenuHandlers\\Tavi", classId},
+    };
+    wxRegKey approved(L"HKLM\\Software\\Microsoft\\Windows\\CurrentVersion\\Shell Extensions\\Approved");
+    approved.Create();
+    for (int again = 0; again < 2; ++again)
+        EXPECT_EQ(runRegistrationTool(L""), 0u);
+    for (const auto& [key, text] : defaults) {
+        wxString value;
+        EXPECT_TRUE(wxRegKey(key).QueryValue(wxString(), value)) << key;
+        EXPECT_TRUE(value.IsSameAs(text, false)) << key;
+    }
+    wxString value;
+    EXPECT_TRUE(wxRegKey(L"HKCR\\CLSID\\" + classId + L"\\InProcServer32").QueryValue(L"ThreadingModel", value));
+    EXPECT_EQ(value, L"Apartment");
+    EXPECT_TRUE(approved.HasValue(classId));
+
+    wxRegKey(L"HKCR\\CLSID\\" + classId + L"\\a\\b\\c").Create();
+    EXPECT_NE(runRegistrationTool(L"/u"), 0u);
+    for (const auto& [key, text] : defaults)
+        EXPECT_EQ(wxRegKey(key).Exists(), key.Find(L"CLSID") == wxNOT_FOUND) << key;
+    EXPECT_TRUE(approved.HasValue(classId));
+    EXPECT_FALSE(moduleIsMapped());
+
+    approved.DeleteSelf();
+    EXPECT_NE(runRegistrationTool(L""), 0u); // the list is opened, not created; everything before it is written
+    EXPECT_TRUE(wxRegKey(L"HKCR\\Folder\\shellex\\ContextMenuHandlers\\Tavi").Exists());
+    approved.Create();
+    for (const auto& [key, text] : defaults) {
+        if (wxRegKey(key).Exists())
+            wxRegKey(key).DeleteSelf();
+    }
+}
+
+} // namespace
+} // namespace tavi
