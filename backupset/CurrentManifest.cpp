@@ -101,7 +101,8 @@ void StopManifestWatcher() noexcept
 {
     requestWatcherStop();
     if (watcher.thread.load()) {
-        // The wait is for a start in progress, not for the thread, and the mutex stays taken: nothing may start after this.
+        // The wait is for a start in progress, not for the thread, and the mutex stays taken: nothing may start after
+        // this.
         WaitForSingleObject(manifestMutex.get(), INFINITE);
         closeWatcherHandle();
     }

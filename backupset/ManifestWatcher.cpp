@@ -14,8 +14,8 @@ constexpr std::uint32_t kNapMilliseconds = 500;
 constexpr int kNapsPerCycle = 10;
 constexpr std::uint32_t kCyclesPerExclusionBuild = 18;
 
-// A null result, from an invalid text, leaves the manifest in force where it is: its readers lose nothing by a text that the
-// service is about to replace.
+// A null result, from an invalid text, leaves the manifest in force where it is: its readers lose nothing by a text
+// that the service is about to replace.
 void publish(WatcherState& state, const Manifest* manifest)
 {
     if (!manifest)

@@ -31,10 +31,12 @@ class WatcherServices {
     virtual void buildExclusions(bool firstLoad) = 0;
 };
 
-// Loads the manifest and keeps it current until the stop flag is set; what fails in one round is logged and the next goes on.
+// Loads the manifest and keeps it current until the stop flag is set; what fails in one round is logged and the next
+// goes on.
 void RunManifestWatcher(WatcherState& state, WatcherServices& services);
 
-// The stored manifest, parsed: an empty one when there is none or the database fails, which is logged; null for an invalid text.
+// The stored manifest, parsed: an empty one when there is none or the database fails, which is logged; null for an
+// invalid text.
 const Manifest* loadStoredManifest();
 
 } // namespace tavi

@@ -19,13 +19,13 @@ target_link_libraries(tavi_platform INTERFACE ${TAVI_DEPS}/lib/libsqlite3.a ${TA
 
 file(GLOB room_sources CONFIGURE_DEPENDS core/*.cpp statedb/*.cpp backupset/*.cpp link/*.cpp ui/*.cpp shell/*.cpp)
 # The module itself is thin: the process entry, the exports and the resources.
-list(REMOVE_ITEM room_sources ${CMAKE_SOURCE_DIR}/shell/DllMain.cpp)
+list(REMOVE_ITEM room_sources ${CMAKE_SOURCE_DIR}/shell/DllMain.cpp ${CMAKE_SOURCE_DIR}/shell/Exports.cpp)
 add_library(tavi_rooms STATIC ${room_sources})
 target_link_libraries(tavi_rooms PUBLIC tavi_platform PRIVATE tavi_warnings)
 
 include(cmake/resources.cmake)
 
-add_library(tavishell SHARED shell/DllMain.cpp shell/tavishell.def ui/tavishell.rc)
+add_library(tavishell SHARED shell/DllMain.cpp shell/Exports.cpp shell/tavishell.def ui/tavishell.rc)
 set_target_properties(tavishell PROPERTIES PREFIX "" LINK_FLAGS_RELEASE "-s")
 set_property(SOURCE ui/tavishell.rc APPEND PROPERTY OBJECT_DEPENDS "${resource_files}")
 target_include_directories(tavishell PRIVATE ${resource_folder})

@@ -4,7 +4,8 @@ find_program(ICOTOOL icotool REQUIRED)
 
 set(resource_folder ${CMAKE_BINARY_DIR}/resources)
 set(resource_files ${CMAKE_SOURCE_DIR}/ui/module.manifest ${CMAKE_SOURCE_DIR}/ui/resource.h)
-set(icon_sizes 16 20 24 32 40 48 64 128 256)
+# 13, 15 and 19 are check-mark sizes of menus.
+set(icon_sizes 13 15 16 19 20 24 32 40 48 64 128 256)
 file(MAKE_DIRECTORY ${resource_folder})
 file(GLOB icon_sources CONFIGURE_DEPENDS ui/icons/*.svg)
 foreach(source IN LISTS icon_sources)
@@ -23,8 +24,11 @@ foreach(source IN LISTS icon_sources)
         endif()
         set(png ${resource_folder}/${name}-${size}.png)
         list(APPEND render COMMAND ${RSVG_CONVERT} -w ${size} -h ${size} ${from} -o ${png})
-        if(NOT size EQUAL 256)
+        # The large ones stay compressed.
+        if(size LESS 128)
             list(APPEND pngs ${png})
+        else()
+            list(APPEND pngs --raw=${png})
         endif()
     endforeach()
     set(icon ${resource_folder}/${name}.ico)
@@ -33,7 +37,7 @@ foreach(source IN LISTS icon_sources)
         list(APPEND depends ${small_source})
     endif()
     add_custom_command(OUTPUT ${icon} ${render}
-        COMMAND ${ICOTOOL} -c -o ${icon} ${pngs} --raw=${resource_folder}/${name}-256.png
+        COMMAND ${ICOTOOL} -c -o ${icon} ${pngs}
         DEPENDS ${depends} VERBATIM)
     list(APPEND resource_files ${icon})
 endforeach()

@@ -21,9 +21,9 @@ struct Replacement {
 const Replacement kTimePictures[] = {{L"HH", L"%H"}, {L"H", L"%H"},  {L"%%H", L"%H"}, {L"hh", L"%I"},
                                      {L"h", L"%I"},  {L"mm", L"%M"}, {L"m", L"%M"},   {L"ss", L"%S"},
                                      {L"s", L"%S"},  {L"tt", L"%p"}, {L"t", L"%p"}};
-const Replacement kDatePictures[] = {{L"yyyy", L"%Y"}, {L"yy", L"%y"},   {L"MMMM", L"%B"}, {L"MMM", L"%b"},
-                                     {L"MM", L"%m"},   {L"M", L"%m"},    {L"dddd", L"%A"}, {L"ddd", L"%a"},
-                                     {L"dd", L"%d"},   {L"d", L"%d"},    {L"%%d", L"%d"}};
+const Replacement kDatePictures[] = {{L"yyyy", L"%Y"}, {L"yy", L"%y"}, {L"MMMM", L"%B"}, {L"MMM", L"%b"},
+                                     {L"MM", L"%m"},   {L"M", L"%m"},  {L"dddd", L"%A"}, {L"ddd", L"%a"},
+                                     {L"dd", L"%d"},   {L"d", L"%d"},  {L"%%d", L"%d"}};
 
 template <std::size_t N>
 void replaceAll(wxString& text, const Replacement (&table)[N])

@@ -5,7 +5,8 @@
 #include <windows.h>
 #include <objbase.h>
 
-// One owning type per kind of system handle. Each frees what it holds when it goes, and nothing else; none is shared between threads.
+// One owning type per kind of system handle. Each frees what it holds when it goes, and nothing else; none is shared
+// between threads.
 namespace tavi {
 
 template <class Traits>
@@ -14,12 +15,8 @@ class UniqueHandle {
     using Handle = typename Traits::Handle;
 
     UniqueHandle() noexcept = default;
-    explicit UniqueHandle(Handle handle) noexcept : handle_(handle)
-    {
-    }
-    UniqueHandle(UniqueHandle&& other) noexcept : handle_(other.release())
-    {
-    }
+    explicit UniqueHandle(Handle handle) noexcept : handle_(handle) {}
+    UniqueHandle(UniqueHandle&& other) noexcept : handle_(other.release()) {}
     UniqueHandle& operator=(UniqueHandle&& other) noexcept
     {
         reset(other.release());
@@ -132,17 +129,13 @@ class ComPtr {
   public:
     ComPtr() noexcept = default;
     // Adopts the caller's reference.
-    explicit ComPtr(Interface* object) noexcept : object_(object)
-    {
-    }
+    explicit ComPtr(Interface* object) noexcept : object_(object) {}
     ComPtr(const ComPtr& other) noexcept : object_(other.object_)
     {
         if (object_)
             object_->AddRef();
     }
-    ComPtr(ComPtr&& other) noexcept : object_(std::exchange(other.object_, nullptr))
-    {
-    }
+    ComPtr(ComPtr&& other) noexcept : object_(std::exchange(other.object_, nullptr)) {}
     ComPtr& operator=(ComPtr other) noexcept
     {
         std::swap(object_, other.object_);

@@ -9,7 +9,7 @@ namespace tavi {
 namespace {
 
 const wchar_t* const kConfigFiles[] = {L"\\taviconf.dat", L"\\tavikey.dat"};
-const wchar_t* const kDataFiles[] = {L"\\tavistate.dat",   L"\\tavi.log",      L"\\tavilog.dat", L"\\changes.dat",
+const wchar_t* const kDataFiles[] = {L"\\tavistate.dat",  L"\\tavi.log",      L"\\tavilog.dat", L"\\changes.dat",
                                      L"\\filter_raw.log", L"\\tavicache.dat", L"\\tavimap.dat", L""};
 
 template <std::size_t N>

@@ -20,8 +20,8 @@ enum DataFile {
     kDataDirectory = 7,
 };
 
-// Full path of a service file. With the directory value missing it is the bare file name; empty for a selector not listed
-// above. Ask for kDataDirectory to learn whether the directory is known.
+// Full path of a service file. With the directory value missing it is the bare file name; empty for a selector not
+// listed above. Ask for kDataDirectory to learn whether the directory is known.
 wxString GetConfigFilePath(int selector);
 wxString GetDataFilePath(int selector);
 

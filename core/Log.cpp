@@ -27,9 +27,7 @@ bool targetInstalled = false;
 
 class FileLogTarget : public wxLogStderr {
   public:
-    explicit FileLogTarget(std::FILE* file) : wxLogStderr(file), file_(file)
-    {
-    }
+    explicit FileLogTarget(std::FILE* file) : wxLogStderr(file), file_(file) {}
     FileLogTarget(const FileLogTarget&) = delete;
     FileLogTarget& operator=(const FileLogTarget&) = delete;
     ~FileLogTarget() override
@@ -86,7 +84,8 @@ void CloseLog() noexcept
 
 LogSilencer::LogSilencer()
 {
-    // The library's flag is one for the process: two plain save-and-restore pairs that overlap could leave it off for good.
+    // The library's flag is one for the process: two plain save-and-restore pairs that overlap could leave it off for
+    // good.
     const std::lock_guard<std::mutex> hold(silencerLock);
     if (silencers++ == 0)
         loggingBefore = wxLog::EnableLogging(false);

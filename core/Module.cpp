@@ -78,7 +78,8 @@ HANDLE startModuleThread(ThreadBody body, void* argument, bool suspended) noexce
                                 reinterpret_cast<const wchar_t*>(&runModuleThread), &start->mapping))
             return nullptr;
         const HMODULE mapping = start->mapping;
-        HANDLE thread = CreateThread(nullptr, 0, runModuleThread, start.get(), suspended ? CREATE_SUSPENDED : 0, nullptr);
+        HANDLE thread =
+            CreateThread(nullptr, 0, runModuleThread, start.get(), suspended ? CREATE_SUSPENDED : 0, nullptr);
         if (thread)
             static_cast<void>(start.release());
         else

@@ -8,7 +8,8 @@
 
 namespace tavi {
 
-// The module's own instance, set at attach before any other use and never changed. Resources and the module path come from it.
+// The module's own instance, set at attach before any other use and never changed. Resources and the module path come
+// from it.
 HINSTANCE moduleInstance() noexcept;
 void setModuleInstance(HINSTANCE instance) noexcept;
 
@@ -38,8 +39,8 @@ class ModuleLock {
 using ThreadBody = void (*)(void* argument);
 
 // Starts a thread that keeps the module mapped until it has left the module's code; whatever the body throws is logged.
-// Returns the thread's handle, owned by the caller, or null when it could not start: then the argument stays the caller's.
-// `suspended` leaves it to the caller to resume the thread once the handle is stored.
+// Returns the thread's handle, owned by the caller, or null when it could not start: then the argument stays the
+// caller's. `suspended` leaves it to the caller to resume the thread once the handle is stored.
 HANDLE startModuleThread(ThreadBody body, void* argument, bool suspended = false) noexcept;
 
 } // namespace tavi

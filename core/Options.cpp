@@ -43,7 +43,8 @@ std::optional<std::int64_t> readManifestTime()
 std::optional<bool> readGraylistEnabled()
 {
     constexpr const wchar_t* name = L"options.graylist";
-    const auto number = readOption<long>(name, [&](wxRegKey& key, long& value) { return key.QueryValue(name, &value); });
+    const auto number =
+        readOption<long>(name, [&](wxRegKey& key, long& value) { return key.QueryValue(name, &value); });
     if (!number)
         return std::nullopt;
     return *number != 0;

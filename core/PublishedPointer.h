@@ -5,13 +5,14 @@
 
 namespace tavi {
 
-// One reference-counted object that any thread may take a reference to while another replaces it: a reader gets the old or the
-// new object whole, never waits, and never touches one that has been freed.
+// One reference-counted object that any thread may take a reference to while another replaces it: a reader gets the old
+// or the new object whole, never waits, and never touches one that has been freed.
 //
-// A plain pointer cannot do that: between reading it and counting up, the object may die. So the word holds the pointer and the
-// number of readers that are between those two steps. Who replaces the object adds that number to the object's own count before
-// dropping the word's reference; a reader that finds its pointer replaced gives back the reference it was given that way. It may
-// do so before it was given: a published object therefore holds a reserve of references until it has been replaced.
+// A plain pointer cannot do that: between reading it and counting up, the object may die. So the word holds the pointer
+// and the number of readers that are between those two steps. Who replaces the object adds that number to the object's
+// own count before dropping the word's reference; a reader that finds its pointer replaced gives back the reference it
+// was given that way. It may do so before it was given: a published object therefore holds a reserve of references
+// until it has been replaced.
 //
 // Object needs AddRef(), AddRefs(int) and Release(), all atomic. An object may be published once only.
 template <class Object>
@@ -45,7 +46,8 @@ class PublishedPointer {
         return taken;
     }
 
-    // Publishes `next`, whose caller's reference passes to the word, and drops the word's reference to the object before it.
+    // Publishes `next`, whose caller's reference passes to the word, and drops the word's reference to the object
+    // before it.
     void replace(Object* next) noexcept
     {
         if (next)

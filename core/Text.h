@@ -8,8 +8,8 @@
 // Conversions at the database and pipe edges. Pure functions, safe on any thread; they throw only std::bad_alloc.
 namespace tavi {
 
-// UTF-8 of a wide string. Where wchar_t is UTF-16, surrogate pairs become one four-byte sequence; a lone surrogate, which NTFS
-// allows in names, becomes its three-byte form so that distinct names stay distinct.
+// UTF-8 of a wide string. Where wchar_t is UTF-16, surrogate pairs become one four-byte sequence; a lone surrogate,
+// which NTFS allows in names, becomes its three-byte form so that distinct names stay distinct.
 std::string toUtf8(std::wstring_view text);
 
 // Appends to `out` instead of making a new string.

@@ -5,8 +5,8 @@
 
 namespace tavi {
 
-// A factory of one of the module's classes with one reference for the caller, or null for a class that the module lacks.
-// Throws std::bad_alloc.
+// A factory of one of the module's classes with one reference for the caller, or null for a class that the module
+// lacks. Throws std::bad_alloc.
 IClassFactory* makeClassFactory(REFCLSID classId);
 
 } // namespace tavi

@@ -12,7 +12,8 @@ extern "C" BOOL WINAPI DllMain(HINSTANCE instance, DWORD reason, LPVOID)
 {
     using namespace tavi;
     return guarded("DllMain", BOOL{TRUE}, [&]() -> BOOL {
-        // Thread notifications keep coming, since the static runtime brings thread-local storage: pass them before the gate.
+        // Thread notifications keep coming, since the static runtime brings thread-local storage: pass them before the
+        // gate.
         if (reason == DLL_THREAD_ATTACH || reason == DLL_THREAD_DETACH)
             return TRUE;
         // A longer path is cut, which leaves it without a terminator.

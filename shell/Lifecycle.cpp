@@ -85,7 +85,8 @@ void StopStatusThread() noexcept
     const HANDLE thread = std::exchange(statusThread, INVALID_HANDLE_VALUE);
     if (thread == INVALID_HANDLE_VALUE)
         return;
-    // The thread's own last reference may be what unloads the module: then this runs on it, and it must not wait for itself.
+    // The thread's own last reference may be what unloads the module: then this runs on it, and it must not wait for
+    // itself.
     if (GetThreadId(thread) != GetCurrentThreadId() &&
         WaitForSingleObject(thread, kStatusThreadPatience) != WAIT_OBJECT_0)
         TerminateThread(thread, 0);

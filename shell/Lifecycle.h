@@ -4,7 +4,8 @@
 
 #include "core/Module.h"
 
-// The module's start and end in a host process. Called under the loader lock, which is why each of these does no more than it must.
+// The module's start and end in a host process. Called under the loader lock, which is why each of these does no more
+// than it must.
 namespace tavi {
 
 enum class HostKind { refused, toolOnly, fileManager };

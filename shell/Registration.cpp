@@ -26,8 +26,8 @@ const wchar_t* const kHandlerKeys[] = {
     L"Folder\\shellex\\ContextMenuHandlers\\Tavi",
 };
 
-// Relative to the opened CLSID key, so that all but the first miss and the run ends with "not found" after the class key: the
-// handler keys stay behind. Required so; the README tells how to remove them.
+// Relative to the opened CLSID key, so that all but the first miss and the run ends with "not found" after the class
+// key: the handler keys stay behind. Required so; the README tells how to remove them.
 const wchar_t* const kKeysToDelete[] = {
     kClassId,
     L"AllFileSystemObjects\\shellex\\PropertySheetHandlers\\Tavi",
@@ -46,8 +46,8 @@ bool isNtFamily()
 
 LSTATUS setText(HKEY key, const wchar_t* valueName, const wchar_t* text)
 {
-    const auto bytes = static_cast<DWORD>((std::wcslen(text) + 1) * sizeof(wchar_t));
-    return RegSetValueExW(key, valueName, 0, REG_SZ, reinterpret_cast<const BYTE*>(text), bytes);
+    const std::size_t bytes = (std::wcslen(text) + 1) * sizeof(*text);
+    return RegSetValueExW(key, valueName, 0, REG_SZ, reinterpret_cast<const BYTE*>(text), static_cast<DWORD>(bytes));
 }
 
 LSTATUS createKey(HKEY parent, const wchar_t* name, RegistryKey& key)

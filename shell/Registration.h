@@ -2,7 +2,8 @@
 
 #include <windows.h>
 
-// The registry entries that make the file manager load the module. No message and no roll-back: a failing step ends the run.
+// The registry entries that make the file manager load the module. No message and no roll-back: a failing step ends the
+// run.
 namespace tavi {
 
 // 0, or the raw error of the first step that failed.

@@ -9,9 +9,9 @@
 
 namespace tavi {
 
-// The object that the file manager makes for a context menu. Used by the thread that made it only, so its count is plain.
-// It also carries a property-sheet and an icon-overlay table, to which QueryInterface leads nobody: both are required so.
-// The order of the bases is the order of the tables in the object.
+// The object that the file manager makes for a context menu. Used by the thread that made it only, so its count is
+// plain. It also carries a property-sheet and an icon-overlay table, to which QueryInterface leads nobody: both are
+// required so. The order of the bases is the order of the tables in the object.
 class ShellExt final : public IShellPropSheetExt,
                        public IShellExtInit,
                        public IContextMenu,

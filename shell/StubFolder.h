@@ -7,7 +7,8 @@
 
 namespace tavi {
 
-// A shell folder that parses any name to the empty item list and refuses everything else. Used by the thread that made it only.
+// A shell folder that parses any name to the empty item list and refuses everything else. Used by the thread that made
+// it only.
 class StubFolder final : public IPersistFolder, public IShellFolder {
   public:
     StubFolder() = default;

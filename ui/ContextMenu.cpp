@@ -85,8 +85,9 @@ HRESULT copyBounded(const std::basic_string<Char>& text, Char* buffer, UINT size
 std::string toAnsi(const std::wstring& text)
 {
     const int length = static_cast<int>(text.length());
-    std::string ansi(static_cast<std::size_t>(WideCharToMultiByte(CP_ACP, 0, text.data(), length, nullptr, 0, nullptr, nullptr)),
-                     '\0');
+    std::string ansi(
+        static_cast<std::size_t>(WideCharToMultiByte(CP_ACP, 0, text.data(), length, nullptr, 0, nullptr, nullptr)),
+        '\0');
     WideCharToMultiByte(CP_ACP, 0, text.data(), length, ansi.data(), static_cast<int>(ansi.length()), nullptr, nullptr);
     return ansi;
 }
@@ -101,9 +102,11 @@ void insertRestoreItem(HMENU menu, UINT position, UINT id, const wxString& label
 
 } // namespace
 
-UINT insertMenuItems(HMENU menu, UINT indexMenu, UINT idCmdFirst, UINT flags, const Selection& selection, UINT idCmdLast)
+UINT insertMenuItems(HMENU menu, UINT indexMenu, UINT idCmdFirst, UINT idCmdLast, UINT flags,
+                     const Selection& selection)
 {
-    // Starts the watcher; the reference is never given back, which the rest of the system counts on.
+    // Starts the watcher. The reference is kept for good, as required: a manifest that a menu was built from is never
+    // freed.
     static_cast<void>(GetCurrentManifest());
     if (flags & (CMF_DEFAULTONLY | CMF_NOVERBS))
         return 0;

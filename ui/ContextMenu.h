@@ -7,14 +7,14 @@
 
 #include "ui/Selection.h"
 
-// The shell object's menu operations on a captured selection. Each is called on the object's own thread; the caller is the
-// boundary for exceptions.
+// The shell object's menu operations on a captured selection. Each is called on the object's own thread; the caller is
+// the boundary for exceptions.
 namespace tavi {
 
-// Adds the separator and, when there is something to restore and room for an id, the restore command. Returns the number of ids
-// used.
-UINT insertMenuItems(HMENU menu, UINT indexMenu, UINT idCmdFirst, UINT flags, const Selection& selection,
-                     UINT idCmdLast = 0xFFFFFFFF);
+// Adds the separator and, when there is something to restore and room for an id, the restore command. Returns the
+// number of ids used.
+UINT insertMenuItems(HMENU menu, UINT indexMenu, UINT idCmdFirst, UINT idCmdLast, UINT flags,
+                     const Selection& selection);
 
 // The verb or help text of a command. `size` counts characters of the requested form.
 HRESULT commandString(UINT_PTR offset, UINT type, LPSTR buffer, UINT size, const Selection& selection);

@@ -11,8 +11,8 @@
 namespace tavi {
 namespace {
 
-// The map from id to bitmap, in the order of the ids. It only grows until it is emptied, so it needs no lock even when two of
-// the host's windows build their first menus at once.
+// The map from id to bitmap, in the order of the ids. It only grows until it is emptied, so it needs no lock even when
+// two of the host's windows build their first menus at once.
 struct CachedBitmap {
     UINT id;
     BitmapHandle bitmap;
@@ -56,9 +56,7 @@ HBITMAP storeBitmap(UINT id, BitmapHandle bitmap)
 
 class ScreenDc {
   public:
-    ScreenDc() noexcept : window_(GetDesktopWindow()), dc_(GetDC(window_))
-    {
-    }
+    ScreenDc() noexcept : window_(GetDesktopWindow()), dc_(GetDC(window_)) {}
     ~ScreenDc()
     {
         if (dc_)
@@ -78,9 +76,7 @@ class ScreenDc {
 
 class SelectionScope {
   public:
-    SelectionScope(HDC dc, HGDIOBJ object) noexcept : dc_(dc), previous_(SelectObject(dc, object))
-    {
-    }
+    SelectionScope(HDC dc, HGDIOBJ object) noexcept : dc_(dc), previous_(SelectObject(dc, object)) {}
     ~SelectionScope()
     {
         if (previous_)

@@ -183,7 +183,8 @@ std::int32_t summarizeStates(const PathSet& paths, FolderStateTable& states)
             const std::int32_t state = states.getFolderState(path);
             flags.add(state == 6 || state == 7);
         } catch (const DbException& error) {
-            // What failed here fails for the other items too, and each failure may have waited for the database's time-out.
+            // What failed here fails for the other items too, and each failure may have waited for the database's
+            // time-out.
             wxLogWarning("Failed to retrieve folder state (%d: %s)", error.code(), error.message());
             flags.add(false);
             break;

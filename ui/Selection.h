@@ -25,8 +25,8 @@ struct Selection {
     wxString displayName;
 };
 
-// Replaces the selection by the open folder and the data object's items, either of which may be null. What cannot be read is
-// left out.
+// Replaces the selection by the open folder and the data object's items, either of which may be null. What cannot be
+// read is left out.
 void captureSelection(LPCITEMIDLIST folder, IDataObject* data, FolderStateTable& states, Selection& selection);
 
 // The steps of the capture, for callers that bring their own surroundings.

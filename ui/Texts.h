@@ -4,7 +4,8 @@
 
 namespace tavi {
 
-// Puts a name in the place of the text's %s. Not formatting: a percent sign in a name or a slip in a translation stays text.
+// Puts a name in the place of the text's %s. Not formatting: a percent sign in a name or a slip in a translation stays
+// text.
 inline wxString withName(wxString text, const wxString& name)
 {
     const std::size_t place = text.find(L"%s");

@@ -1,7 +1,7 @@
 #pragma once
 
-// Resource numbers, shared with the resource compiler. The shell finds icons by their place in ascending order of these numbers:
-// the overlay badge must stay the fourth.
+// Resource numbers, shared with the resource compiler. The shell finds icons by their place in ascending order of these
+// numbers: the overlay badge must stay the fourth.
 #define TAVI_MANIFEST 2
 
 #define TAVI_ICON_RESTORE 130

@@ -10,15 +10,11 @@ TEST(DisplayFormat, Sizes)
     const struct {
         std::int64_t bytes;
         const wchar_t* text;
-    } cases[] = {{0, L"0 bytes"},
-                 {-1, L"-1 bytes"},
+    } cases[] = {{0, L"0 bytes"},         {-1, L"-1 bytes"},
                  {1024, L"1024 bytes"}, // a threshold stays in the smaller unit
-                 {1025, L"1.0 KB"},
-                 {1048576, L"1024.0 KB"},
-                 {1048577, L"1.0 MB"},
-                 {1073741824, L"1024.0 MB"},
-                 {1073741825, L"1.0 GB"},
-                 {5497558138880, L"5120.0 GB"}};
+                 {1025, L"1.0 KB"},       {1048576, L"1024.0 KB"},
+                 {1048577, L"1.0 MB"},    {1073741824, L"1024.0 MB"},
+                 {1073741825, L"1.0 GB"}, {5497558138880, L"5120.0 GB"}};
     for (const auto& test : cases)
         EXPECT_EQ(FormatSize(test.bytes), test.text);
 }
@@ -28,9 +24,9 @@ TEST(DisplayFormat, Rates)
     const struct {
         std::uint64_t amount;
         const wchar_t* text;
-    } cases[] = {{0, L"0.0 b/s"},           {1023, L"1023.0 b/s"},     {1024, L"1.0 Kb/s"},
-                 {1048575, L"1024.0 Kb/s"}, {1048576, L"1.0 Mb/s"},    {1073741824, L"1.0 Gb/s"},
-                 {~0ull, L"17179869184.0 Gb/s"}};
+    } cases[] = {
+        {0, L"0.0 b/s"},        {1023, L"1023.0 b/s"},     {1024, L"1.0 Kb/s"},           {1048575, L"1024.0 Kb/s"},
+        {1048576, L"1.0 Mb/s"}, {1073741824, L"1.0 Gb/s"}, {~0ull, L"17179869184.0 Gb/s"}};
     for (const auto& test : cases)
         EXPECT_EQ(FormatRate(test.amount), test.text);
 }

@@ -1,6 +1,7 @@
 #include "core/InstallPaths.h"
 
 #include <gtest/gtest.h>
+#include <wx/datetime.h>
 #include <wx/log.h>
 
 #include "core/Options.h"
@@ -15,10 +16,14 @@ TEST(InstallPaths, FollowTheRegistryAtEveryCall)
     test::InstalledService service;
     service.install().SetValue(L"ConfigPath", wxString(L"C:\\conf"));
     service.install().SetValue(L"DataPath", wxString(L"C:\\data"));
-    const wchar_t* const data[] = {L"C:\\data\\tavistate.dat",    L"C:\\data\\tavi.log",
-                                   L"C:\\data\\tavilog.dat",      L"C:\\data\\changes.dat",
-                                   L"C:\\data\\filter_raw.log",   L"C:\\data\\tavicache.dat",
-                                   L"C:\\data\\tavimap.dat",      L"C:\\data",
+    const wchar_t* const data[] = {L"C:\\data\\tavistate.dat",
+                                   L"C:\\data\\tavi.log",
+                                   L"C:\\data\\tavilog.dat",
+                                   L"C:\\data\\changes.dat",
+                                   L"C:\\data\\filter_raw.log",
+                                   L"C:\\data\\tavicache.dat",
+                                   L"C:\\data\\tavimap.dat",
+                                   L"C:\\data",
                                    L""};
     for (int selector = 0; selector < 9; ++selector)
         EXPECT_EQ(GetDataFilePath(selector), data[selector]);

@@ -57,7 +57,7 @@ Counted* made(unsigned value)
 TEST(PublishedPointer, SurvivesSwapsAtEveryInterleaving)
 {
     constexpr int kReaders = 4;
-    constexpr unsigned kSwaps = 40000;
+    constexpr unsigned kSwaps = 300000;
     {
         PublishedPointer<Counted> current;
         EXPECT_EQ(current.acquire(), nullptr);

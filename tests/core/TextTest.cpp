@@ -33,10 +33,8 @@ TEST(Text, ReplacesMalformedBytes)
         std::string utf8;
         std::wstring wide;
     } cases[] = {
-        {"\x80z", L"\xFFFDz"},
-        {"\xC1\x81", L"\xFFFD\xFFFD"},
-        {"\xE2\x82", L"\xFFFD\xFFFD"},
-        {"\xF4\x90\x80\x80", L"\xFFFD\xFFFD\xFFFD\xFFFD"},
+        {"\x80z", L"\xFFFDz"},         {"\xC1\x81", L"\xFFFD\xFFFD"},
+        {"\xE2\x82", L"\xFFFD\xFFFD"}, {"\xF4\x90\x80\x80", L"\xFFFD\xFFFD\xFFFD\xFFFD"},
         {"\xC3(", L"\xFFFD("},
     };
     for (const auto& test : cases)

@@ -1,9 +1,11 @@
 // Runs as explorer.exe: the module is loaded, used and freed as the file manager does it.
+#include <cstring>
 #include <fstream>
 #include <map>
 #include <thread>
 
 #include <windows.h>
+#include <shellapi.h>
 #include <shlobj.h>
 #include <sqlite3.h>
 #include <tlhelp32.h>
@@ -41,10 +43,17 @@ class LoadedModule {
     {
         load(getClassObject_, "DllGetClassObject");
         load(canUnloadNow_, "DllCanUnloadNow");
+        load(register_, "DllRegisterServer");
+        load(unregister_, "DllUnregisterServer");
     }
     ~LoadedModule()
     {
+        EXPECT_EQ(canUnload(), S_OK);
         FreeLibrary(module_);
+    }
+    HRESULT registration(bool add)
+    {
+        return add ? register_() : unregister_();
     }
     HRESULT classObject(REFCLSID classId, REFIID interfaceId, void** object)
     {
@@ -73,6 +82,8 @@ class LoadedModule {
     HMODULE module_;
     HRESULT(STDAPICALLTYPE* getClassObject_)(REFCLSID, REFIID, void**) = nullptr;
     HRESULT(STDAPICALLTYPE* canUnloadNow_)() = nullptr;
+    HRESULT(STDAPICALLTYPE* register_)() = nullptr;
+    HRESULT(STDAPICALLTYPE* unregister_)() = nullptr;
 };
 
 bool moduleIsMapped()
@@ -121,7 +132,7 @@ class ModuleHost : public testing::Test {
     }
     ~ModuleHost() override
     {
-        moduleGoesWithin(3000); // the log file must be closed before its folder goes
+        EXPECT_TRUE(moduleGoesWithin(5000)); // the log file must be closed before its folder goes
         CoUninitialize();
     }
     std::string log() const
@@ -320,14 +331,16 @@ TEST_F(ModuleHost, RegistersAndLeavesTheRequiredKeysBehind)
     EXPECT_TRUE(approved.HasValue(classId));
 
     wxRegKey(L"HKCR\\CLSID\\" + classId + L"\\a\\b\\c").Create();
-    EXPECT_NE(runRegistrationTool(L"/u"), 0u);
+    LoadedModule module;
+    EXPECT_EQ(module.registration(false), HRESULT{ERROR_FILE_NOT_FOUND});
+    EXPECT_EQ(module.registration(false), HRESULT{ERROR_FILE_NOT_FOUND});
     for (const auto& [key, text] : defaults)
         EXPECT_EQ(wxRegKey(key).Exists(), key.Find(L"CLSID") == wxNOT_FOUND) << key;
     EXPECT_TRUE(approved.HasValue(classId));
-    EXPECT_FALSE(moduleIsMapped());
 
     approved.DeleteSelf();
-    EXPECT_NE(runRegistrationTool(L""), 0u); // the list is opened, not created; everything before it is written
+    EXPECT_EQ(module.registration(true),
+              HRESULT{ERROR_FILE_NOT_FOUND}); // the list is opened, not created; everything before it is written
     EXPECT_TRUE(wxRegKey(L"HKCR\\Folder\\shellex\\ContextMenuHandlers\\Tavi").Exists());
     approved.Create();
     for (const auto& [key, text] : defaults) {

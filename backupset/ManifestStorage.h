@@ -1,0 +1,288 @@
+#pragma once
+
+#include <algorithm>
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+#include <memory>
+#include <new>
+#include <string_view>
+#include <type_traits>
+#include <vector>
+
+// The blocks that a manifest lives in. A million files must load into a 32-bit process that belongs to someone else,
+// whose address space is in pieces: nothing here grows by copying, no block is much above 1 MB, and no entry has a heap
+// block of its own.
+namespace tavi::storage {
+
+constexpr std::uint32_t hashBytes(std::uint32_t seed, std::string_view bytes) noexcept
+{
+    std::uint32_t hash = seed ^ static_cast<std::uint32_t>(bytes.size());
+    const auto mix = [&hash](std::uint32_t word) {
+        word *= 0xCC9E2D51u;
+        word = (word << 15) | (word >> 17);
+        hash ^= word * 0x1B873593u;
+        hash = ((hash << 13) | (hash >> 19)) * 5 + 0xE6546B64u;
+    };
+    const auto byteAt = [&bytes](std::size_t i) {
+        return static_cast<std::uint32_t>(static_cast<unsigned char>(bytes[i]));
+    };
+    std::size_t at = 0;
+    for (; at + 4 <= bytes.size(); at += 4)
+        mix(byteAt(at) | byteAt(at + 1) << 8 | byteAt(at + 2) << 16 | byteAt(at + 3) << 24);
+    for (; at < bytes.size(); ++at)
+        mix(byteAt(at));
+    hash = (hash ^ (hash >> 16)) * 0x85EBCA6Bu;
+    hash = (hash ^ (hash >> 13)) * 0xC2B2AE35u;
+    return hash ^ (hash >> 16);
+}
+
+// An array in blocks of 2^kLog elements. Elements are plain and start undefined.
+template <class Element, unsigned kLog>
+class BlockArray {
+    static_assert(std::is_trivially_copyable_v<Element>);
+    static constexpr std::size_t kBlock = std::size_t{1} << kLog;
+
+  public:
+    std::uint32_t size() const noexcept
+    {
+        return size_;
+    }
+    const Element& operator[](std::uint32_t i) const noexcept
+    {
+        return blocks_[i >> kLog][i & (kBlock - 1)];
+    }
+    Element& operator[](std::uint32_t i) noexcept
+    {
+        return blocks_[i >> kLog][i & (kBlock - 1)];
+    }
+    void push(const Element& element)
+    {
+        if ((size_ & (kBlock - 1)) == 0 && size_ >> kLog == blocks_.size())
+            addBlock(kBlock);
+        (*this)[size_] = element;
+        ++size_;
+    }
+    // Makes an empty array one of `size` elements that will not grow.
+    void allocate(std::uint32_t size)
+    {
+        for (std::size_t done = 0; done < size; done += kBlock)
+            addBlock(std::min<std::size_t>(kBlock, size - done));
+        size_ = size;
+    }
+    void fill(const Element& element)
+    {
+        for (std::uint32_t i = 0; i < size_; i += kBlock)
+            std::fill_n(blocks_[i >> kLog].get(), std::min<std::size_t>(kBlock, size_ - i), element);
+    }
+    void shrinkTo(std::uint32_t size) noexcept
+    {
+        size_ = std::min(size_, size);
+    }
+    std::size_t bytes() const noexcept
+    {
+        return bytes_;
+    }
+
+  private:
+    void addBlock(std::size_t elements)
+    {
+        blocks_.emplace_back(new Element[elements]);
+        bytes_ += elements * sizeof(Element);
+    }
+
+    std::vector<std::unique_ptr<Element[]>> blocks_;
+    std::uint32_t size_ = 0;
+    std::size_t bytes_ = 0;
+};
+
+// Byte strings named by a 32-bit reference: block number and offset.
+class ByteArena {
+  public:
+    using Ref = std::uint32_t;
+
+    Ref append(std::string_view bytes)
+    {
+        // The length stands in front, seven bits to a byte, lowest first.
+        char head[10];
+        std::size_t headSize = 0;
+        std::size_t rest = bytes.size();
+        for (; rest >= 0x80; rest >>= 7)
+            head[headSize++] = static_cast<char>(0x80 | (rest & 0x7F));
+        head[headSize++] = static_cast<char>(rest);
+
+        const std::size_t need = headSize + bytes.size();
+        if (need > kBlock)
+            return write(addBlock(need), 0, {head, headSize}, bytes);
+        if (blocks_.empty() || kBlock - used_ < need) {
+            current_ = addBlock(kBlock);
+            used_ = 0;
+        }
+        const auto offset = static_cast<std::uint32_t>(used_);
+        used_ += need;
+        return write(current_, offset, {head, headSize}, bytes);
+    }
+    std::string_view at(Ref ref) const noexcept
+    {
+        const char* from = blocks_[ref >> kOffsetBits].get() + (ref & ((1u << kOffsetBits) - 1));
+        std::size_t size = 0;
+        for (unsigned shift = 0;; shift += 7) {
+            const auto byte = static_cast<unsigned char>(*from++);
+            size |= static_cast<std::size_t>(byte & 0x7F) << shift;
+            if (byte < 0x80)
+                return {from, size};
+        }
+    }
+    std::size_t bytes() const noexcept
+    {
+        return bytes_;
+    }
+
+  private:
+    static constexpr unsigned kOffsetBits = 20;
+    // Room for the heap's own header keeps a block inside a whole number of pages.
+    static constexpr std::size_t kBlock = (std::size_t{1} << kOffsetBits) - 64;
+
+    std::uint32_t addBlock(std::size_t size)
+    {
+        if (blocks_.size() >> (32 - kOffsetBits) != 0)
+            throw std::bad_alloc();
+        blocks_.emplace_back(new char[size]);
+        bytes_ += size;
+        return static_cast<std::uint32_t>(blocks_.size() - 1);
+    }
+    Ref write(std::uint32_t block, std::uint32_t offset, std::string_view head, std::string_view bytes) noexcept
+    {
+        char* to = blocks_[block].get() + offset;
+        std::memcpy(to, head.data(), head.size());
+        if (!bytes.empty())
+            std::memcpy(to + head.size(), bytes.data(), bytes.size());
+        return block << kOffsetBits | offset;
+    }
+
+    std::vector<std::unique_ptr<char[]>> blocks_;
+    std::uint32_t current_ = 0;
+    std::size_t used_ = kBlock;
+    std::size_t bytes_ = 0;
+};
+
+// Open addressing over numbers of things that are kept elsewhere.
+class NumberTable {
+  public:
+    static constexpr std::uint32_t kNone = 0xFFFFFFFF;
+
+    void allocate(std::uint32_t things)
+    {
+        std::uint32_t slots = 16;
+        while (slots / 2 < things)
+            slots *= 2;
+        mask_ = slots - 1;
+        slots_ = {};
+        slots_.allocate(slots);
+        slots_.fill(kNone);
+    }
+    std::uint32_t capacity() const noexcept
+    {
+        return slots_.size() / 2;
+    }
+    void insert(std::uint32_t hash, std::uint32_t number) noexcept
+    {
+        std::uint32_t slot = hash & mask_;
+        while (slots_[slot] != kNone)
+            slot = (slot + 1) & mask_;
+        slots_[slot] = number;
+    }
+    template <class Is>
+    std::uint32_t find(std::uint32_t hash, Is is) const
+    {
+        if (slots_.size() == 0)
+            return kNone;
+        for (std::uint32_t slot = hash & mask_;; slot = (slot + 1) & mask_) {
+            if (slots_[slot] == kNone || is(slots_[slot]))
+                return slots_[slot];
+        }
+    }
+    std::size_t bytes() const noexcept
+    {
+        return slots_.bytes();
+    }
+
+  private:
+    BlockArray<std::uint32_t, 18> slots_;
+    std::uint32_t mask_ = 0;
+};
+
+// One version of one file. Nearly every aux text is 40 hexadecimal digits, which fit in `digest`, and nearly every
+// other aux value is 0; where that is not so, `digest` begins with a reference to the Extra of the version.
+struct PackedVersion {
+    std::uint32_t timestamp;
+    std::uint32_t modifiedTime;
+    std::uint32_t ctime;
+    std::uint32_t attributes;
+    std::uint32_t sizeLow;
+    std::uint32_t sizeHigh;
+    unsigned char digest[20];
+};
+static_assert(sizeof(PackedVersion) == 44);
+
+// What stands in front of the aux text in an arena string of a version that does not fit.
+struct Extra {
+    std::int64_t aux1;
+    std::int64_t aux2;
+};
+
+class VersionStore {
+    static constexpr unsigned kLog = 14;
+    static constexpr std::uint32_t kBlock = 1u << kLog;
+    struct Block {
+        PackedVersion versions[kBlock];
+        std::uint32_t extras[kBlock / 32];
+    };
+
+  public:
+    std::uint32_t size() const noexcept
+    {
+        return size_;
+    }
+    const PackedVersion& operator[](std::uint32_t i) const noexcept
+    {
+        return blocks_[i >> kLog]->versions[i & (kBlock - 1)];
+    }
+    bool hasExtra(std::uint32_t i) const noexcept
+    {
+        return (blocks_[i >> kLog]->extras[(i & (kBlock - 1)) / 32] >> (i % 32) & 1) != 0;
+    }
+    bool hasRoom() const noexcept
+    {
+        return size_ >> kLog != blocks_.size();
+    }
+    // The place of the next version, undefined until written; keep() makes it one.
+    PackedVersion& next()
+    {
+        if (!hasRoom())
+            addBlock();
+        return blocks_[size_ >> kLog]->versions[size_ & (kBlock - 1)];
+    }
+    void keep(bool extra = false) noexcept
+    {
+        if (extra)
+            blocks_[size_ >> kLog]->extras[(size_ & (kBlock - 1)) / 32] |= 1u << (size_ % 32);
+        ++size_;
+    }
+    std::size_t bytes() const noexcept
+    {
+        return blocks_.size() * sizeof(Block);
+    }
+
+  private:
+    void addBlock()
+    {
+        blocks_.emplace_back(new Block);
+        std::memset(blocks_.back()->extras, 0, sizeof(Block::extras));
+    }
+
+    std::vector<std::unique_ptr<Block>> blocks_;
+    std::uint32_t size_ = 0;
+};
+
+} // namespace tavi::storage

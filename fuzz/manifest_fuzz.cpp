@@ -1,0 +1,100 @@
+#include <cstdint>
+#include <cstdlib>
+#include <string>
+
+#include <wx/log.h>
+#include <zlib.h>
+
+#include "backupset/StoredManifest.h"
+#include "core/Text.h"
+
+namespace {
+
+using namespace tavi;
+
+ManifestRef held(const Manifest* manifest)
+{
+    if (manifest)
+        manifest->AddRef();
+    return ManifestRef(manifest);
+}
+
+void require(bool truth)
+{
+    if (!truth)
+        std::abort();
+}
+
+std::string packed(const std::uint8_t* bytes, std::size_t length)
+{
+    std::string out(compressBound(static_cast<uLong>(length)), '\0');
+    uLongf size = static_cast<uLongf>(out.size());
+    compress2(reinterpret_cast<Bytef*>(out.data()), &size, bytes, static_cast<uLong>(length), 1);
+    out.resize(size);
+    return out;
+}
+
+// Every file must be found by its path and under every beginning of it.
+void checkAnswers(const Manifest& manifest)
+{
+    for (std::uint32_t file = 0; file < manifest.fileCount(); ++file) {
+        const wxString path = manifest.filePath(file);
+        const auto patches = manifest.FindPatches(view(path));
+        require(patches && !patches->empty() && patches->size() == manifest.patches(file).size());
+        for (std::size_t i = 0; i < patches->size(); ++i)
+            (void)(*patches)[i].auxText();
+        const std::wstring_view prefix = view(path).substr(0, file % (path.length() + 1));
+        // Half a character is only told from a whole one where wide characters have 16 bits.
+        if (!prefix.empty() && prefix.back() >= 0xD800 && prefix.back() <= 0xDBFF)
+            continue;
+        bool visited = false;
+        manifest.forEachUnder(prefix, [&](std::uint32_t other) {
+            require(view(manifest.filePath(other)).substr(0, prefix.size()) == prefix);
+            visited = visited || other == file;
+            return true;
+        });
+        require(visited);
+    }
+}
+
+} // namespace
+
+// The input is a text, if its first byte is even, or a blob as it stands.
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t length)
+{
+    static const bool quiet = wxLog::EnableLogging(false);
+    (void)quiet;
+    if (length == 0)
+        return 0;
+    if (bytes[0] % 2 != 0) {
+        const ManifestRef manifest = held(parseStoredManifest(bytes + 1, length - 1));
+        if (manifest)
+            checkAnswers(*manifest);
+        return 0;
+    }
+    // A character that an earlier input left half would otherwise begin this one.
+    const std::uint8_t fault[] = {0xFF};
+    const std::string clear = packed(fault, 1);
+    (void)held(parseStoredManifest(clear.data(), clear.size()));
+
+    const std::string blob = packed(bytes + 1, length - 1);
+    const ManifestRef stored = held(parseStoredManifest(blob.data(), blob.size()));
+    if (stored)
+        checkAnswers(*stored);
+    // Where the whole text is sound, the wide text must give the same manifest.
+    const std::string text(reinterpret_cast<const char*>(bytes + 1), length - 1);
+    const wxString wide = fromUtf8(text);
+    if (toUtf8(view(wide)) != text || text.find('\0') != std::string::npos)
+        return 0;
+    const ManifestRef parsed = held(Manifest::Parse(wide));
+    require(bool(stored) == bool(parsed));
+    if (!stored)
+        return 0;
+    require(stored->textLength() == parsed->textLength() && stored->hash() == parsed->hash());
+    require(stored->userText() == parsed->userText() && stored->fileCount() == parsed->fileCount());
+    for (std::uint32_t file = 0; file < stored->fileCount(); ++file) {
+        require(stored->filePath(file) == parsed->filePath(file));
+        require(stored->patches(file).size() == parsed->patches(file).size());
+    }
+    return 0;
+}

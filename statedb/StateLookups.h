@@ -1,0 +1,44 @@
+#pragma once
+
+#include <cstdint>
+#include <memory>
+
+#include <wx/string.h>
+
+#include "statedb/Database.h"
+
+namespace tavi {
+
+// The service's states of folders. One per shell object, used by its thread only; keeps its connection open.
+class FolderStateTable {
+  public:
+    // Throws DbException when the configuration database cannot be used.
+    FolderStateTable();
+    FolderStateTable(const FolderStateTable&) = delete;
+    FolderStateTable& operator=(const FolderStateTable&) = delete;
+    ~FolderStateTable();
+
+    // The state recorded for the path, or what the nearest recorded ancestor passes on; 8 where none is recorded. Exact
+    // comparison, letter case included. Throws DbException.
+    std::int32_t getFolderState(const wxString& path);
+
+  private:
+    DbConnection connection_;
+    DbStatement select_;
+    DbStatement replace_;
+    DbStatement delete_;
+};
+
+// The service's state of one file; made for one question and destroyed after it. Any thread.
+class FileStateLookup {
+  public:
+    static constexpr std::int32_t kUnknown = 15;
+
+    // kUnknown when nothing is recorded or the database fails, which is logged.
+    std::int32_t getFileState(const wxString& path);
+
+  private:
+    std::unique_ptr<DbConnection> connection_;
+};
+
+} // namespace tavi
