@@ -69,16 +69,14 @@ Manifest::Manifest() : hash_(kEmptyInputHash) {}
 
 Manifest* Manifest::Parse(const wxString& text)
 {
-    // In slices, so that no second copy of the whole text ever stands beside the first.
+    // In slices, so that no second copy of the whole text ever stands beside the first. The parser joins what that cuts
+    // apart.
     constexpr std::size_t kSlice = 16 * 1024;
     ManifestParser parser;
     std::string bytes;
     std::uint32_t units = 0;
     for (std::wstring_view rest = view(text); !rest.empty();) {
-        std::size_t length = std::min(rest.size(), kSlice);
-        // Both halves of a pair must be encoded together.
-        if (length < rest.size() && isHighSurrogate(rest[length - 1]))
-            ++length;
+        const std::size_t length = std::min(rest.size(), kSlice);
         bytes.clear();
         appendUtf8(rest.substr(0, length), bytes);
         units += countUtf16Units(bytes);

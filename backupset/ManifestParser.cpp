@@ -164,7 +164,6 @@ const char* ManifestParser::feedVersions(const char* at, const char* end)
         if (*field != '\n')
             break;
         versions.keep();
-        newlines_ = 1;
         at = field + 1;
     }
     return at;

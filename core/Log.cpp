@@ -18,6 +18,12 @@ constexpr std::size_t kLongestMessage = 4095;
 // Above the longest line in bytes, so that each line is one write and processes that share the file do not tear it.
 constexpr std::size_t kFileBuffer = 32768;
 
+// The library's target of last resort is a message box, which would hold up the host, and in process attach for good.
+[[maybe_unused]] const bool noTargetOfLastResort = [] {
+    wxLog::DontCreateOnDemand();
+    return true;
+}();
+
 std::mutex silencerLock;
 int silencers = 0;
 bool loggingBefore = true;

@@ -1,5 +1,6 @@
 #include "statedb/Database.h"
 
+#include <iterator>
 #include <utility>
 
 #include <sqlite3.h>
@@ -45,12 +46,47 @@ const CodeName kCodeNames[] = {
     {kOwnDbError, L"WDB_ERROR"},
 };
 
-constexpr const wchar_t* kNoDatabase = L"No Database opened";
-constexpr const wchar_t* kNoStatement = L"Statement not accessible";
-constexpr const wchar_t* kBadIndex = L"Invalid field index";
-constexpr const wchar_t* kBadString = L"Error binding string param";
-constexpr const wchar_t* kBadInt = L"Error binding int param";
-constexpr const wchar_t* kBadInt64 = L"Error binding int64 param";
+// The wrapper's own messages; those from kOutOfMemory on belong to operations that nothing needs yet.
+enum OwnMessage {
+    kNoDatabase,
+    kNoStatement,
+    kBadIndex,
+    kBadString,
+    kBadInt,
+    kBadInt64,
+    kOutOfMemory,
+    kBadBinary,
+    kBadFieldName,
+    kBadRowIndex,
+    kBadScalar,
+    kNoResults,
+    kBadDouble,
+    kBadBlob,
+    kBadDate,
+    kBadNull,
+    kBadClearing,
+    kOwnMessageCount
+};
+constexpr const wchar_t* kOwnMessages[] = {
+    L"No Database opened",
+    L"Statement not accessible",
+    L"Invalid field index",
+    L"Error binding string param",
+    L"Error binding int param",
+    L"Error binding int64 param",
+    L"Out of memory",
+    L"Cannot decode binary",
+    L"Invalid field name",
+    L"Invalid row index",
+    L"Invalid scalar query",
+    L"Null Results pointer",
+    L"Error binding double param",
+    L"Error binding blob param",
+    L"Error binding date/time param",
+    L"Error binding NULL param",
+    L"Error clearing bindings",
+};
+static_assert(std::size(kOwnMessages) == kOwnMessageCount);
 
 const wchar_t* nameOf(int code)
 {
@@ -73,10 +109,15 @@ void throwIf(int result, sqlite3* connection)
         throw DbException(result, errorText(connection));
 }
 
-void throwIf(int result, const wchar_t* detail)
+void throwIf(int result, OwnMessage message)
 {
     if (result != SQLITE_OK)
-        throw DbException(result, detail);
+        throw DbException(result, kOwnMessages[message]);
+}
+
+[[noreturn]] void throwOwn(OwnMessage message)
+{
+    throw DbException(kOwnDbError, kOwnMessages[message]);
 }
 
 int finalizeSlot(const StatementSlot& slot) noexcept
@@ -126,7 +167,7 @@ DbQuery::~DbQuery()
 sqlite3_stmt* DbQuery::statement() const
 {
     if (!statement_ || !*statement_)
-        throw DbException(kOwnDbError, kNoStatement);
+        throwOwn(kNoStatement);
     return *statement_;
 }
 
@@ -134,18 +175,17 @@ sqlite3_stmt* DbQuery::statementWith(int index) const
 {
     sqlite3_stmt* const held = statement();
     if (index < 0 || index >= columnCount_)
-        throw DbException(kOwnDbError, kBadIndex);
+        throwOwn(kBadIndex);
     return held;
 }
 
 bool DbQuery::nextRow()
 {
     sqlite3_stmt* const held = statement();
-    int result = SQLITE_ROW;
-    if (std::exchange(firstRowPending_, false))
-        result = atEnd_ ? SQLITE_DONE : SQLITE_ROW;
-    else
-        result = sqlite3_step(held);
+    // Another step behind the last row would begin a new run.
+    if (std::exchange(firstRowPending_, false) || atEnd_)
+        return !atEnd_;
+    int result = sqlite3_step(held);
     if (result == SQLITE_ROW)
         return true;
     atEnd_ = true;
@@ -202,9 +242,9 @@ DbStatement::~DbStatement()
 sqlite3_stmt* DbStatement::statement() const
 {
     if (!connection_)
-        throw DbException(kOwnDbError, kNoDatabase);
+        throwOwn(kNoDatabase);
     if (!statement_ || !*statement_)
-        throw DbException(kOwnDbError, kNoStatement);
+        throwOwn(kNoStatement);
     return *statement_;
 }
 
@@ -284,7 +324,8 @@ DbConnection::~DbConnection()
 void DbConnection::open(const wxString& path)
 {
     close();
-    throwIf(sqlite3_open(toUtf8(view(path)).c_str(), &connection_), connection_);
+    const int result = sqlite3_open(toUtf8(view(path)).c_str(), &connection_);
+    throwIf(result, connection_);
     sqlite3_busy_timeout(connection_, busyTimeout_);
 }
 
@@ -297,7 +338,7 @@ void DbConnection::close() noexcept
 void DbConnection::check() const
 {
     if (!connection_)
-        throw DbException(kOwnDbError, kNoDatabase);
+        throwOwn(kNoDatabase);
 }
 
 int DbConnection::execDML(const char* sql)
@@ -322,7 +363,8 @@ StatementSlot DbConnection::prepare(const char* sql) const
     check();
     auto slot = std::make_shared<sqlite3_stmt*>(nullptr);
     // The detail stays empty: readers of the log know the failure by that.
-    throwIf(sqlite3_prepare(connection_, sql, -1, slot.get(), nullptr), L"");
+    if (const int result = sqlite3_prepare(connection_, sql, -1, slot.get(), nullptr); result != SQLITE_OK)
+        throw DbException(result, wxString());
     return slot;
 }
 
@@ -335,7 +377,7 @@ DbQuery DbConnection::execQuery(const char* sql)
 {
     StatementSlot slot = prepare(sql);
     if (!*slot)
-        throw DbException(kOwnDbError, kNoStatement);
+        throwOwn(kNoStatement);
     int result = sqlite3_step(*slot);
     if (!isRowOrDone(result)) {
         result = finalizeSlot(slot);

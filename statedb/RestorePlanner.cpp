@@ -113,7 +113,8 @@ RestorePlan planRestore(const RestoreRequest& request, const Manifest& manifest,
         paths.push_back(&path);
     std::sort(paths.begin(), paths.end(), [](const wxString* a, const wxString* b) { return *a < *b; });
     for (const wxString* path : paths) {
-        // A plain prefix, no separator added: required so, though a file's path then also takes longer names that begin alike.
+        // A plain prefix, no separator added: required so, though a file's path then also takes longer names that begin
+        // alike.
         manifest.forEachUnder(view(*path), [&](std::uint32_t file) {
             plan.plan(file, request, exists);
             return true;

@@ -1,6 +1,8 @@
 #include "statedb/RestoreRequest.h"
 
 #include <ctime>
+#include <string>
+#include <string_view>
 
 #include <windows.h>
 #include <wx/log.h>
@@ -22,22 +24,26 @@ class TargetProbe {
   public:
     bool operator()(const wxString& path)
     {
-        wxString parent = path.BeforeLast(L'\\');
-        if (parent.empty() || parent != parent_) {
-            parentExists_ = parent.empty() || isThere(parent);
-            parent_ = std::move(parent);
+        // With its separator, without which the root of a drive is no folder.
+        const std::wstring_view parent = view(path).substr(0, path.rfind(L'\\') + 1);
+        if (parent.empty())
+            return isThere(path.wc_str());
+        if (parent != parent_) {
+            parent_ = parent;
+            // A folder that may not be looked at may still hold files that can be.
+            parentMayHold_ = isThere(parent_.c_str()) || GetLastError() == ERROR_ACCESS_DENIED;
         }
-        return parentExists_ && isThere(path);
+        return parentMayHold_ && isThere(path.wc_str());
     }
 
   private:
-    static bool isThere(const wxString& path)
+    static bool isThere(const wchar_t* path)
     {
-        return GetFileAttributesW(path.wc_str()) != INVALID_FILE_ATTRIBUTES;
+        return GetFileAttributesW(path) != INVALID_FILE_ATTRIBUTES;
     }
 
-    wxString parent_;
-    bool parentExists_ = false;
+    std::wstring parent_;
+    bool parentMayHold_ = false;
 };
 
 } // namespace
@@ -99,7 +105,7 @@ void RestoreRequestWriter::recover() noexcept
     const auto attempt = [](auto step) {
         try {
             step();
-        } catch (const DbException&) {
+        } catch (...) {
         }
     };
     attempt([&] { connection_->rollbackTransaction(); });

@@ -2,6 +2,7 @@
 
 #include <mutex>
 
+#include <windows.h>
 #include <wx/log.h>
 
 #include "core/InstallPaths.h"
@@ -33,9 +34,35 @@ std::int32_t inherited(std::int32_t state)
     }
 }
 
-std::mutex& fileStateLock()
+// Not the library's mutex: what that one makes stays behind when the module is unloaded.
+class CriticalSection {
+  public:
+    CriticalSection() noexcept
+    {
+        InitializeCriticalSection(&section_);
+    }
+    CriticalSection(const CriticalSection&) = delete;
+    CriticalSection& operator=(const CriticalSection&) = delete;
+    ~CriticalSection()
+    {
+        DeleteCriticalSection(&section_);
+    }
+    void lock() noexcept
+    {
+        EnterCriticalSection(&section_);
+    }
+    void unlock() noexcept
+    {
+        LeaveCriticalSection(&section_);
+    }
+
+  private:
+    CRITICAL_SECTION section_;
+};
+
+CriticalSection& fileStateLock()
 {
-    static std::mutex lock;
+    static CriticalSection lock;
     return lock;
 }
 
@@ -45,7 +72,7 @@ FolderStateTable::FolderStateTable()
 {
     connection_.open(GetConfigFilePath(kConfigDatabase));
     select_ = connection_.compileStatement(kFolderSelect);
-    // Prepared and never run: a configuration database that the service could not write is refused at once.
+    // Prepared and never run: a table without these columns is refused at once.
     replace_ = connection_.compileStatement(kFolderReplace);
     delete_ = connection_.compileStatement(kFolderDelete);
 }
@@ -93,7 +120,7 @@ std::int32_t FileStateLookup::getFileState(const wxString& path)
             return state;
         }
     }
-    const std::lock_guard<std::mutex> hold(fileStateLock());
+    const std::lock_guard<CriticalSection> hold(fileStateLock());
     try {
         DbStatement select = connection_->compileStatement(kFileSelect);
         select.bind(1, path);

@@ -45,6 +45,7 @@ TEST(ManifestParser, TakesTheTextApart)
         {"USER\n_hash|abc\nline", "abc[line] "},
         {"USER\nline\n_hash|abc\n_hash|def\n", "abc[line\n_hash|def\n] "},
         {"USER\n_hash|", "[] "},
+        {"USER\n_hash|abc\n123456789\n_hash|def", "abc[123456789\n_hash|def] "},
         {"USER\nx _hash|abc", "da39a3ee5e6b4b0d3255bfef95601890afd80709[x _hash|abc] "},
         {"USER\n_hash|abc\nold\n\n\nUSER\nnew\n\n", "abc[new\n\n] "},
         {"USER\n_hash|abc\nold\n\n\nUSER\n", "abc[] "},
@@ -55,6 +56,7 @@ TEST(ManifestParser, TakesTheTextApart)
         {"\n\n\nFILES\na\n1:2", "a = 0:1:0:2:0::0:0 "},
         {"\n\n\n\nFILES\na\n1:2", ""},
         {"FILES\na\n1:2\n\n\n\n\n\nFILES\nb\n3:4", "a = 0:1:0:2:0::0:0 b = 0:3:0:4:0::0:0 "},
+        {"OTHER\nab\n\nFILES\na\n1:2", ""},
         {"FILES\na\n1:2\n\n\nb\n3:4", "a = 0:1:0:2:0::0:0 "},
         {"FILES\n\n\na\n1:2", ""},
         {"FILES\n\na\n1:2", "a = 0:1:0:2:0::0:0 "},
@@ -86,12 +88,12 @@ TEST(ManifestParser, TakesTheTextApart)
              "8:0:40 1:2:3:4:0:0123456789ABCDEF0123456789abcdef01234567:0:40 "},
         // Numbers.
         {"FILES\na\n \t12x:+3 4:--5:- 6:x:t:-7:8", "a = 12:3:0:0:0:t:-7:0 "},
-        {"FILES\na\n1:2:3:4:0:" + kDigest +
+        {"FILES\na\n1\n1:2:3:4:0:" + kDigest +
              ":0:778\n4294967295:-1:4294967297:9223372036854775807:-9223372036854775808::-1:+37777777777",
-         "a = 1:2:3:4:0:" + kDigest +
+         "a = 0:1:0:0:0::0:0 1:2:3:4:0:" + kDigest +
              ":0:77 4294967295:4294967295:1:9223372036854775807:-9223372036854775808::-1:37777777777 "},
-        {"FILES\na\n12345678901:2:3:4294967296:0:" + kDigest + ":0:0",
-         "a = 3755744309:2:3:4294967296:0:" + kDigest + ":0:0 "},
+        {"FILES\na\n1\n12345678901:2:3:4294967296:0:" + kDigest + ":0:0\n1",
+         "a = 0:1:0:0:0::0:0 3755744309:2:3:4294967296:0:" + kDigest + ":0:0 0:1:0:0:0::0:0 "},
         // Characters of every length, and one in two halves.
         {"FILES\n\xC3\xA4\\\xE6\x97\xA5\xF0\x9F\x98\x80\n1:2:0:\xC3\xB6",
          "\xC3\xA4\\\xE6\x97\xA5\xF0\x9F\x98\x80 = 0:1:0:2:0:\xC3\xB6:0:0 "},

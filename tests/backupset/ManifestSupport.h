@@ -1,8 +1,9 @@
 #pragma once
 
+#include <cstdio>
 #include <string>
-#include <vector>
 
+#include <gtest/gtest.h>
 #include <zlib.h>
 
 #include "backupset/ManifestParser.h"

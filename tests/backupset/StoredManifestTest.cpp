@@ -35,10 +35,10 @@ TEST(StoredManifest, TheTextEndsAtTheFirstFault)
         {"a\xF4\x90\x80\x80z", "a"},
         {"a\x80z", "a"},
         {"a\xFFz", "a"},
-        {"a\xF8\x88\x80\x80\x80z", "a"},
+        {"a\xFB\xBF\xBF\xBF\xBFz", "a"},
         {"a\xE6\x97zz", "a"},
         {"a\xC3\xC3\xA4", "a"},
-        {"a\0z"s, "a"},
+        {"a\0b\0z"s, "a"},
         {"a\0\xFFz"s, "a"},
     };
     for (const auto& test : cases) {
@@ -73,6 +73,15 @@ TEST(StoredManifest, ACharacterCutByAWriteGoesOnInTheNext)
             EXPECT_EQ(auxText(packed(kHead + "b")), "b");
         }
     }
+}
+
+TEST(StoredManifest, NothingBehindAZeroIsOfTheText)
+{
+    const std::string behind = std::string(100000, 'x') + "\xC3\xA4\n1:2:3:4:5:6:7:8:9\n\n\nFILES\nother\n1";
+    const ManifestRef manifest = stored(packed(kHead + "a\0\xC3\xA4"s + behind));
+    ASSERT_TRUE(manifest);
+    EXPECT_EQ(manifest->fileCount(), 1u);
+    EXPECT_EQ(manifest->textLength(), kHead.size() + 1 + 1);
 }
 
 TEST(StoredManifest, HeadersAndBrokenBlobs)

@@ -1,6 +1,5 @@
 #pragma once
 
-#include <memory>
 #include <string>
 #include <vector>
 
@@ -10,7 +9,8 @@
 
 namespace tavi::test {
 
-// Takes the log of a test: one line per message, in UTF-8, as "level: " with wx's number of the level, and the line as written.
+// Takes the log of a test: one line per message, in UTF-8, as "level: " with wx's number of the level, and the line as
+// written.
 class LogCapture {
     class Target : public wxLog {
       public:

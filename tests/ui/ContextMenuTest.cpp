@@ -10,6 +10,7 @@
 #include "core/Module.h"
 #include "tests/support/Catalogue.h"
 #include "tests/support/Dialogs.h"
+#include "tests/support/LogCapture.h"
 #include "tests/support/Registry.h"
 #include "ui/MenuBitmap.h"
 
@@ -53,6 +54,7 @@ class ContextMenuTest : public testing::Test {
         return result;
     }
 
+    test::LogCapture log_;
     test::InstalledService service_;
     HMENU menu_;
 };
@@ -101,6 +103,8 @@ TEST_F(ContextMenuTest, KeepsAReferenceToTheManifest)
     const auto isAllocated = [](const void* block) {
         return HeapValidate(reinterpret_cast<HANDLE>(_get_heap_handle()), 0, block) != FALSE;
     };
+    // A fresh one: earlier menus hold theirs.
+    StopManifestWatcher();
     const Manifest* manifest = nullptr;
     ASSERT_TRUE(test::waitUntil([&] { return (manifest = GetCurrentManifest()) != nullptr; }));
     insertMenuItems(menu_, 0, kFirstId, 0x7FFF, CMF_DEFAULTONLY, Selection());

@@ -10,6 +10,7 @@
 #include "core/Handles.h"
 #include "core/Text.h"
 #include "statedb/StateLookups.h"
+#include "tests/support/LogCapture.h"
 #include "tests/support/Registry.h"
 
 namespace tavi {
@@ -105,6 +106,7 @@ class SelectionTest : public testing::Test {
         return folder_.path() + L"\\" + name;
     }
 
+    test::LogCapture log_;
     InstalledService service_;
     TemporaryFolder folder_;
 };

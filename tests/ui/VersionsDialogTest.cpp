@@ -1,13 +1,11 @@
 #include "ui/VersionsDialog.h"
 
-#include <algorithm>
 #include <atomic>
 #include <cstdlib>
 #include <fstream>
 #include <vector>
 
 #include <commctrl.h>
-#include <psapi.h>
 #include <shlobj.h>
 
 #include <gtest/gtest.h>
@@ -17,6 +15,7 @@
 #include "core/Text.h"
 #include "tests/support/Catalogue.h"
 #include "tests/support/Dialogs.h"
+#include "tests/support/LogCapture.h"
 #include "tests/support/Registry.h"
 #include "ui/CopyTarget.h"
 #include "ui/resource.h"
@@ -148,6 +147,7 @@ class VersionsDialogTest : public testing::Test {
         run("DELETE FROM restores; DELETE FROM restore_files");
     }
 
+    test::LogCapture log_;
     test::InstalledService service_;
     test::TemporaryFolder folder_;
     sqlite3* database_ = nullptr;
@@ -219,15 +219,9 @@ TEST_F(VersionsDialogTest, IsReadyForTheKeyboard)
     ListView_SetItemState(list, 0, LVIS_SELECTED, LVIS_SELECTED);
     EXPECT_TRUE(actionsEnabled(dialog));
 
-    // Version 6 of the controls, whatever the host has.
-    HMODULE modules[200];
-    DWORD bytes = 0;
-    EnumProcessModules(GetCurrentProcess(), modules, sizeof(modules), &bytes);
-    EXPECT_TRUE(std::any_of(modules, modules + bytes / sizeof(HMODULE), [](HMODULE module) {
-        wchar_t path[MAX_PATH] = L"";
-        GetModuleFileNameW(module, path, MAX_PATH);
-        return std::wstring(CharLowerW(path)).find(L"common-controls") != std::wstring::npos;
-    }));
+    // Version 6 of the controls, whatever the host has: only its buttons know their ideal size.
+    SIZE ideal{};
+    EXPECT_TRUE(SendMessageW(GetDlgItem(dialog, IDCANCEL), BCM_GETIDEALSIZE, 0, reinterpret_cast<LPARAM>(&ideal)));
 
     PostMessageW(list, WM_KEYDOWN, VK_RETURN, 0);
     answer(IDCANCEL, L"Restoring this file will");

@@ -8,6 +8,7 @@
 #include <algorithm>
 #include <functional>
 #include <map>
+#include <utility>
 
 namespace filemanager {
 namespace {
@@ -179,6 +180,9 @@ LRESULT FolderWindow::respond(UINT message, WPARAM wParam, LPARAM lParam)
         else
             showStatus();
         return 0;
+    case WM_SYSCOMMAND:
+        // The Alt key alone would open the window menu after Alt+Up.
+        return (wParam & 0xFFF0) == SC_KEYMENU && lParam == 0 ? 0 : DefWindowProcW(window_, message, wParam, lParam);
     case WM_TIMER:
         CoFreeUnusedLibraries();
         return 0;
@@ -186,9 +190,10 @@ LRESULT FolderWindow::respond(UINT message, WPARAM wParam, LPARAM lParam)
         (*reinterpret_cast<std::function<void()>*>(lParam))();
         return 0;
     case WM_DESTROY:
-        window_ = nullptr;
         PostQuitMessage(0);
         return 0;
+    case WM_NCDESTROY:
+        return DefWindowProcW(std::exchange(window_, nullptr), message, wParam, lParam);
     default:
         return DefWindowProcW(window_, message, wParam, lParam);
     }
@@ -499,6 +504,7 @@ std::size_t FolderWindow::indexOf(const std::wstring& name) const
 void FolderWindow::select(const std::vector<std::wstring>& names)
 {
     std::vector<int> indexes;
+    indexes.reserve(names.size());
     for (const std::wstring& name : names)
         indexes.push_back(static_cast<int>(indexOf(name)));
     selectAll(false);

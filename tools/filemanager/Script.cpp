@@ -11,7 +11,7 @@
 namespace filemanager {
 namespace {
 
-constexpr DWORD kAnswerLimit = 30000;
+constexpr DWORD kAnswerLimit = 60000;
 constexpr DWORD kMenuLimit = 5000;
 constexpr DWORD kPollMilliseconds = 10;
 
@@ -64,7 +64,7 @@ std::wstring textOf(HWND target)
 {
     std::wstring text(ask(target, WM_GETTEXTLENGTH) + 1, L'\0');
     text.resize(ask(target, WM_GETTEXT, text.size(), text.data()));
-    return text;
+    return text.compare(0, 1, L"\xFFFF") == 0 ? L"" : text; // an icon's resource number
 }
 
 std::wstring titleOf(HWND target)
@@ -94,25 +94,26 @@ std::vector<HWND> children(HWND parent)
     return found;
 }
 
-// The windows of this process that a user could work with now: a dialog's owner is disabled while a box is open over
-// it.
 std::vector<HWND> openWindows()
 {
     std::vector<HWND> found;
     EnumWindows(collect, reinterpret_cast<LPARAM>(&found));
-    const auto unusable = [](HWND target) {
+    const auto foreign = [](HWND target) {
         DWORD process = 0;
         GetWindowThreadProcessId(target, &process);
-        return process != GetCurrentProcessId() || !IsWindowVisible(target) || !IsWindowEnabled(target);
+        return process != GetCurrentProcessId() || !IsWindowVisible(target);
     };
-    found.erase(std::remove_if(found.begin(), found.end(), unusable), found.end());
+    found.erase(std::remove_if(found.begin(), found.end(), foreign), found.end());
     return found;
 }
 
-HWND findWindow(const std::wstring& title)
+// Of windows with one title the one that a user could work with: a dialog is disabled while it has a box open.
+HWND findWindow(const std::wstring& title, bool enabled)
 {
     const auto found = openWindows();
-    const auto match = std::find_if(found.begin(), found.end(), [&](HWND target) { return titleOf(target) == title; });
+    const auto match = std::find_if(found.begin(), found.end(), [&](HWND target) {
+        return titleOf(target) == title && (!enabled || IsWindowEnabled(target));
+    });
     return match == found.end() ? nullptr : *match;
 }
 
@@ -142,6 +143,23 @@ void selectRow(HWND list, int row)
     ask(list, LVM_SETITEMSTATE, static_cast<WPARAM>(-1), &item);
     item.state = item.stateMask;
     ask(list, LVM_SETITEMSTATE, static_cast<WPARAM>(row), &item);
+}
+
+// The point that a mouse would press: the middle of a control, or the beginning of a row of a list.
+POINT pressPoint(HWND target, const std::wstring* row)
+{
+    RECT box = {};
+    if (!row) {
+        GetClientRect(target, &box);
+    } else {
+        box.left = LVIR_LABEL;
+        if (!ask(target, LVM_GETITEMRECT, static_cast<WPARAM>(number(*row)), &box))
+            throw Failure{L"the list has no row " + *row};
+        box.right = std::min(box.right, box.left + 40);
+    }
+    POINT point = {(box.left + box.right) / 2, (box.top + box.bottom) / 2};
+    ClientToScreen(target, &point);
+    return point;
 }
 
 void dumpList(HWND list, Output& output)
@@ -279,11 +297,12 @@ const std::vector<Script::Command>& Script::commands()
         {L"wait", L"MS", L"waits", 1, 1, [](S& s, const A& a) { s.pause(milliseconds(a[0])); }},
         {L"wait-window", L"TITLE | MS", L"waits until a window with this title can be used", 2, 2,
          [](S& s, const A& a) {
-             s.waitUntil([&] { return findWindow(a[0]) != nullptr; }, milliseconds(a[1]), L"no window " + a[0]);
+             s.waitUntil([&] { return findWindow(a[0], true) != nullptr; }, milliseconds(a[1]), L"no window " + a[0]);
          }},
-        {L"wait-closed", L"TITLE | MS", L"waits until no such window is there", 2, 2,
+        {L"wait-closed", L"TITLE | MS", L"waits until no window has this title", 2, 2,
          [](S& s, const A& a) {
-             s.waitUntil([&] { return findWindow(a[0]) == nullptr; }, milliseconds(a[1]), L"still a window " + a[0]);
+             s.waitUntil([&] { return findWindow(a[0], false) == nullptr; }, milliseconds(a[1]),
+                         L"still a window " + a[0]);
          }},
         {L"wait-text", L"TITLE | ID | TEXT | MS", L"waits until a control's text contains TEXT", 4, 4,
          [](S& s, const A& a) {
@@ -307,10 +326,15 @@ const std::vector<Script::Command>& Script::commands()
          [](S& s, const A& a) { dumpList(s.control(a[0], a[1]), s.output_); }},
         {L"dump-controls", L"TITLE", L"prints the visible controls of a window", 1, 1,
          [](S& s, const A& a) { dumpControls(s.window(a[0]), s.output_); }},
-        {L"windows", L"", L"prints the titles of the windows that can be used", 0, 0,
+        {L"where", L"TITLE | ID | ROW", L"prints the screen position of a control, or of a row of a list", 2, 3,
+         [](S& s, const A& a) {
+             const POINT point = pressPoint(s.control(a[0], a[1]), a.size() > 2 ? &a[2] : nullptr);
+             s.output_.line(std::to_wstring(point.x) + L" " + std::to_wstring(point.y));
+         }},
+        {L"windows", L"", L"prints the titles of the open windows", 0, 0,
          [](S& s, const A&) {
              for (const HWND target : openWindows())
-                 s.output_.line(titleOf(target));
+                 s.output_.line(titleOf(target) + (IsWindowEnabled(target) ? L"" : L" [disabled]"));
          }},
         {L"unload", L"DLL", L"has COM free unused servers and tells whether DLL is still mapped", 1, 1,
          [](S& s, const A& a) {
@@ -470,7 +494,7 @@ void Script::waitUntil(const std::function<bool()>& met, DWORD limit, const std:
 
 HWND Script::window(const std::wstring& title) const
 {
-    const HWND found = title == L"." ? owner_ : findWindow(title);
+    const HWND found = title == L"." ? owner_ : findWindow(title, true);
     if (!found)
         throw Failure{L"no window " + title};
     return found;
@@ -478,11 +502,15 @@ HWND Script::window(const std::wstring& title) const
 
 HWND Script::control(const std::wstring& title, const std::wstring& id) const
 {
-    const auto wanted = static_cast<WORD>(number(id));
-    for (const HWND child : children(window(title))) {
-        if (static_cast<WORD>(GetDlgCtrlID(child)) == wanted)
-            return child;
-    }
+    const HWND parent = window(title);
+    auto found = children(parent);
+    // Controls inside controls may repeat a dialog's numbers; its own come first.
+    std::stable_partition(found.begin(), found.end(), [parent](HWND child) { return GetParent(child) == parent; });
+    const auto match = std::find_if(found.begin(), found.end(), [wanted = static_cast<WORD>(number(id))](HWND child) {
+        return static_cast<WORD>(GetDlgCtrlID(child)) == wanted;
+    });
+    if (match != found.end())
+        return *match;
     throw Failure{L"no control " + id + L" in " + title};
 }
 

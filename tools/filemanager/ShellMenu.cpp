@@ -191,7 +191,7 @@ std::vector<std::wstring> ShellMenu::describe() const
         wchar_t text[256] = L"";
         const MENUITEMINFOW info = itemInfo(popup_, at, text, 256);
         if (info.fType & MFT_SEPARATOR) {
-            lines.push_back(L"--------");
+            lines.emplace_back(L"--------");
             continue;
         }
         std::wstring line = withoutMnemonic(text);

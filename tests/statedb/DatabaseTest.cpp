@@ -1,0 +1,180 @@
+#include "statedb/Database.h"
+
+#include <cstdio>
+#include <functional>
+#include <vector>
+
+#include <gtest/gtest.h>
+#include <sqlite3.h>
+
+#include "core/Text.h"
+
+namespace tavi {
+namespace {
+
+// What the action throws, as the text that goes into the log.
+template <class Action>
+wxString thrownBy(Action action)
+{
+    try {
+        action();
+    } catch (const DbException& error) {
+        EXPECT_EQ(fromUtf8(error.what()), error.message());
+        return error.message();
+    }
+    return L"nothing";
+}
+
+DbConnection opened()
+{
+    DbConnection connection;
+    connection.open(L":memory:");
+    connection.execDML("CREATE TABLE t(a INTEGER PRIMARY KEY, b)");
+    return connection;
+}
+
+TEST(Database, NamesEveryCode)
+{
+    const wchar_t* const names[] = {L"OK",       L"ERROR",      L"INTERNAL", L"PERM",      L"ABORT", L"BUSY",
+                                    L"LOCKED",   L"NOMEM",      L"READONLY", L"INTERRUPT", L"IOERR", L"CORRUPT",
+                                    L"NOTFOUND", L"FULL",       L"CANTOPEN", L"PROTOCOL",  L"EMPTY", L"SCHEMA",
+                                    L"TOOBIG",   L"CONSTRAINT", L"MISMATCH", L"MISUSE",    L"NOLFS", L"AUTH",
+                                    L"FORMAT",   L"RANGE"};
+    for (int code = 0; code < 26; ++code)
+        EXPECT_EQ(DbException(code, L"x").message(), wxString::Format(L"DB_%s[%d]: x", names[code], code));
+    EXPECT_EQ(DbException(5, L"database is locked").message(), L"DB_BUSY[5]: database is locked");
+    EXPECT_EQ(DbException(100, L"").message(), L"DB_ROW[100]: ");
+    EXPECT_EQ(DbException(101, L"").message(), L"DB_DONE[101]: ");
+    EXPECT_EQ(DbException(26, L"").message(), L"UNKNOWN_ERROR[26]: ");
+    EXPECT_EQ(DbException(999, L"").message(), L"UNKNOWN_ERROR[999]: ");
+    EXPECT_EQ(DbException(1000, L"y").message(), L"WDB_ERROR[1000]: y");
+}
+
+TEST(Database, ReportsMisuseAndFailures)
+{
+    DbConnection connection = opened();
+    DbStatement moved = connection.compileStatement("SELECT 1");
+    const DbStatement taken = std::move(moved);
+    DbStatement insert = connection.compileStatement("INSERT INTO t VALUES(?,?)");
+    insert.bind(1, std::int32_t{1});
+    insert.execDML();
+    DbQuery one = connection.execQuery("SELECT a FROM t");
+    const char* text = nullptr;
+    const struct {
+        wxString expected;
+        std::function<void()> action;
+    } cases[] = {
+        {L"WDB_ERROR[1000]: No Database opened", [] { DbConnection().execDML("SELECT 1"); }},
+        {L"WDB_ERROR[1000]: No Database opened", [] { DbConnection().compileStatement("SELECT 1"); }},
+        {L"WDB_ERROR[1000]: No Database opened", [] { DbStatement().execDML(); }},
+        {L"WDB_ERROR[1000]: Statement not accessible", [&] { connection.compileStatement("").execDML(); }},
+        {L"WDB_ERROR[1000]: Statement not accessible", [&] { DbQuery().nextRow(); }},
+        {L"WDB_ERROR[1000]: Statement not accessible", [&] { moved.reset(); }},
+        {L"WDB_ERROR[1000]: Invalid field index", [&] { one.fieldText(-1, text); }},
+        {L"WDB_ERROR[1000]: Invalid field index", [&] { one.fieldInt(1, 0); }},
+        {L"DB_ERROR[1]: ", [&] { connection.compileStatement("SELEC"); }}, // the detail is left empty on purpose
+        {L"DB_ERROR[1]: ", [&] { connection.execQuery("SELECT * FROM missing"); }},
+        {L"DB_ERROR[1]: no such table: missing", [&] { connection.execDML("DELETE FROM missing"); }},
+        {L"DB_ERROR[1]: near \"\xE9\": syntax error", [&] { connection.execDML(wxString(L"\xE9 x")); }},
+        {L"DB_RANGE[25]: Error binding string param", [&] { insert.bind(3, wxString(L"x")); }},
+        {L"DB_RANGE[25]: Error binding int param", [&] { insert.bind(0, std::int32_t{1}); }},
+        {L"DB_RANGE[25]: Error binding int64 param", [&] { insert.bind(9, std::int64_t{1}); }},
+        {L"DB_CONSTRAINT[19]: UNIQUE constraint failed: t.a", [&] { insert.execDML(); }},
+        {L"DB_CANTOPEN[14]: unable to open database file", [] { DbConnection().open(L"/no such folder/x.db"); }},
+        {L"nothing", [&] { insert.finalize(); }},
+        {L"WDB_ERROR[1000]: Statement not accessible", [&] { insert.execDML(); }},
+    };
+    for (const auto& test : cases) {
+        SCOPED_TRACE(test.expected);
+        const wxString thrown = thrownBy(test.action);
+        EXPECT_EQ(thrown, test.expected);
+    }
+}
+
+TEST(Database, WalksRowsAndKeepsBindings)
+{
+    DbConnection connection = opened();
+    DbStatement insert = connection.compileStatement("INSERT INTO t(b) VALUES(?)");
+    const wxString names[] = {L"plain", wxString(L"\x65E5\xE9"), wxString()};
+    for (const wxString& name : names) {
+        insert.bind(1, name);
+        EXPECT_EQ(insert.execDML(), 1);
+    }
+    EXPECT_EQ(insert.execDML(), 1); // the last binding again
+    insert.bind(1, std::int64_t{0x7FFFFFFFFFFFFFFF});
+    insert.execDML();
+    EXPECT_EQ(connection.lastRowId(), 5);
+    connection.execDML("INSERT INTO t(b) VALUES(NULL),(x'6100C3A9')");
+    EXPECT_EQ(connection.execDML("UPDATE t SET a=a"), 7);
+
+    DbQuery rows = connection.execQuery("SELECT b, a FROM t ORDER BY a");
+    std::vector<std::pair<int, std::string>> found;
+    while (rows.nextRow()) {
+        const char* text = nullptr;
+        const int type = rows.fieldType(0); // before the text is asked for, which converts
+        const int length = rows.fieldText(0, text);
+        found.emplace_back(type, std::string(text ? text : "", static_cast<std::size_t>(length)));
+        EXPECT_EQ(rows.fieldInt(0, 42) == 42, type == 5);
+    }
+    EXPECT_FALSE(rows.nextRow()); // it stays at the end
+    const std::vector<std::pair<int, std::string>> expected = {
+        {3, "plain"}, {3, "\xE6\x97\xA5\xC3\xA9"},       {3, ""}, {3, ""}, {1, "9223372036854775807"},
+        {5, ""},      {4, std::string("a\0\xC3\xA9", 4)}};
+    EXPECT_EQ(found, expected);
+    EXPECT_FALSE(connection.execQuery("SELECT 1 FROM t WHERE 0").nextRow());
+
+    DbStatement select = connection.compileStatement("SELECT a FROM t WHERE a>?");
+    select.bind(1, std::int32_t{6});
+    for (int run = 0; run < 2; ++run) {
+        DbQuery cursor = select.execQuery();
+        EXPECT_TRUE(cursor.nextRow());
+        EXPECT_EQ(cursor.fieldInt(0, 0), 7);
+        EXPECT_FALSE(cursor.nextRow());
+        select.reset();
+    }
+}
+
+TEST(Database, ARowThatFailsEmptiesStatementAndCursor)
+{
+    DbConnection connection = opened();
+    connection.execDML("INSERT INTO t(b) VALUES(1),(-9223372036854775807-1)");
+    DbStatement select = connection.compileStatement("SELECT abs(b) FROM t ORDER BY a");
+    DbQuery rows = select.execQuery();
+    EXPECT_TRUE(rows.nextRow());
+    EXPECT_EQ(thrownBy([&] { rows.nextRow(); }), L"DB_ERROR[1]: integer overflow");
+    EXPECT_EQ(thrownBy([&] { rows.nextRow(); }), L"WDB_ERROR[1000]: Statement not accessible");
+    EXPECT_EQ(thrownBy([&] { select.reset(); }), L"WDB_ERROR[1000]: Statement not accessible");
+    // A statement may outlive its connection; both are freed.
+    DbStatement late = connection.compileStatement("SELECT 1");
+    connection.close();
+    EXPECT_EQ(thrownBy([&] { connection.execDML("SELECT 1"); }), L"WDB_ERROR[1000]: No Database opened");
+}
+
+TEST(Database, BeginsTheFlavourAskedFor)
+{
+    const struct {
+        int mode;
+        bool locksAtOnce;
+    } cases[] = {{0, false}, {1, false}, {2, true}, {3, true}, {7, false}};
+    const std::string path = testing::TempDir() + "tavi-modes.db";
+    std::remove(path.c_str());
+    sqlite3* other = nullptr;
+    ASSERT_EQ(sqlite3_open(path.c_str(), &other), SQLITE_OK);
+    DbConnection connection;
+    connection.open(fromUtf8(path));
+    connection.execDML("CREATE TABLE t(a)");
+    for (const auto& test : cases) {
+        connection.beginTransaction(test.mode);
+        const int wanted = sqlite3_exec(other, "BEGIN IMMEDIATE", nullptr, nullptr, nullptr);
+        EXPECT_EQ(wanted, test.locksAtOnce ? SQLITE_BUSY : SQLITE_OK) << test.mode;
+        if (wanted == SQLITE_OK)
+            sqlite3_exec(other, "ROLLBACK", nullptr, nullptr, nullptr);
+        connection.execDML("INSERT INTO t VALUES(1)");
+        connection.rollbackTransaction();
+        EXPECT_FALSE(connection.execQuery("SELECT * FROM t").nextRow());
+    }
+    sqlite3_close(other);
+}
+
+} // namespace
+} // namespace tavi

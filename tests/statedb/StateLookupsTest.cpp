@@ -1,0 +1,72 @@
+#include "statedb/StateLookups.h"
+
+#include <gtest/gtest.h>
+#include <wx/log.h>
+
+#include "tests/support/LogCapture.h"
+#include "tests/support/Registry.h"
+
+namespace tavi {
+namespace {
+
+TEST(StateLookups, FoldersInheritFromTheNearestRecordedOne)
+{
+    test::InstalledService service;
+    {
+        DbConnection database;
+        database.open(service.file(L"taviconf.dat"));
+        EXPECT_THROW(FolderStateTable(), DbException);
+        database.execDML("CREATE TABLE filesystem(state INTEGER, folder TEXT PRIMARY KEY)");
+        for (int state = -1; state <= 16; ++state)
+            database.execDML(wxString::Format(L"INSERT INTO filesystem VALUES(%d,'C:\\s%d')", state, state));
+        database.execDML("INSERT INTO filesystem VALUES(NULL,'C:\\null'),(4,'D:')");
+    }
+    FolderStateTable states;
+    for (int state = -1; state <= 16; ++state) {
+        const wxString folder = wxString::Format(L"C:\\s%d", state);
+        const int inherited = state == 0 || state == 2 ? 8 : state == 1 || state == 3 || state == 5 ? 7 : state;
+        EXPECT_EQ(states.getFolderState(folder), state);
+        EXPECT_EQ(states.getFolderState(folder + L"\\x"), inherited) << state;
+        EXPECT_EQ(states.getFolderState(folder + L"\\x\\y\\"), inherited) << state;
+    }
+    const struct {
+        const wchar_t* path;
+        int state;
+    } cases[] = {{L"", 8},        {L"C:\\S2", 8}, {L"C:\\null", 0}, {L"C:\\null\\x", 8},
+                 {L"D:\\any", 4}, {L"D:", 4},     {L"relative", 8}, {L"E:\\a\\b\\c", 8}};
+    for (const auto& test : cases)
+        EXPECT_EQ(states.getFolderState(test.path), test.state) << test.path;
+
+    // Held open, but not locked: the service must be able to write.
+    DbConnection writer;
+    writer.open(service.file(L"taviconf.dat"));
+    EXPECT_EQ(states.getFolderState(L"C:\\s6"), 6);
+    EXPECT_EQ(writer.execDML("UPDATE filesystem SET state=5 WHERE folder='C:\\s6'"), 1);
+    EXPECT_EQ(states.getFolderState(L"C:\\s6"), 5);
+}
+
+TEST(StateLookups, FilesAreKnownOrFifteen)
+{
+    test::InstalledService service;
+    test::LogCapture log;
+    EXPECT_EQ(FileStateLookup().getFileState(L"C:\\f"), 15);
+    {
+        DbConnection database;
+        database.open(service.file(L"tavistate.dat"));
+        database.execDML("CREATE TABLE file_states(filename TEXT, state INTEGER)");
+        database.execDML("INSERT INTO file_states VALUES('C:\\f',1),('C:\\null',NULL)");
+    }
+    FileStateLookup lookup;
+    EXPECT_EQ(lookup.getFileState(L"C:\\f"), 1);
+    EXPECT_EQ(lookup.getFileState(L"C:\\null"), 0);
+    EXPECT_EQ(lookup.getFileState(L"c:\\F"), 15);
+    service.install().SetValue(L"DataPath", wxString(L"C:\\no such folder"));
+    EXPECT_EQ(FileStateLookup().getFileState(L"C:\\f"), 15);
+    const std::vector<std::string> expected = {
+        "1: Error: Failed to retrieve file state (1: DB_ERROR[1]: )",
+        "1: Error: Failed to open file-state db (14: DB_CANTOPEN[14]: unable to open database file)"};
+    EXPECT_EQ(log.take(), expected);
+}
+
+} // namespace
+} // namespace tavi
