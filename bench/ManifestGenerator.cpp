@@ -161,4 +161,23 @@ std::vector<char> readBlob(const StoredText& text)
     return blob;
 }
 
+// What no reader can do without: the same blob, inflated into 64 KB and forgotten.
+void inflateOnly(std::vector<char>& blob, std::uint64_t expected)
+{
+    std::vector<Bytef> out(64 * 1024);
+    z_stream stream{};
+    inflateInit2(&stream, 15 + 32);
+    stream.next_in = reinterpret_cast<Bytef*>(blob.data());
+    stream.avail_in = static_cast<uInt>(blob.size());
+    std::uint64_t total = 0;
+    for (int status = Z_OK; status == Z_OK; total += out.size() - stream.avail_out) {
+        stream.next_out = out.data();
+        stream.avail_out = static_cast<uInt>(out.size());
+        status = inflate(&stream, Z_NO_FLUSH);
+    }
+    inflateEnd(&stream);
+    if (total != expected)
+        throw std::runtime_error("the bench set does not inflate");
+}
+
 } // namespace tavi::bench

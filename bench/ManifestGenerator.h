@@ -25,4 +25,8 @@ std::string generatedPath(std::uint32_t number);
 StoredText storedText(const std::string& dataFolder, std::uint32_t files, FileOrder order);
 std::vector<char> readBlob(const StoredText& text);
 
+// What no reader of a blob can do without: it is inflated into 64 KB and forgotten. Throws unless `expected` bytes came
+// out.
+void inflateOnly(std::vector<char>& blob, std::uint64_t expected);
+
 } // namespace tavi::bench

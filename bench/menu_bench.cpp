@@ -1,0 +1,137 @@
+#include <stdexcept>
+
+#include <windows.h>
+#include <shlobj.h>
+#include <shlwapi.h>
+
+#include "bench/Bench.h"
+#include "bench/BenchInstall.h"
+#include "core/Handles.h"
+#include "core/Module.h"
+#include "backupset/CurrentManifest.h"
+#include "statedb/StateLookups.h"
+#include "ui/ContextMenu.h"
+#include "ui/Selection.h"
+
+namespace tavi::bench {
+namespace {
+
+// A folder of empty files and the shell's own data object for all of them.
+class BenchFolder {
+  public:
+    BenchFolder(std::wstring path, unsigned files) : path_(std::move(path)), files_(files)
+    {
+        CreateDirectoryW(path_.c_str(), nullptr);
+        for (unsigned i = 0; i < files_; ++i)
+            CloseHandle(CreateFileW(file(i).c_str(), GENERIC_WRITE, 0, nullptr, CREATE_ALWAYS, 0, nullptr));
+        LPITEMIDLIST list = nullptr;
+        if (FAILED(SHParseDisplayName(path_.c_str(), nullptr, &list, 0, nullptr)))
+            throw std::runtime_error("no item list of the folder");
+        ComPtr<IShellFolder> desktop;
+        SHGetDesktopFolder(desktop.out());
+        desktop->BindToObject(list, nullptr, IID_IShellFolder, folder_.outVoid());
+        ILFree(list);
+        for (unsigned i = 0; i < files_; ++i) {
+            std::wstring name = file(i).substr(path_.size() + 1);
+            LPITEMIDLIST item = nullptr;
+            if (FAILED(folder_->ParseDisplayName(nullptr, nullptr, name.data(), nullptr, &item, nullptr)))
+                throw std::runtime_error("no item of a file");
+            items_.push_back(item);
+        }
+        if (FAILED(folder_->GetUIObjectOf(nullptr, files_, const_cast<LPCITEMIDLIST*>(items_.data()), IID_IDataObject,
+                                          nullptr, data_.outVoid())))
+            throw std::runtime_error("no data object");
+    }
+    BenchFolder(const BenchFolder&) = delete;
+    BenchFolder& operator=(const BenchFolder&) = delete;
+    ~BenchFolder()
+    {
+        for (LPITEMIDLIST item : items_)
+            ILFree(item);
+        for (unsigned i = 0; i < files_; ++i)
+            DeleteFileW(file(i).c_str());
+        RemoveDirectoryW(path_.c_str());
+    }
+    std::wstring file(unsigned i) const
+    {
+        return path_ + L"\\file " + std::to_wstring(i) + L".txt";
+    }
+    IDataObject* data() const
+    {
+        return data_.get();
+    }
+    // The calls that no handler of this selection can do without; returns how many files there were.
+    unsigned requiredCalls(FolderStateTable& states) const
+    {
+        FORMATETC request{static_cast<CLIPFORMAT>(RegisterClipboardFormatW(L"Shell IDList Array")), nullptr,
+                          DVASPECT_CONTENT, -1, TYMED_HGLOBAL};
+        STGMEDIUM medium{};
+        data_->GetData(&request, &medium);
+        const auto* array = static_cast<const CIDA*>(GlobalLock(medium.hGlobal));
+        unsigned found = 0;
+        for (UINT i = 1; i <= array->cidl; ++i) {
+            const auto* item =
+                reinterpret_cast<LPCITEMIDLIST>(reinterpret_cast<const BYTE*>(array) + array->aoffset[i]);
+            STRRET text{};
+            wchar_t name[MAX_PATH];
+            folder_->GetDisplayNameOf(item, SHGDN_FORPARSING, &text);
+            StrRetToBufW(&text, item, name, MAX_PATH);
+            found += states.getFolderState(name) != -1 && GetFileAttributesW(name) != INVALID_FILE_ATTRIBUTES;
+        }
+        GlobalUnlock(medium.hGlobal);
+        ReleaseStgMedium(&medium);
+        return found;
+    }
+
+  private:
+    std::wstring path_;
+    unsigned files_;
+    ComPtr<IShellFolder> folder_;
+    std::vector<LPITEMIDLIST> items_;
+    ComPtr<IDataObject> data_;
+};
+
+void menuBench(Bench& bench)
+{
+    constexpr unsigned kFiles = 10000;
+    const BenchInstall install(bench.dataFolder() + "/menu");
+    install.stateDatabase().execDML("CREATE TABLE manifest(contents BLOB)");
+    install.configDatabase().execDML("CREATE TABLE filesystem(state INTEGER, folder TEXT PRIMARY KEY);"
+                                     "INSERT INTO filesystem VALUES(1,'C:\\users')");
+    wchar_t temporary[MAX_PATH];
+    GetTempPathW(MAX_PATH, temporary);
+    OleInitialize(nullptr);
+    {
+        const BenchFolder folder(std::wstring(temporary) + L"tavi-menu-bench", kFiles);
+        FolderStateTable states;
+        setModuleInstance(GetModuleHandleW(nullptr));
+        // The watcher loads the empty manifest first, so that the versions of every file are asked for.
+        for (int i = 0; i < 500 && !ManifestRef(GetCurrentManifest()); ++i)
+            Sleep(10);
+        unsigned found = 0;
+        std::size_t selected = 0;
+        const auto times =
+            medianSeconds(bench.repetitions(), {
+                                                   [&] { found = folder.requiredCalls(states); },
+                                                   [&] {
+                                                       Selection selection;
+                                                       captureSelection(nullptr, folder.data(), states, selection);
+                                                       selected = selection.paths.size();
+                                                       const HMENU menu = CreatePopupMenu();
+                                                       insertMenuItems(menu, 0, 1, 100, CMF_NORMAL, selection);
+                                                       DestroyMenu(menu);
+                                                   },
+                                               });
+        if (found != kFiles || selected != kFiles)
+            throw std::runtime_error("files are missing from the selection");
+        bench.report({"menu query / required calls, 10000 files", times[1] / times[0], 1.3, "x"});
+        bench.report({"menu query, 10000 files", times[1] * 1e3, kNoBound, "ms"});
+        StopManifestWatcher();
+        Sleep(1000);
+    }
+    OleUninitialize();
+}
+const Group menuGroup("menu", menuBench);
+
+} // namespace
+} // namespace tavi::bench
