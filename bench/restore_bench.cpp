@@ -68,7 +68,7 @@ std::vector<double> measurePlanning(const std::vector<std::string>& arguments)
     const ManifestRef manifest = load(arguments[0]);
     const RestoreRequest request = everything(*manifest);
     const double before = workingSet();
-    const RestorePlan plan = planRestore(request, *manifest, [](const wxString&) { return false; });
+    const RestorePlan plan = planRestore(request, *manifest, [](const std::string&) { return false; });
     RestoreFileEntry entry;
     for (std::uint32_t row = 0; row < plan.size(); ++row)
         plan.readEntry(row, entry);

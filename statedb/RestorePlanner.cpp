@@ -68,8 +68,7 @@ void RestorePlan::buildTarget(const std::string& manifestPath, std::uint32_t fre
         insertFreeName(target, freeName);
 }
 
-void RestorePlan::plan(std::uint32_t file, const RestoreRequest& request,
-                       const std::function<bool(const wxString&)>& exists)
+void RestorePlan::plan(std::uint32_t file, const RestoreRequest& request, const PathProbe& exists)
 {
     const auto patch = versionAt(manifest_->patches(file), request.cutoffTime);
     if (!patch)
@@ -78,7 +77,7 @@ void RestorePlan::plan(std::uint32_t file, const RestoreRequest& request,
     if (!overwrite_) {
         const auto isTaken = [&] {
             buildTarget(manifestPath_, freeName, target_);
-            return exists(fromUtf8(target_));
+            return exists(target_);
         };
         manifestPath_.clear();
         manifest_->appendFilePathUtf8(file, manifestPath_);
@@ -103,8 +102,7 @@ void RestorePlan::readEntry(std::uint32_t row, RestoreFileEntry& entry) const
     entry.attributes = patch.attributes();
 }
 
-RestorePlan planRestore(const RestoreRequest& request, const Manifest& manifest,
-                        const std::function<bool(const wxString&)>& exists)
+RestorePlan planRestore(const RestoreRequest& request, const Manifest& manifest, const PathProbe& exists)
 {
     RestorePlan plan(request, manifest);
     std::vector<const wxString*> paths;

@@ -38,6 +38,9 @@ struct RestoreFileEntry {
     std::uint32_t attributes = 0;
 };
 
+// Tells whether something exists at a path, given in UTF-8.
+using PathProbe = std::function<bool(const std::string& path)>;
+
 // The files of one request in the order of their rows. Keeps numbers only, so that a million of them fit beside the
 // manifest; the manifest must be held for as long as the plan lives.
 class RestorePlan {
@@ -50,8 +53,7 @@ class RestorePlan {
     void readEntry(std::uint32_t row, RestoreFileEntry& entry) const;
 
   private:
-    friend RestorePlan planRestore(const RestoreRequest& request, const Manifest& manifest,
-                                   const std::function<bool(const wxString&)>& exists);
+    friend RestorePlan planRestore(const RestoreRequest& request, const Manifest& manifest, const PathProbe& exists);
 
     struct Row {
         std::uint32_t file;
@@ -61,7 +63,7 @@ class RestorePlan {
     };
 
     RestorePlan(const RestoreRequest& request, const Manifest& manifest);
-    void plan(std::uint32_t file, const RestoreRequest& request, const std::function<bool(const wxString&)>& exists);
+    void plan(std::uint32_t file, const RestoreRequest& request, const PathProbe& exists);
     void buildTarget(const std::string& manifestPath, std::uint32_t freeName, std::string& target) const;
 
     const Manifest* manifest_;
@@ -74,8 +76,7 @@ class RestorePlan {
 };
 
 // Chooses, for every selected path and every file of the manifest whose path begins with it, the version and the
-// target. `exists` tells whether something stands at a path; it is asked only when existing files are to be kept.
-RestorePlan planRestore(const RestoreRequest& request, const Manifest& manifest,
-                        const std::function<bool(const wxString&)>& exists);
+// target. `exists` is asked only when existing files are to be kept.
+RestorePlan planRestore(const RestoreRequest& request, const Manifest& manifest, const PathProbe& exists);
 
 } // namespace tavi

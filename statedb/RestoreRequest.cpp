@@ -8,6 +8,7 @@
 #include <wx/log.h>
 
 #include "core/InstallPaths.h"
+#include "core/Text.h"
 
 namespace tavi {
 namespace {
@@ -22,27 +23,29 @@ constexpr int kPlainTransaction = 0;
 // the system a millisecond to miss: each parent folder is looked up once, and nothing stands below a missing one.
 class TargetProbe {
   public:
-    bool operator()(const wxString& path)
+    bool operator()(const std::string& path)
     {
         // With its separator, without which the root of a drive is no folder.
-        const std::wstring_view parent = view(path).substr(0, path.rfind(L'\\') + 1);
+        const std::string_view parent = std::string_view(path).substr(0, path.rfind('\\') + 1);
         if (parent.empty())
-            return isThere(path.wc_str());
+            return lookUp(path) == ERROR_SUCCESS;
         if (parent != parent_) {
             parent_ = parent;
             // A folder that may not be looked at may still hold files that can be.
-            parentMayHold_ = isThere(parent_.c_str()) || GetLastError() == ERROR_ACCESS_DENIED;
+            const DWORD answer = lookUp(parent_);
+            parentMayHold_ = answer == ERROR_SUCCESS || answer == ERROR_ACCESS_DENIED;
         }
-        return parentMayHold_ && isThere(path.wc_str());
+        return parentMayHold_ && lookUp(path) == ERROR_SUCCESS;
     }
 
   private:
-    static bool isThere(const wchar_t* path)
+    static DWORD lookUp(const std::string& path)
     {
-        return GetFileAttributesW(path) != INVALID_FILE_ATTRIBUTES;
+        const wxString wide = fromUtf8(path);
+        return GetFileAttributesW(wide.wc_str()) == INVALID_FILE_ATTRIBUTES ? GetLastError() : ERROR_SUCCESS;
     }
 
-    std::wstring parent_;
+    std::string parent_;
     bool parentMayHold_ = false;
 };
 
@@ -127,7 +130,7 @@ void RestoreRequestWriter::close()
 void performRestore(RestoreRequest& request, const Manifest& manifest)
 {
     TargetProbe probe;
-    const RestorePlan plan = planRestore(request, manifest, [&](const wxString& path) { return probe(path); });
+    const RestorePlan plan = planRestore(request, manifest, [&](const std::string& path) { return probe(path); });
     RestoreRequestWriter writer;
     writer.open();
     writer.requestRestore(plan, request.machineId, request.machineAlias, request.encryptionKey);

@@ -89,22 +89,56 @@ FolderStateTable::~FolderStateTable()
     connection_.close();
 }
 
+FolderStateTable::ReadScope::ReadScope(FolderStateTable& table) : table_(table)
+{
+    table_.connection_.beginTransaction(0);
+    table_.knownParent_.clear();
+    table_.reading_ = true;
+}
+
+FolderStateTable::ReadScope::~ReadScope()
+{
+    table_.reading_ = false;
+    table_.knownParent_.clear();
+    try {
+        table_.connection_.commitTransaction();
+    } catch (const DbException&) {
+        // Nothing was written; a transaction that the library has ended by itself is gone already.
+    }
+}
+
+std::optional<std::int32_t> FolderStateTable::recordedState(const wxString& folder)
+{
+    select_.reset();
+    select_.bind(1, folder);
+    DbQuery rows = select_.execQuery();
+    if (!rows.nextRow())
+        return std::nullopt;
+    const std::int32_t state = rows.fieldInt(0, 0);
+    // A statement left on its row would keep the service from writing for as long as the object lives.
+    select_.reset();
+    return state;
+}
+
 std::int32_t FolderStateTable::getFolderState(const wxString& path)
 {
-    bool isPathItself = true;
-    for (wxString folder = path; !folder.empty(); folder = folder.BeforeLast(L'\\')) {
-        select_.reset();
-        select_.bind(1, folder);
-        DbQuery rows = select_.execQuery();
-        if (rows.nextRow()) {
-            const std::int32_t state = rows.fieldInt(0, 0);
-            // A statement left on its row would keep the service from writing for as long as the object lives.
-            select_.reset();
-            return isPathItself ? state : inherited(state);
+    if (path.empty())
+        return kInheritedOut;
+    if (const auto state = recordedState(path))
+        return *state;
+    const wxString parent = path.BeforeLast(L'\\');
+    if (reading_ && !parent.empty() && parent == knownParent_)
+        return passedOn_;
+    std::int32_t passedOn = kInheritedOut;
+    for (wxString folder = parent; !folder.empty(); folder = folder.BeforeLast(L'\\')) {
+        if (const auto state = recordedState(folder)) {
+            passedOn = inherited(*state);
+            break;
         }
-        isPathItself = false;
     }
-    return kInheritedOut;
+    knownParent_ = parent;
+    passedOn_ = passedOn;
+    return passedOn;
 }
 
 std::int32_t FileStateLookup::getFileState(const wxString& path)

@@ -2,6 +2,7 @@
 
 #include <cstdint>
 #include <memory>
+#include <optional>
 
 #include <wx/string.h>
 
@@ -22,7 +23,26 @@ class FolderStateTable {
     // comparison, letter case included. Throws DbException.
     std::int32_t getFolderState(const wxString& path);
 
+    // Holds the database for reading, so that many lookups in a row lock it once: the locks are most of what a lookup
+    // costs. Throws DbException when it cannot.
+    class ReadScope {
+      public:
+        explicit ReadScope(FolderStateTable& table);
+        ReadScope(const ReadScope&) = delete;
+        ReadScope& operator=(const ReadScope&) = delete;
+        ~ReadScope();
+
+      private:
+        FolderStateTable& table_;
+    };
+
   private:
+    std::optional<std::int32_t> recordedState(const wxString& folder);
+
+    // While a ReadScope lives: the folder of the last path and what it passes on.
+    bool reading_ = false;
+    wxString knownParent_;
+    std::int32_t passedOn_ = 0;
     DbConnection connection_;
     DbStatement select_;
     DbStatement replace_;

@@ -178,19 +178,21 @@ PathSet collectPaths(LPCITEMIDLIST folder, IDataObject* data, DriveTypeQuery dri
 std::int32_t summarizeStates(const PathSet& paths, FolderStateTable& states)
 {
     KindFlags flags;
-    for (const wxString& path : paths) {
-        try {
+    if (paths.empty())
+        return flags.summary();
+    try {
+        const FolderStateTable::ReadScope reading(states);
+        for (const wxString& path : paths) {
             const std::int32_t state = states.getFolderState(path);
             flags.add(state == 6 || state == 7);
-        } catch (const DbException& error) {
-            // What failed here fails for the other items too, and each failure may have waited for the database's
-            // time-out.
-            wxLogWarning("Failed to retrieve folder state (%d: %s)", error.code(), error.message());
-            flags.add(false);
-            break;
+            if (flags.both())
+                break;
         }
-        if (flags.both())
-            break;
+    } catch (const DbException& error) {
+        // What failed for one item fails for the others too, and each failure may have waited for the database's
+        // time-out.
+        wxLogWarning("Failed to retrieve folder state (%d: %s)", error.code(), error.message());
+        flags.add(false);
     }
     return flags.summary();
 }

@@ -188,8 +188,11 @@ void runDialog(void* argument)
         return;
     }
     placeWindow(window.get(), start->host);
-    ShowWindow(window.get(), SW_SHOW);
+    // In front first, focus after: a window that has the focus before it is in front keeps the caption of a background
+    // window.
+    ShowWindow(window.get(), SW_SHOWNA);
     SetForegroundWindow(window.get());
+    SetFocus(GetDlgItem(window.get(), TAVI_VERSIONS_LIST));
     MSG message;
     while (GetMessageW(&message, nullptr, 0, 0) > 0) {
         if (!IsDialogMessageW(window.get(), &message)) {
@@ -269,7 +272,6 @@ void VersionsDialog::initialize()
     addColumns();
     addRows();
     SendMessageW(window_, DM_SETDEFID, TAVI_VERSIONS_RESTORE, 0);
-    SetFocus(list());
 }
 
 void VersionsDialog::setTexts()
@@ -488,7 +490,7 @@ void VersionsDialog::request(const wxString& sourcePrefix, const wxString& desti
     request.destinationFolder = destination;
     request.overwrite = overwrite;
     SetCursor(LoadCursorW(nullptr, IDC_WAIT));
-    performRestore(request, *manifest_.get());
+    performRestore(request, *manifest_);
     if (const ProgressWindowOpener open = progressWindowOpener)
         open();
 }

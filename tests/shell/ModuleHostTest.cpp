@@ -37,67 +37,50 @@ void runSql(const std::wstring& path, const char* sql)
 }
 
 // The module, loaded for as long as it lives.
-class LoadedModule {
-  public:
-    LoadedModule() : module_(LoadLibraryW(modulePath().c_str()))
+struct LoadedModule {
+    LoadedModule()
     {
-        load(getClassObject_, "DllGetClassObject");
-        load(canUnloadNow_, "DllCanUnloadNow");
-        load(register_, "DllRegisterServer");
-        load(unregister_, "DllUnregisterServer");
+        for (const auto& [name, function] : {std::pair<const char*, void*>{"DllGetClassObject", &classObject},
+                                             {"DllCanUnloadNow", &canUnload},
+                                             {"DllRegisterServer", &registerServer},
+                                             {"DllUnregisterServer", &unregisterServer}}) {
+            const FARPROC address = GetProcAddress(module, name);
+            EXPECT_NE(address, nullptr) << name;
+            std::memcpy(function, &address, sizeof(address));
+        }
     }
     ~LoadedModule()
     {
         EXPECT_EQ(canUnload(), S_OK);
-        FreeLibrary(module_);
+        FreeLibrary(module);
     }
-    HRESULT registration(bool add)
-    {
-        return add ? register_() : unregister_();
-    }
-    HRESULT classObject(REFCLSID classId, REFIID interfaceId, void** object)
-    {
-        return getClassObject_(classId, interfaceId, object);
-    }
-    HRESULT canUnload()
-    {
-        return canUnloadNow_();
-    }
-    ComPtr<IClassFactory> factory(REFCLSID classId)
+    ComPtr<IClassFactory> factory(REFCLSID classId) const
     {
         ComPtr<IClassFactory> made;
         EXPECT_EQ(classObject(classId, IID_IClassFactory, made.outVoid()), S_OK);
         return made;
     }
-
-  private:
-    template <class Function>
-    void load(Function& function, const char* name)
+    template <class Interface>
+    ComPtr<Interface> object(REFCLSID classId, REFIID interfaceId) const
     {
-        const FARPROC address = GetProcAddress(module_, name);
-        EXPECT_NE(address, nullptr) << name;
-        std::memcpy(&function, &address, sizeof(function));
+        ComPtr<Interface> made;
+        EXPECT_EQ(factory(classId)->CreateInstance(nullptr, interfaceId, made.outVoid()), S_OK);
+        return made;
     }
 
-    HMODULE module_;
-    HRESULT(STDAPICALLTYPE* getClassObject_)(REFCLSID, REFIID, void**) = nullptr;
-    HRESULT(STDAPICALLTYPE* canUnloadNow_)() = nullptr;
-    HRESULT(STDAPICALLTYPE* register_)() = nullptr;
-    HRESULT(STDAPICALLTYPE* unregister_)() = nullptr;
+    HMODULE module = LoadLibraryW(modulePath().c_str());
+    HRESULT(STDAPICALLTYPE* classObject)(REFCLSID, REFIID, void**) = nullptr;
+    HRESULT(STDAPICALLTYPE* canUnload)() = nullptr;
+    HRESULT(STDAPICALLTYPE* registerServer)() = nullptr;
+    HRESULT(STDAPICALLTYPE* unregisterServer)() = nullptr;
 };
-
-bool moduleIsMapped()
-{
-    return GetModuleHandleW(L"tavishell.dll") != nullptr;
-}
 
 bool moduleGoesWithin(DWORD milliseconds)
 {
-    for (const DWORD start = GetTickCount(); GetTickCount() - start < milliseconds; Sleep(10)) {
-        if (!moduleIsMapped())
-            return true;
-    }
-    return false;
+    const DWORD start = GetTickCount();
+    while (GetModuleHandleW(L"tavishell.dll") && GetTickCount() - start < milliseconds)
+        Sleep(10);
+    return !GetModuleHandleW(L"tavishell.dll");
 }
 
 struct Counts {
@@ -186,8 +169,7 @@ TEST_F(ModuleHost, AnswersAsAComServer)
 TEST_F(ModuleHost, CarriesTheOverlayTableBehindTheOthers)
 {
     LoadedModule module;
-    ComPtr<IUnknown> object;
-    ASSERT_EQ(module.factory(kShellExtClassId)->CreateInstance(nullptr, IID_IUnknown, object.outVoid()), S_OK);
+    const auto object = module.object<IUnknown>(kShellExtClassId, IID_IUnknown);
     auto** const tables = reinterpret_cast<void**>(object.get());
     ComPtr<IContextMenu> menu;
     object->QueryInterface(IID_IContextMenu, menu.outVoid());
@@ -219,8 +201,7 @@ TEST_F(ModuleHost, CarriesTheOverlayTableBehindTheOthers)
 TEST_F(ModuleHost, ServesTheStubFolder)
 {
     LoadedModule module;
-    ComPtr<IPersistFolder> persist;
-    ASSERT_EQ(module.factory(kStubFolderClassId)->CreateInstance(nullptr, IID_IPersistFolder, persist.outVoid()), S_OK);
+    const auto persist = module.object<IPersistFolder>(kStubFolderClassId, IID_IPersistFolder);
     CLSID classId{};
     EXPECT_EQ(persist->GetClassID(&classId), S_OK);
     EXPECT_TRUE(IsEqualCLSID(classId, kStubFolderClassId));
@@ -265,9 +246,7 @@ TEST_F(ModuleHost, TwentyRoundsOfLoadAndUnloadLeaveNothingBehind)
             before = countNow();
         {
             LoadedModule module;
-            ComPtr<IShellExtInit> init;
-            ASSERT_EQ(module.factory(kShellExtClassId)->CreateInstance(nullptr, IID_IShellExtInit, init.outVoid()),
-                      S_OK);
+            auto init = module.object<IShellExtInit>(kShellExtClassId, IID_IShellExtInit);
             ComPtr<IContextMenu> menu;
             init->QueryInterface(IID_IContextMenu, menu.outVoid());
             EXPECT_EQ(init->Initialize(nullptr, nullptr, nullptr), S_OK);
@@ -332,14 +311,14 @@ TEST_F(ModuleHost, RegistersAndLeavesTheRequiredKeysBehind)
 
     wxRegKey(L"HKCR\\CLSID\\" + classId + L"\\a\\b\\c").Create();
     LoadedModule module;
-    EXPECT_EQ(module.registration(false), HRESULT{ERROR_FILE_NOT_FOUND});
-    EXPECT_EQ(module.registration(false), HRESULT{ERROR_FILE_NOT_FOUND});
+    EXPECT_EQ(module.unregisterServer(), HRESULT{ERROR_FILE_NOT_FOUND});
+    EXPECT_EQ(module.unregisterServer(), HRESULT{ERROR_FILE_NOT_FOUND});
     for (const auto& [key, text] : defaults)
         EXPECT_EQ(wxRegKey(key).Exists(), key.Find(L"CLSID") == wxNOT_FOUND) << key;
     EXPECT_TRUE(approved.HasValue(classId));
 
     approved.DeleteSelf();
-    EXPECT_EQ(module.registration(true),
+    EXPECT_EQ(module.registerServer(),
               HRESULT{ERROR_FILE_NOT_FOUND}); // the list is opened, not created; everything before it is written
     EXPECT_TRUE(wxRegKey(L"HKCR\\Folder\\shellex\\ContextMenuHandlers\\Tavi").Exists());
     approved.Create();

@@ -2,6 +2,7 @@
 
 #include <cstdio>
 #include <functional>
+#include <sstream>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -35,13 +36,14 @@ DbConnection opened()
 
 TEST(Database, NamesEveryCode)
 {
-    const wchar_t* const names[] = {L"OK",       L"ERROR",      L"INTERNAL", L"PERM",      L"ABORT", L"BUSY",
-                                    L"LOCKED",   L"NOMEM",      L"READONLY", L"INTERRUPT", L"IOERR", L"CORRUPT",
-                                    L"NOTFOUND", L"FULL",       L"CANTOPEN", L"PROTOCOL",  L"EMPTY", L"SCHEMA",
-                                    L"TOOBIG",   L"CONSTRAINT", L"MISMATCH", L"MISUSE",    L"NOLFS", L"AUTH",
-                                    L"FORMAT",   L"RANGE"};
-    for (int code = 0; code < 26; ++code)
-        EXPECT_EQ(DbException(code, L"x").message(), wxString::Format(L"DB_%s[%d]: x", names[code], code));
+    std::wistringstream names(
+        L"OK ERROR INTERNAL PERM ABORT BUSY LOCKED NOMEM READONLY INTERRUPT IOERR CORRUPT NOTFOUND "
+        L"FULL CANTOPEN PROTOCOL EMPTY SCHEMA TOOBIG CONSTRAINT MISMATCH MISUSE NOLFS AUTH FORMAT "
+        L"RANGE");
+    int code = 0;
+    for (std::wstring name; names >> name; ++code)
+        EXPECT_EQ(DbException(code, L"x").message(), wxString::Format(L"DB_%s[%d]: x", name, code));
+    EXPECT_EQ(code, 26);
     EXPECT_EQ(DbException(5, L"database is locked").message(), L"DB_BUSY[5]: database is locked");
     EXPECT_EQ(DbException(100, L"").message(), L"DB_ROW[100]: ");
     EXPECT_EQ(DbException(101, L"").message(), L"DB_DONE[101]: ");
@@ -55,6 +57,8 @@ TEST(Database, ReportsMisuseAndFailures)
     DbConnection connection = opened();
     DbStatement moved = connection.compileStatement("SELECT 1");
     const DbStatement taken = std::move(moved);
+    DbConnection movedConnection = opened();
+    const DbConnection takenConnection = std::move(movedConnection);
     DbStatement insert = connection.compileStatement("INSERT INTO t VALUES(?,?)");
     insert.bind(1, std::int32_t{1});
     insert.execDML();
@@ -67,6 +71,7 @@ TEST(Database, ReportsMisuseAndFailures)
         {L"WDB_ERROR[1000]: No Database opened", [] { DbConnection().execDML("SELECT 1"); }},
         {L"WDB_ERROR[1000]: No Database opened", [] { DbConnection().compileStatement("SELECT 1"); }},
         {L"WDB_ERROR[1000]: No Database opened", [] { DbStatement().execDML(); }},
+        {L"WDB_ERROR[1000]: No Database opened", [&] { movedConnection.lastRowId(); }},
         {L"WDB_ERROR[1000]: Statement not accessible", [&] { connection.compileStatement("").execDML(); }},
         {L"WDB_ERROR[1000]: Statement not accessible", [&] { DbQuery().nextRow(); }},
         {L"WDB_ERROR[1000]: Statement not accessible", [&] { moved.reset(); }},
@@ -144,6 +149,10 @@ TEST(Database, ARowThatFailsEmptiesStatementAndCursor)
     EXPECT_EQ(thrownBy([&] { rows.nextRow(); }), L"DB_ERROR[1]: integer overflow");
     EXPECT_EQ(thrownBy([&] { rows.nextRow(); }), L"WDB_ERROR[1000]: Statement not accessible");
     EXPECT_EQ(thrownBy([&] { select.reset(); }), L"WDB_ERROR[1000]: Statement not accessible");
+    // Prepared for good: it is not prepared again, behind its owner's back, for changed tables.
+    select = connection.compileStatement("SELECT a FROM t");
+    connection.execDML("ALTER TABLE t ADD c");
+    EXPECT_EQ(thrownBy([&] { select.execQuery(); }), L"DB_SCHEMA[17]: database schema has changed");
     // A statement may outlive its connection; both are freed.
     DbStatement late = connection.compileStatement("SELECT 1");
     connection.close();
@@ -174,6 +183,8 @@ TEST(Database, BeginsTheFlavourAskedFor)
         EXPECT_FALSE(connection.execQuery("SELECT * FROM t").nextRow());
     }
     sqlite3_close(other);
+    connection.close();
+    EXPECT_EQ(std::remove(path.c_str()), 0);
 }
 
 } // namespace

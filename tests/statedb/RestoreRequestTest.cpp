@@ -5,8 +5,10 @@
 
 #include <gtest/gtest.h>
 
+#include "tests/backupset/ManifestSupport.h"
 #include "tests/support/LogCapture.h"
 #include "tests/support/Registry.h"
+#include "tests/support/TestDisk.h"
 
 namespace tavi {
 namespace {
@@ -15,10 +17,6 @@ class RestoreRequests : public testing::Test {
   protected:
     RestoreRequests()
     {
-        const Manifest* manifest = Manifest::Parse(wxString(L"FILES\nC:\\one\\a.txt\n100:1:4000000000:5:0:x:0:40\n\n"
-                                                            L"C:\\one\\b.txt\n100:1:2:6:0:x:0:41"));
-        manifest->AddRef();
-        manifest_ = ManifestRef(manifest);
         database_.open(service_.file(L"tavistate.dat"));
         database_.execDML("CREATE TABLE restores(request_time INTEGER, machine_id TEXT, machine_alias TEXT, "
                           "encryption_key TEXT);"
@@ -48,7 +46,9 @@ class RestoreRequests : public testing::Test {
     test::LogCapture log_;
     test::InstalledService service_;
     DbConnection database_;
-    ManifestRef manifest_;
+    const ManifestRef manifest_ = test::held(
+        Manifest::Parse(L"FILES\nC:\\one\\a.txt\n100:1:4000000000:5:0:x:0:40\n\nC:\\one\\b.txt\n100:1:2:6:0:x:0:41\n\n"
+                        L"C:\\gone\\c\n100:1:2:6:0:x:0:41"));
 };
 
 TEST_F(RestoreRequests, StandInTheDatabaseAsOneTransaction)
@@ -90,13 +90,35 @@ TEST_F(RestoreRequests, AFailureLeavesNothingHalfWrittenAndOneLine)
         database_.execDML(test.mendIt);
         EXPECT_EQ(count("SELECT count(*) FROM restore_files"), 0);
     }
+    {
+        // A disk that fills up at each write in turn, until none is needed any more.
+        test::TestDisk disk;
+        int writes = 0;
+        for (std::string logged = "none yet"; !logged.empty() && writes < 100; ++writes) {
+            disk.writesLeft() = writes;
+            logged = perform(L"C:\\one");
+            const bool failed = logged == "1: Error: Error requesting restore: DB_FULL[13]: database or disk is full";
+            EXPECT_TRUE(failed || logged.empty()) << logged;
+            EXPECT_EQ(count("SELECT (SELECT count(*) FROM restores)+(SELECT count(*) FROM restore_files)"),
+                      failed ? 0 : 3);
+        }
+        EXPECT_GT(writes, 3);
+        EXPECT_LT(writes, 100);
+    }
     service_.install().SetValue(L"DataPath", wxString(L"C:\\no such folder"));
     EXPECT_EQ(perform(L"C:\\one"),
               "1: Error: Failed to open state db for restores: DB_CANTOPEN[14]: unable to open database file");
 }
 
-TEST_F(RestoreRequests, WaitForAnotherWriter)
+TEST_F(RestoreRequests, WaitAMinuteForAnotherWriter)
 {
+    {
+        test::TestDisk disk;
+        database_.beginTransaction(2);
+        EXPECT_EQ(perform(L"C:\\one"), "1: Error: Error requesting restore: DB_BUSY[5]: database is locked");
+        EXPECT_EQ(disk.waited(), 60000000);
+        database_.rollbackTransaction();
+    }
     database_.beginTransaction(2);
     database_.execDML("INSERT INTO restores(request_time) VALUES(7)");
     std::string logged = "not done";
@@ -112,18 +134,23 @@ TEST_F(RestoreRequests, WaitForAnotherWriter)
 TEST_F(RestoreRequests, KeepExistingFilesUnlessToldOtherwise)
 {
     const std::wstring folder = service_.file(L"kept");
-    CreateDirectoryW(folder.c_str(), nullptr);
-    for (const wchar_t* name : {L"\\a.txt", L"\\a (1).txt"})
+    for (const wchar_t* name : {L"", L"\\one"})
+        CreateDirectoryW((folder + name).c_str(), nullptr);
+    for (const wchar_t* name : {L"\\one\\a.txt", L"\\one\\a (1).txt"})
         CloseHandle(CreateFileW((folder + name).c_str(), GENERIC_WRITE, 0, nullptr, CREATE_NEW, 0, nullptr));
     RestoreRequest request;
-    request.selectedPaths.insert(L"C:\\one");
+    request.selectedPaths.insert(L"C:\\");
     request.cutoffTime = 100;
-    request.sourcePrefix = L"C:\\one";
+    request.sourcePrefix = L"C:";
     request.destinationFolder = folder;
     performRestore(request, *manifest_);
-    EXPECT_EQ(count("SELECT count(*) FROM restore_files WHERE overwrite=0 AND (target_path LIKE '%\\kept\\a (2).txt' "
-                    "OR target_path LIKE '%\\kept\\b.txt')"),
-              2);
+    for (const char* target : {"gone\\c", "one\\a (2).txt", "one\\b.txt"})
+        EXPECT_EQ(
+            count(("SELECT overwrite FROM restore_files WHERE target_path LIKE '%\\kept\\" + std::string(target) + "'")
+                      .c_str()),
+            0)
+            << target;
+    EXPECT_EQ(count("SELECT count(*) FROM restore_files"), 3);
 }
 
 } // namespace

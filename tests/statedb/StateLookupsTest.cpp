@@ -1,10 +1,12 @@
 #include "statedb/StateLookups.h"
 
 #include <gtest/gtest.h>
+#include <sqlite3.h>
 #include <wx/log.h>
 
 #include "tests/support/LogCapture.h"
 #include "tests/support/Registry.h"
+#include "tests/support/TestDisk.h"
 
 namespace tavi {
 namespace {
@@ -43,6 +45,43 @@ TEST(StateLookups, FoldersInheritFromTheNearestRecordedOne)
     EXPECT_EQ(states.getFolderState(L"C:\\s6"), 6);
     EXPECT_EQ(writer.execDML("UPDATE filesystem SET state=5 WHERE folder='C:\\s6'"), 1);
     EXPECT_EQ(states.getFolderState(L"C:\\s6"), 5);
+    EXPECT_EQ(states.getFolderState(L"C:\\s6\\x"), 7);
+    writer.execDML("UPDATE filesystem SET state=2 WHERE folder='C:\\s6'");
+    const FolderStateTable::ReadScope reading(states);
+    EXPECT_EQ(states.getFolderState(L"C:\\s6\\x"), 8); // not what was so before
+    EXPECT_EQ(states.getFolderState(L"C:\\s6\\y"), 8);
+    EXPECT_EQ(states.getFolderState(L"C:\\s4\\y"), 4);
+}
+
+// The statements that are still there as a connection is closed.
+std::string& leftAtClose()
+{
+    static std::string left;
+    return left;
+}
+
+int watchClose(sqlite3* connection, char**, const void*)
+{
+    const auto onClose = [](unsigned, void*, void* closed, void*) {
+        for (sqlite3_stmt* each = nullptr; (each = sqlite3_next_stmt(static_cast<sqlite3*>(closed), each)) != nullptr;)
+            leftAtClose() += sqlite3_sql(each);
+        return 0;
+    };
+    return sqlite3_trace_v2(connection, SQLITE_TRACE_CLOSE, onClose, nullptr);
+}
+
+TEST(StateLookups, TheDeleteStatementOutlivesTheConnectionAndTheFileIsClosed)
+{
+    test::InstalledService service;
+    DbConnection database;
+    database.open(service.file(L"taviconf.dat"));
+    database.execDML("CREATE TABLE filesystem(state INTEGER, folder TEXT PRIMARY KEY)");
+    database.close();
+    sqlite3_auto_extension(reinterpret_cast<void (*)()>(&watchClose));
+    FolderStateTable();
+    sqlite3_reset_auto_extension();
+    EXPECT_EQ(leftAtClose(), "DELETE FROM filesystem WHERE folder=?");
+    EXPECT_TRUE(DeleteFileW(service.file(L"taviconf.dat").c_str()));
 }
 
 TEST(StateLookups, FilesAreKnownOrFifteen)
@@ -60,10 +99,19 @@ TEST(StateLookups, FilesAreKnownOrFifteen)
     EXPECT_EQ(lookup.getFileState(L"C:\\f"), 1);
     EXPECT_EQ(lookup.getFileState(L"C:\\null"), 0);
     EXPECT_EQ(lookup.getFileState(L"c:\\F"), 15);
+    {
+        test::TestDisk disk;
+        DbConnection writer;
+        writer.open(service.file(L"tavistate.dat"));
+        writer.execDML("begin exclusive transaction");
+        EXPECT_EQ(FileStateLookup().getFileState(L"C:\\f"), 15);
+        EXPECT_EQ(disk.waited(), 60000000);
+    }
     service.install().SetValue(L"DataPath", wxString(L"C:\\no such folder"));
     EXPECT_EQ(FileStateLookup().getFileState(L"C:\\f"), 15);
     const std::vector<std::string> expected = {
         "1: Error: Failed to retrieve file state (1: DB_ERROR[1]: )",
+        "1: Error: Failed to retrieve file state (5: DB_BUSY[5]: )",
         "1: Error: Failed to open file-state db (14: DB_CANTOPEN[14]: unable to open database file)"};
     EXPECT_EQ(log.take(), expected);
 }

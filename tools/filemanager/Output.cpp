@@ -69,6 +69,12 @@ void Output::startRecord()
     record_.clear();
 }
 
+void Output::stopRecord()
+{
+    const std::lock_guard<std::mutex> lock(mutex_);
+    recording_ = false;
+}
+
 std::wstring Output::record()
 {
     const std::lock_guard<std::mutex> lock(mutex_);

@@ -31,6 +31,7 @@ class Output {
     void mute(bool muted);
     // The lines since the last startRecord.
     void startRecord();
+    void stopRecord();
     std::wstring record();
 
   private:

@@ -409,6 +409,8 @@ void Script::play()
             ++lineNumber_;
             if (line.empty() || line[0] == L'#')
                 continue;
+            // The echo of a command is none of the output that the next one may ask about.
+            output_.stopRecord();
             output_.line(L"> " + line);
             runLine(line);
             if (ended_)
