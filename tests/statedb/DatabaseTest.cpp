@@ -44,12 +44,10 @@ TEST(Database, NamesEveryCode)
     for (std::wstring name; names >> name; ++code)
         EXPECT_EQ(DbException(code, L"x").message(), wxString::Format(L"DB_%s[%d]: x", name, code));
     EXPECT_EQ(code, 26);
-    EXPECT_EQ(DbException(5, L"database is locked").message(), L"DB_BUSY[5]: database is locked");
-    EXPECT_EQ(DbException(100, L"").message(), L"DB_ROW[100]: ");
-    EXPECT_EQ(DbException(101, L"").message(), L"DB_DONE[101]: ");
-    EXPECT_EQ(DbException(26, L"").message(), L"UNKNOWN_ERROR[26]: ");
-    EXPECT_EQ(DbException(999, L"").message(), L"UNKNOWN_ERROR[999]: ");
-    EXPECT_EQ(DbException(1000, L"y").message(), L"WDB_ERROR[1000]: y");
+    const std::pair<int, const wchar_t*> others[] = {
+        {100, L"DB_ROW"}, {101, L"DB_DONE"}, {1000, L"WDB_ERROR"}, {26, L"UNKNOWN_ERROR"}, {999, L"UNKNOWN_ERROR"}};
+    for (const auto& [number, name] : others)
+        EXPECT_EQ(DbException(number, L"y").message(), wxString::Format(L"%s[%d]: y", name, number));
 }
 
 TEST(Database, ReportsMisuseAndFailures)
@@ -57,8 +55,6 @@ TEST(Database, ReportsMisuseAndFailures)
     DbConnection connection = opened();
     DbStatement moved = connection.compileStatement("SELECT 1");
     const DbStatement taken = std::move(moved);
-    DbConnection movedConnection = opened();
-    const DbConnection takenConnection = std::move(movedConnection);
     DbStatement insert = connection.compileStatement("INSERT INTO t VALUES(?,?)");
     insert.bind(1, std::int32_t{1});
     insert.execDML();
@@ -69,31 +65,24 @@ TEST(Database, ReportsMisuseAndFailures)
         std::function<void()> action;
     } cases[] = {
         {L"WDB_ERROR[1000]: No Database opened", [] { DbConnection().execDML("SELECT 1"); }},
-        {L"WDB_ERROR[1000]: No Database opened", [] { DbConnection().compileStatement("SELECT 1"); }},
         {L"WDB_ERROR[1000]: No Database opened", [] { DbStatement().execDML(); }},
-        {L"WDB_ERROR[1000]: No Database opened", [&] { movedConnection.lastRowId(); }},
         {L"WDB_ERROR[1000]: Statement not accessible", [&] { connection.compileStatement("").execDML(); }},
         {L"WDB_ERROR[1000]: Statement not accessible", [&] { DbQuery().nextRow(); }},
         {L"WDB_ERROR[1000]: Statement not accessible", [&] { moved.reset(); }},
         {L"WDB_ERROR[1000]: Invalid field index", [&] { one.fieldText(-1, text); }},
         {L"WDB_ERROR[1000]: Invalid field index", [&] { one.fieldInt(1, 0); }},
         {L"DB_ERROR[1]: ", [&] { connection.compileStatement("SELEC"); }}, // the detail is left empty on purpose
-        {L"DB_ERROR[1]: ", [&] { connection.execQuery("SELECT * FROM missing"); }},
         {L"DB_ERROR[1]: no such table: missing", [&] { connection.execDML("DELETE FROM missing"); }},
         {L"DB_ERROR[1]: near \"\xE9\": syntax error", [&] { connection.execDML(wxString(L"\xE9 x")); }},
         {L"DB_RANGE[25]: Error binding string param", [&] { insert.bind(3, wxString(L"x")); }},
-        {L"DB_RANGE[25]: Error binding int param", [&] { insert.bind(0, std::int32_t{1}); }},
         {L"DB_RANGE[25]: Error binding int64 param", [&] { insert.bind(9, std::int64_t{1}); }},
         {L"DB_CONSTRAINT[19]: UNIQUE constraint failed: t.a", [&] { insert.execDML(); }},
         {L"DB_CANTOPEN[14]: unable to open database file", [] { DbConnection().open(L"/no such folder/x.db"); }},
         {L"nothing", [&] { insert.finalize(); }},
         {L"WDB_ERROR[1000]: Statement not accessible", [&] { insert.execDML(); }},
     };
-    for (const auto& test : cases) {
-        SCOPED_TRACE(test.expected);
-        const wxString thrown = thrownBy(test.action);
-        EXPECT_EQ(thrown, test.expected);
-    }
+    for (const auto& test : cases)
+        EXPECT_EQ(thrownBy(test.action), test.expected);
 }
 
 TEST(Database, WalksRowsAndKeepsBindings)
@@ -126,17 +115,6 @@ TEST(Database, WalksRowsAndKeepsBindings)
         {3, "plain"}, {3, "\xE6\x97\xA5\xC3\xA9"},       {3, ""}, {3, ""}, {1, "9223372036854775807"},
         {5, ""},      {4, std::string("a\0\xC3\xA9", 4)}};
     EXPECT_EQ(found, expected);
-    EXPECT_FALSE(connection.execQuery("SELECT 1 FROM t WHERE 0").nextRow());
-
-    DbStatement select = connection.compileStatement("SELECT a FROM t WHERE a>?");
-    select.bind(1, std::int32_t{6});
-    for (int run = 0; run < 2; ++run) {
-        DbQuery cursor = select.execQuery();
-        EXPECT_TRUE(cursor.nextRow());
-        EXPECT_EQ(cursor.fieldInt(0, 0), 7);
-        EXPECT_FALSE(cursor.nextRow());
-        select.reset();
-    }
 }
 
 TEST(Database, ARowThatFailsEmptiesStatementAndCursor)
@@ -183,8 +161,6 @@ TEST(Database, BeginsTheFlavourAskedFor)
         EXPECT_FALSE(connection.execQuery("SELECT * FROM t").nextRow());
     }
     sqlite3_close(other);
-    connection.close();
-    EXPECT_EQ(std::remove(path.c_str()), 0);
 }
 
 } // namespace

@@ -58,8 +58,7 @@ TEST_F(RestoreRequests, StandInTheDatabaseAsOneTransaction)
     EXPECT_EQ(perform(L"C:\\nothing there"), "");
     EXPECT_EQ(count("SELECT count(*) FROM restores"), 2); // one without files is stored as well
     EXPECT_EQ(count("SELECT count(*) FROM restore_files WHERE restore_id=1"), 2);
-    EXPECT_GE(count("SELECT min(request_time) FROM restores"), start);
-    EXPECT_LE(count("SELECT max(request_time) FROM restores"), static_cast<int>(std::time(nullptr)));
+    EXPECT_GE(count("SELECT min(request_time) FROM restores"), start); // the time of writing, not of the version
     EXPECT_EQ(count("SELECT count(*) FROM restores WHERE machine_id='' AND machine_alias='' AND encryption_key=''"), 2);
     // Times are bound as signed 32-bit numbers, attributes are octal in the manifest.
     EXPECT_EQ(count("SELECT count(*) FROM restore_files WHERE manifest_path='C:\\one\\a.txt' AND file_size=5 AND "

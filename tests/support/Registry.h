@@ -1,5 +1,6 @@
 #pragma once
 
+#include <filesystem>
 #include <string>
 
 #include <windows.h>
@@ -9,50 +10,30 @@
 
 namespace tavi::test {
 
-// A fresh folder that is deleted, with its files, at the end.
+// A fresh folder that is deleted with all that is in it.
 class TemporaryFolder {
   public:
     TemporaryFolder()
     {
         static unsigned number = 0;
-        wchar_t base[MAX_PATH];
-        GetTempPathW(MAX_PATH, base);
-        path_ = base + (L"tavi" + std::to_wstring(GetCurrentProcessId()) + L"-" + std::to_wstring(number++));
-        CreateDirectoryW(path_.c_str(), nullptr);
+        path_ = std::filesystem::temp_directory_path() /
+                ("tavi" + std::to_string(GetCurrentProcessId()) + "-" + std::to_string(number++));
+        std::filesystem::create_directory(path_);
     }
     TemporaryFolder(const TemporaryFolder&) = delete;
     TemporaryFolder& operator=(const TemporaryFolder&) = delete;
     ~TemporaryFolder()
     {
-        remove(path_);
+        std::error_code ignored;
+        std::filesystem::remove_all(path_, ignored);
     }
     const std::wstring& path() const
     {
-        return path_;
+        return path_.native();
     }
 
   private:
-    static void remove(const std::wstring& folder)
-    {
-        WIN32_FIND_DATAW found;
-        const HANDLE find = FindFirstFileW((folder + L"\\*").c_str(), &found);
-        if (find != INVALID_HANDLE_VALUE) {
-            do {
-                const std::wstring name = found.cFileName;
-                const std::wstring path = folder + L"\\" + name;
-                if (name == L"." || name == L"..")
-                    continue;
-                if (found.dwFileAttributes & FILE_ATTRIBUTE_DIRECTORY)
-                    remove(path);
-                else
-                    DeleteFileW(path.c_str());
-            } while (FindNextFileW(find, &found));
-            FindClose(find);
-        }
-        RemoveDirectoryW(folder.c_str());
-    }
-
-    std::wstring path_;
+    std::filesystem::path path_;
 };
 
 // The service's install key with both directories in a folder of their own; gone again at the end.
