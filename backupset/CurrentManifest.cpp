@@ -20,7 +20,7 @@ class SystemServices : public WatcherServices {
   public:
     const Manifest* loadManifest() override
     {
-        return loadStoredManifest();
+        return ReadStoredManifest();
     }
     bool manifestTime(std::int64_t& milliseconds) override
     {

@@ -17,8 +17,7 @@ void setExclusionBuilder(ExclusionBuilder builder) noexcept;
 // Asks the watcher to end; it does so within half a second, in its own time.
 void requestWatcherStop() noexcept;
 
-// Detach only: asks the watcher to end and drops the current manifest and the exclusion list. Does not wait for the
-// thread.
+// Detach only: asks the watcher to end and drops the current manifest. Does not wait for the thread.
 void StopManifestWatcher() noexcept;
 
 } // namespace tavi

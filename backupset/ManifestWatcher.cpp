@@ -26,7 +26,7 @@ void publish(WatcherState& state, const Manifest* manifest)
 
 } // namespace
 
-const Manifest* loadStoredManifest()
+const Manifest* ReadStoredManifest()
 {
     try {
         DbConnection database;
@@ -63,9 +63,11 @@ void RunManifestWatcher(WatcherState& state, WatcherServices& services)
         }
         if (stopping())
             return;
-        std::int64_t changed = 0;
-        if (services.manifestTime(changed) && changed > lastLoad)
-            load();
+        guarded("manifest check", [&] {
+            std::int64_t changed = 0;
+            if (services.manifestTime(changed) && changed > lastLoad)
+                load();
+        });
         if (++cycles % kCyclesPerExclusionBuild == 0)
             guarded("exclusion build", [&] { services.buildExclusions(false); });
     }

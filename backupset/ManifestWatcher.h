@@ -37,6 +37,6 @@ void RunManifestWatcher(WatcherState& state, WatcherServices& services);
 
 // The stored manifest, parsed: an empty one when there is none or the database fails, which is logged; null for an
 // invalid text.
-const Manifest* loadStoredManifest();
+const Manifest* ReadStoredManifest();
 
 } // namespace tavi

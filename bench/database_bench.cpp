@@ -30,7 +30,7 @@ void store(const std::vector<char>& blob)
 
 ManifestRef loaded(std::uint32_t files)
 {
-    const Manifest* manifest = loadStoredManifest();
+    const Manifest* manifest = ReadStoredManifest();
     manifest->AddRef();
     ManifestRef held(manifest);
     if (manifest->fileCount() != files)

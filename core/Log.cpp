@@ -7,6 +7,7 @@
 #include <windows.h>
 #include <wx/log.h>
 
+#include "core/CriticalSection.h"
 #include "core/InstallPaths.h"
 
 namespace tavi {
@@ -24,7 +25,7 @@ constexpr std::size_t kFileBuffer = 32768;
     return true;
 }();
 
-std::mutex silencerLock;
+CriticalSection silencerLock;
 int silencers = 0;
 bool loggingBefore = true;
 
@@ -45,14 +46,14 @@ class FileLogTarget : public wxLogStderr {
   protected:
     void DoLogRecord(wxLogLevel level, const wxString& message, const wxLogRecordInfo& info) override
     {
-        const std::lock_guard<std::mutex> hold(lock_);
+        const std::lock_guard<CriticalSection> hold(lock_);
         wxLogStderr::DoLogRecord(level, message.length() > kLongestMessage ? message.Left(kLongestMessage) : message,
                                  info);
     }
 
   private:
     std::FILE* file_;
-    std::mutex lock_;
+    CriticalSection lock_;
 };
 
 } // namespace
@@ -92,14 +93,14 @@ LogSilencer::LogSilencer()
 {
     // The library's flag is one for the process: two plain save-and-restore pairs that overlap could leave it off for
     // good.
-    const std::lock_guard<std::mutex> hold(silencerLock);
+    const std::lock_guard<CriticalSection> hold(silencerLock);
     if (silencers++ == 0)
         loggingBefore = wxLog::EnableLogging(false);
 }
 
 LogSilencer::~LogSilencer()
 {
-    const std::lock_guard<std::mutex> hold(silencerLock);
+    const std::lock_guard<CriticalSection> hold(silencerLock);
     if (--silencers == 0)
         wxLog::EnableLogging(loggingBefore);
 }

@@ -4,6 +4,7 @@
 #include <utility>
 
 #include <shlobj.h>
+#include <wx/private/threadinfo.h>
 
 #include "core/Boundary.h"
 #include "core/Handles.h"
@@ -31,6 +32,9 @@ DWORD WINAPI runModuleThread(void* parameter)
         owned.reset();
         start.body(start.argument);
     });
+    // The library keeps texts for each thread that it has translated for or logged from, and frees those of its own
+    // only.
+    guarded("thread clean-up", [] { wxThreadSpecificInfo::ThreadCleanUp(); });
     // A plain return would run through code that this very release may unmap.
     FreeLibraryAndExitThread(start.mapping, 0);
 }

@@ -8,7 +8,7 @@
 
 extern "C" BOOL WINAPI DllMain(HINSTANCE instance, DWORD reason, LPVOID);
 
-extern "C" BOOL WINAPI DllMain(HINSTANCE instance, DWORD reason, LPVOID)
+extern "C" BOOL WINAPI DllMain(HINSTANCE instance, DWORD reason, LPVOID reserved)
 {
     using namespace tavi;
     return guarded("DllMain", BOOL{TRUE}, [&]() -> BOOL {
@@ -29,7 +29,7 @@ extern "C" BOOL WINAPI DllMain(HINSTANCE instance, DWORD reason, LPVOID)
             else
                 setModuleInstance(instance);
         } else if (reason == DLL_PROCESS_DETACH && kind == HostKind::fileManager) {
-            detachFromFileManager();
+            detachFromFileManager(reserved != nullptr);
         }
         return TRUE;
     });

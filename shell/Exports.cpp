@@ -12,7 +12,7 @@ using namespace tavi;
 
 STDAPI DllGetClassObject(REFCLSID classId, REFIID interfaceId, void** object)
 {
-    return guarded("DllGetClassObject", E_FAIL, [&]() -> HRESULT {
+    return guarded("DllGetClassObject", E_OUTOFMEMORY, [&]() -> HRESULT {
         if (!object)
             return E_POINTER;
         *object = nullptr;

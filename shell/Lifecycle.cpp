@@ -6,6 +6,7 @@
 
 #include "backupset/CurrentManifest.h"
 #include "core/Log.h"
+#include "statedb/Database.h"
 #include "ui/MenuBitmap.h"
 
 namespace tavi {
@@ -53,13 +54,15 @@ void attachToFileManager(HINSTANCE instance, const wchar_t* hostPath)
     StartStatusThread();
 }
 
-void detachFromFileManager()
+void detachFromFileManager(bool processEnds)
 {
     releaseShellAllocator();
     freeMenuBitmaps();
     StopManifestWatcher();
     statusStopFlag = true;
     StopStatusThread();
+    if (!processEnds)
+        shutDownDatabaseLibrary();
     CloseLog();
 }
 

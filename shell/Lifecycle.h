@@ -14,7 +14,8 @@ enum class HostKind { refused, toolOnly, fileManager };
 HostKind hostKindOf(const wchar_t* executablePath) noexcept;
 
 void attachToFileManager(HINSTANCE instance, const wchar_t* hostPath);
-void detachFromFileManager();
+// `processEnds`: nothing is unloaded, so what the system takes back by itself may stay.
+void detachFromFileManager(bool processEnds);
 
 // The status listener's thread. The body is set before attach by whoever implements it; without one no thread starts.
 void setStatusListener(ThreadBody body) noexcept;

@@ -40,6 +40,8 @@ class StubFolder final : public IPersistFolder, public IShellFolder {
     ~StubFolder() = default;
 
     ULONG references_ = 0;
+    // Required in the object, though no operation reads it.
+    [[maybe_unused]] std::int32_t unread_ = -1;
     ModuleLock lock_;
 };
 

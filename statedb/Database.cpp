@@ -132,6 +132,11 @@ bool isRowOrDone(int result)
 
 } // namespace
 
+void shutDownDatabaseLibrary() noexcept
+{
+    sqlite3_shutdown();
+}
+
 DbException::DbException(int code, const wxString& detail)
     : code_(code), message_(wxString::Format(L"%s[%d]: ", nameOf(code), code) + detail), utf8_(toUtf8(view(message_)))
 {

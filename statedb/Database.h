@@ -41,6 +41,9 @@ class DbException : public std::exception {
     std::string utf8_;
 };
 
+// Gives back what the database library holds for the process. Only when no connection is open and none will be opened.
+void shutDownDatabaseLibrary() noexcept;
+
 // A statement handle that a statement and its cursors share: whoever finalizes it, the others find it empty.
 using StatementSlot = std::shared_ptr<sqlite3_stmt*>;
 

@@ -38,13 +38,14 @@ std::size_t bytesOfUnits(const std::string& text, std::size_t units)
     return std::min(at, text.size());
 }
 
-// Puts " (n)" before the extension. A name without one gets it at its end, and so does one whose only dot begins it.
+// Puts " (n)" before the extension. A name without one gets it at its end; one that begins with its
+// last dot is all extension.
 void insertFreeName(std::string& path, std::uint32_t number)
 {
     const std::size_t slash = path.rfind('\\');
     const std::size_t nameStart = slash == std::string::npos ? 0 : slash + 1;
     std::size_t dot = path.rfind('.');
-    if (dot == std::string::npos || dot <= nameStart)
+    if (dot == std::string::npos || dot < nameStart)
         dot = path.size();
     path.insert(dot, " (" + std::to_string(number) + ")");
 }

@@ -2,9 +2,9 @@
 
 #include <mutex>
 
-#include <windows.h>
 #include <wx/log.h>
 
+#include "core/CriticalSection.h"
 #include "core/InstallPaths.h"
 
 namespace tavi {
@@ -33,32 +33,6 @@ std::int32_t inherited(std::int32_t state)
         return state;
     }
 }
-
-// Not the library's mutex: what that one makes stays behind when the module is unloaded.
-class CriticalSection {
-  public:
-    CriticalSection() noexcept
-    {
-        InitializeCriticalSection(&section_);
-    }
-    CriticalSection(const CriticalSection&) = delete;
-    CriticalSection& operator=(const CriticalSection&) = delete;
-    ~CriticalSection()
-    {
-        DeleteCriticalSection(&section_);
-    }
-    void lock() noexcept
-    {
-        EnterCriticalSection(&section_);
-    }
-    void unlock() noexcept
-    {
-        LeaveCriticalSection(&section_);
-    }
-
-  private:
-    CRITICAL_SECTION section_;
-};
 
 CriticalSection& fileStateLock()
 {

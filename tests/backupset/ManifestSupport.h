@@ -1,10 +1,10 @@
 #pragma once
 
-#include <cstdio>
+#include <sstream>
 #include <string>
 
-#include <gtest/gtest.h>
-#include <zlib.h>
+#include <wx/mstream.h>
+#include <wx/zstream.h>
 
 #include "backupset/ManifestParser.h"
 #include "backupset/StoredManifest.h"
@@ -12,20 +12,12 @@
 
 namespace tavi::test {
 
-// gzip instead of zlib with windowBits 31.
-inline std::string packed(const std::string& text, int windowBits = 15)
+inline std::string packed(const std::string& text, int format = wxZLIB_ZLIB)
 {
-    z_stream stream{};
-    deflateInit2(&stream, 1, Z_DEFLATED, windowBits, 8, Z_DEFAULT_STRATEGY);
-    std::string out(deflateBound(&stream, static_cast<uLong>(text.size())) + 64, '\0');
-    stream.next_in = reinterpret_cast<Bytef*>(const_cast<char*>(text.data()));
-    stream.avail_in = static_cast<uInt>(text.size());
-    stream.next_out = reinterpret_cast<Bytef*>(out.data());
-    stream.avail_out = static_cast<uInt>(out.size());
-    EXPECT_EQ(deflate(&stream, Z_FINISH), Z_STREAM_END);
-    out.resize(stream.total_out);
-    deflateEnd(&stream);
-    return out;
+    wxMemoryOutputStream blob;
+    wxZlibOutputStream(blob, 1, format).Write(text.data(), text.size());
+    const auto* start = static_cast<const char*>(blob.GetOutputStreamBuffer()->GetBufferStart());
+    return {start, static_cast<std::size_t>(blob.GetLength())};
 }
 
 inline ManifestRef held(const Manifest* manifest)
@@ -48,18 +40,14 @@ inline std::string utf8(const wxString& text)
 // The versions as the fields of the longest layout, attributes in octal.
 inline std::string dump(const ManifestPatchList& patches)
 {
-    std::string out;
+    std::ostringstream out;
     for (std::size_t i = 0; i < patches.size(); ++i) {
         const ManifestPatch patch = patches[i];
-        char octal[16];
-        std::snprintf(octal, sizeof octal, "%o", static_cast<unsigned>(patch.attributes()));
-        for (const auto& field : {std::to_string(patch.timestamp()), std::to_string(patch.modifiedTime()),
-                                  std::to_string(patch.ctime()), std::to_string(patch.fileSize()),
-                                  std::to_string(patch.aux1()), utf8(patch.auxText()), std::to_string(patch.aux2())})
-            out += field + ':';
-        out += octal + std::string(" ");
+        out << std::dec << patch.timestamp() << ':' << patch.modifiedTime() << ':' << patch.ctime() << ':'
+            << patch.fileSize() << ':' << patch.aux1() << ':' << utf8(patch.auxText()) << ':' << patch.aux2() << ':'
+            << std::oct << static_cast<unsigned>(patch.attributes()) << ' ';
     }
-    return out;
+    return out.str();
 }
 
 // "hash[user]" if either is not the initial one, then each file and its versions.

@@ -1,6 +1,5 @@
 #include "core/PublishedPointer.h"
 
-#include <memory>
 #include <thread>
 #include <vector>
 

@@ -101,7 +101,7 @@ TEST(RestorePlanner, FindsFreeNames)
                  {"report.txt", 9999, "report (9999).txt"},
                  {"report.txt", 10000, "report (10000).txt"}, // the last one is used unasked
                  {"README", 1, "README (1)"},
-                 {".profile", 1, ".profile (1)"},
+                 {".profile", 1, " (1).profile"},
                  {"ends.", 1, "ends (1)."}};
     for (const auto& test : cases) {
         const std::string path = std::string("C:/dotted.dir/") + test.name;

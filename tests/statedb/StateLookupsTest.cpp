@@ -1,7 +1,6 @@
 #include "statedb/StateLookups.h"
 
 #include <gtest/gtest.h>
-#include <sqlite3.h>
 #include <wx/log.h>
 
 #include "tests/support/LogCapture.h"
@@ -50,37 +49,6 @@ TEST(StateLookups, FoldersInheritFromTheNearestRecordedOne)
     const FolderStateTable::ReadScope reading(states);
     EXPECT_EQ(states.getFolderState(L"C:\\s6\\x"), 8); // not what was so before
     EXPECT_EQ(states.getFolderState(L"C:\\s4\\y"), 4);
-}
-
-// The statements that are still there as a connection is closed.
-std::string& leftAtClose()
-{
-    static std::string left;
-    return left;
-}
-
-int watchClose(sqlite3* connection, char**, const void*)
-{
-    const auto onClose = [](unsigned, void*, void* closed, void*) {
-        for (sqlite3_stmt* each = nullptr; (each = sqlite3_next_stmt(static_cast<sqlite3*>(closed), each)) != nullptr;)
-            leftAtClose() += sqlite3_sql(each);
-        return 0;
-    };
-    return sqlite3_trace_v2(connection, SQLITE_TRACE_CLOSE, onClose, nullptr);
-}
-
-TEST(StateLookups, TheDeleteStatementOutlivesTheConnectionAndTheFileIsClosed)
-{
-    test::InstalledService service;
-    DbConnection database;
-    database.open(service.file(L"taviconf.dat"));
-    database.execDML("CREATE TABLE filesystem(state INTEGER, folder TEXT PRIMARY KEY)");
-    database.close();
-    sqlite3_auto_extension(reinterpret_cast<void (*)()>(&watchClose));
-    FolderStateTable();
-    sqlite3_reset_auto_extension();
-    EXPECT_EQ(leftAtClose(), "DELETE FROM filesystem WHERE folder=?");
-    EXPECT_TRUE(DeleteFileW(service.file(L"taviconf.dat").c_str()));
 }
 
 TEST(StateLookups, FilesAreKnownOrFifteen)

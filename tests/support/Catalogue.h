@@ -1,70 +1,32 @@
 #pragma once
 
-#include <cstdint>
-#include <map>
+#include <fstream>
 #include <string>
 
-#include <wx/arrstr.h>
+#include <windows.h>
 #include <wx/translation.h>
-
-#include "core/Text.h"
 
 namespace tavi::test {
 
-// A message catalogue in force for as long as it lives: the given texts, each translated as shown.
-class Catalogue {
-  public:
-    using Texts = std::map<wxString, wxString>;
-    explicit Catalogue(const Texts& texts)
+// Puts a message catalogue of one text into a folder and in force until the end of its life.
+struct Catalogue {
+    Catalogue(const std::wstring& folder, const std::string& text, const std::string& translation)
     {
-        auto* const translations = new wxTranslations;
-        translations->SetLoader(new Loader(texts));
-        translations->SetLanguage("de");
-        wxTranslations::Set(translations);
-        translations->AddCatalog("tavi", wxLANGUAGE_ENGLISH);
+        // The file form of gettext: a header, the length and offset of either text, the texts.
+        const auto length = static_cast<unsigned>(text.size()), after = static_cast<unsigned>(translation.size());
+        const unsigned head[] = {0x950412de, 0, 1, 28, 36, 0, 0, length, 44, after, 45 + length};
+        CreateDirectoryW((folder + L"\\de").c_str(), nullptr);
+        std::ofstream((folder + L"\\de\\tavi.mo").c_str(), std::ios::binary)
+            << std::string(reinterpret_cast<const char*>(head), sizeof(head)) << text << '\0' << translation << '\0';
+        wxFileTranslationsLoader::AddCatalogLookupPathPrefix(folder);
+        wxTranslations::Set(new wxTranslations);
+        wxTranslations::Get()->SetLanguage("de");
+        wxTranslations::Get()->AddCatalog("tavi", wxLANGUAGE_ENGLISH);
     }
-    Catalogue(const Catalogue&) = delete;
-    Catalogue& operator=(const Catalogue&) = delete;
     ~Catalogue()
     {
         wxTranslations::Set(nullptr);
     }
-
-  private:
-    class Loader : public wxTranslationsLoader {
-      public:
-        explicit Loader(Texts texts)
-        {
-            // The file form of gettext: a header, two tables of (length, offset) in the order of the originals, the
-            // texts.
-            texts[""] = "Content-Type: text/plain; charset=UTF-8\n";
-            const auto count = static_cast<std::uint32_t>(texts.size());
-            const std::uint32_t header[] = {0x950412de, 0, count, 28, 28 + 8 * count, 0, 0};
-            std::string tables[2], data;
-            for (const auto& entry : texts) {
-                for (int table = 0; table < 2; ++table) {
-                    const std::string text = toUtf8(view(table == 0 ? entry.first : entry.second));
-                    const std::uint32_t place[] = {static_cast<std::uint32_t>(text.size()),
-                                                   static_cast<std::uint32_t>(28 + 16 * count + data.size())};
-                    tables[table].append(reinterpret_cast<const char*>(place), sizeof(place));
-                    data.append(text.c_str(), text.size() + 1);
-                }
-            }
-            file_ = std::string(reinterpret_cast<const char*>(header), sizeof(header)) + tables[0] + tables[1] + data;
-        }
-        wxMsgCatalog* LoadCatalog(const wxString& domain, const wxString&) override
-        {
-            return wxMsgCatalog::CreateFromData(wxScopedCharBuffer::CreateNonOwned(file_.data(), file_.size()), domain);
-        }
-        wxArrayString GetAvailableTranslations(const wxString&) const override
-        {
-            return wxArrayString(1, &kLanguage);
-        }
-
-      private:
-        const wxString kLanguage = "de";
-        std::string file_;
-    };
 };
 
 } // namespace tavi::test

@@ -5,10 +5,9 @@
 #include <vector>
 
 #include <gtest/gtest.h>
-#include <sqlite3.h>
 
 #include "core/Handles.h"
-#include "core/Text.h"
+#include "statedb/Database.h"
 #include "statedb/StateLookups.h"
 #include "tests/support/LogCapture.h"
 #include "tests/support/Registry.h"
@@ -16,64 +15,20 @@
 namespace tavi {
 namespace {
 
-using test::InstalledService;
-using test::TemporaryFolder;
-
-// A data object made by hand: it offers one block, and counts how often the block is given back.
-class BlockData final : public IDataObject {
-  public:
-    explicit BlockData(std::vector<UINT> words) : words_(std::move(words)) {}
-    STDMETHODIMP_(ULONG) Release() override
-    {
-        ++releases;
-        return 1;
-    }
-    STDMETHODIMP GetData(FORMATETC* request, STGMEDIUM* medium) override
-    {
-        if (request->lindex != -1 || request->tymed != TYMED_HGLOBAL || request->dwAspect != DVASPECT_CONTENT)
-            return DV_E_FORMATETC;
-        const std::size_t bytes = words_.size() * sizeof(UINT);
-        medium->tymed = TYMED_HGLOBAL;
-        medium->hGlobal = GlobalAlloc(GMEM_MOVEABLE, bytes);
-        medium->pUnkForRelease = this;
-        std::copy(words_.begin(), words_.end(), static_cast<UINT*>(GlobalLock(medium->hGlobal)));
-        GlobalUnlock(medium->hGlobal);
-        return S_OK;
-    }
-    // clang-format off
-    STDMETHODIMP QueryInterface(REFIID, void**) override { return E_NOINTERFACE; }
-    STDMETHODIMP_(ULONG) AddRef() override { return 2; }
-    STDMETHODIMP GetDataHere(FORMATETC*, STGMEDIUM*) override { return E_NOTIMPL; }
-    STDMETHODIMP QueryGetData(FORMATETC*) override { return E_NOTIMPL; }
-    STDMETHODIMP GetCanonicalFormatEtc(FORMATETC*, FORMATETC*) override { return E_NOTIMPL; }
-    STDMETHODIMP SetData(FORMATETC*, STGMEDIUM*, BOOL) override { return E_NOTIMPL; }
-    STDMETHODIMP EnumFormatEtc(DWORD, IEnumFORMATETC**) override { return E_NOTIMPL; }
-    STDMETHODIMP DAdvise(FORMATETC*, DWORD, IAdviseSink*, DWORD*) override { return E_NOTIMPL; }
-    STDMETHODIMP DUnadvise(DWORD) override { return E_NOTIMPL; }
-    STDMETHODIMP EnumDAdvise(IEnumSTATDATA**) override { return E_NOTIMPL; }
-    // clang-format on
-
-    int releases = 0;
-
-  private:
-    std::vector<UINT> words_;
-};
-
-// The shell's own data object for items of one folder; all paths must have the same parent.
-ComPtr<IDataObject> shellData(const std::vector<std::wstring>& paths)
+// The shell's id list of a path, or the last id of it, as bytes.
+std::string idsOf(const wxString& path, bool lastOnly = false)
 {
-    ComPtr<IShellFolder> parent;
-    std::vector<LPITEMIDLIST> lists(paths.size());
-    std::vector<LPCITEMIDLIST> children(paths.size());
-    for (std::size_t i = 0; i < paths.size(); ++i) {
-        EXPECT_EQ(SHParseDisplayName(paths[i].c_str(), nullptr, &lists[i], 0, nullptr), S_OK) << paths[i];
-        SHBindToParent(lists[i], IID_IShellFolder, parent.outVoid(), &children[i]);
-    }
-    ComPtr<IDataObject> data;
-    parent->GetUIObjectOf(nullptr, static_cast<UINT>(paths.size()), children.data(), IID_IDataObject, nullptr,
-                          data.outVoid());
-    std::for_each(lists.begin(), lists.end(), ILFree);
-    return data;
+    LPITEMIDLIST list = nullptr;
+    EXPECT_EQ(SHParseDisplayName(path.wc_str(), nullptr, &list, 0, nullptr), S_OK) << path;
+    const LPCITEMIDLIST from = lastOnly ? ILFindLastID(list) : list;
+    const std::string ids(reinterpret_cast<const char*>(from), ILGetSize(from));
+    ILFree(list);
+    return ids;
+}
+
+LPCITEMIDLIST asList(const std::string& ids)
+{
+    return reinterpret_cast<LPCITEMIDLIST>(ids.data());
 }
 
 UINT driveType = DRIVE_FIXED;
@@ -82,155 +37,155 @@ UINT WINAPI chosenDriveType(LPCWSTR)
     return driveType;
 }
 
-PathSet pathSet(const std::vector<std::wstring>& paths)
+// What is taken from the shell's own data object for items of a folder.
+PathSet collect(const wxString& parent, const std::vector<std::string>& items, LPCITEMIDLIST background = nullptr)
 {
-    return PathSet(paths.begin(), paths.end());
+    std::vector<LPCITEMIDLIST> lists;
+    std::transform(items.begin(), items.end(), std::back_inserter(lists), asList);
+    ComPtr<IShellFolder> desktop, folder;
+    ComPtr<IDataObject> data;
+    SHGetDesktopFolder(desktop.out());
+    desktop->BindToObject(asList(idsOf(parent)), nullptr, IID_IShellFolder, folder.outVoid());
+    folder->GetUIObjectOf(nullptr, UINT(lists.size()), lists.data(), IID_IDataObject, nullptr, data.outVoid());
+    return collectPaths(background, data.get(), chosenDriveType);
 }
 
-class SelectionTest : public testing::Test {
-  protected:
+struct SelectionTest : testing::Test {
     SelectionTest()
     {
-        CreateDirectoryW((folder_.path() + L"\\sub").c_str(), nullptr);
-        for (const wchar_t* name : {L"a.txt", L"b.txt", L"\u65e5\u672c.txt"})
-            std::ofstream((folder_.path() + L"\\" + name).c_str());
+        CreateDirectoryW(in(L"sub").wc_str(), nullptr);
+        std::ofstream(in(L"a.txt").wc_str());
         driveType = DRIVE_FIXED;
-        OleInitialize(nullptr);
     }
-    ~SelectionTest() override
+    wxString in(const wxString& name) const
     {
-        OleUninitialize();
-    }
-    std::wstring in(const wchar_t* name) const
-    {
-        return folder_.path() + L"\\" + name;
+        return folder.path() + L"\\" + name;
     }
 
-    test::LogCapture log_;
-    InstalledService service_;
-    TemporaryFolder folder_;
+    test::LogCapture log;
+    test::InstalledService service;
+    test::TemporaryFolder folder;
 };
 
 TEST_F(SelectionTest, TakesTheShellsItems)
 {
-    const std::vector<std::wstring> files = {in(L"a.txt"), in(L"\u65e5\u672c.txt"), in(L"sub")};
-    EXPECT_EQ(collectPaths(nullptr, shellData(files).get(), chosenDriveType), pathSet(files));
-
+    const wxString here = folder.path(), rare = in(L"\u65e5\U0001F4BE.txt"),
+                   computer = L"::{20D04FE0-3AEA-1069-A2D8-08002B30309D}",
+                   controlPanel = computer + L"\\::{21EC2020-3AEA-1069-A2DD-08002B30309D}";
+    std::ofstream(rare.wc_str());
+    const std::vector<std::string> items = {idsOf(in(L"a.txt"), true), idsOf(rare, true), idsOf(in(L"sub"), true)};
+    EXPECT_EQ(collect(here, items), PathSet({in(L"a.txt"), rare, in(L"sub")}));
     // A click on a folder's background: the folder is all there is.
-    LPITEMIDLIST background = nullptr;
-    ASSERT_EQ(SHParseDisplayName(folder_.path().c_str(), nullptr, &background, 0, nullptr), S_OK);
-    EXPECT_EQ(collectPaths(background, nullptr, chosenDriveType), pathSet({folder_.path()}));
-    EXPECT_EQ(collectPaths(background, shellData(files).get(), chosenDriveType).size(), 4u);
-    ILFree(background);
-
-    // Items without a path: the control panel and the recycle bin.
-    for (const wchar_t* name : {L"::{20D04FE0-3AEA-1069-A2D8-08002B30309D}\\::{21EC2020-3AEA-1069-A2DD-08002B30309D}",
-                                L"::{645FF040-5081-101B-9F08-00AA002F954E}"})
-        EXPECT_TRUE(collectPaths(nullptr, shellData({name}).get(), chosenDriveType).empty());
+    const std::string background = idsOf(here);
+    EXPECT_EQ(collectPaths(asList(background), nullptr, chosenDriveType), PathSet({here}));
+    EXPECT_EQ(collect(here, items, asList(background)).size(), 4u);
+    // Of what is no file, roots of fixed drives only.
+    for (driveType = DRIVE_UNKNOWN; driveType <= DRIVE_RAMDISK; ++driveType) {
+        EXPECT_EQ(collect(computer, {idsOf(controlPanel, true), idsOf(L"C:\\", true)}),
+                  driveType == DRIVE_FIXED ? PathSet({L"C:\\"}) : PathSet());
+        EXPECT_EQ(collect(here, items).size(), 3u);
+    }
 }
 
-TEST_F(SelectionTest, TakesRootsOfFixedDrivesOnly)
+TEST_F(SelectionTest, TakesManyItemsButNoneTooLong)
 {
-    for (const int type :
-         {DRIVE_UNKNOWN, DRIVE_NO_ROOT_DIR, DRIVE_REMOVABLE, DRIVE_FIXED, DRIVE_REMOTE, DRIVE_CDROM, DRIVE_RAMDISK}) {
-        driveType = static_cast<UINT>(type);
-        EXPECT_EQ(collectPaths(nullptr, shellData({L"C:\\"}).get(), chosenDriveType),
-                  type == DRIVE_FIXED ? pathSet({L"C:\\"}) : PathSet());
-        EXPECT_EQ(collectPaths(nullptr, shellData({in(L"a.txt")}).get(), chosenDriveType), pathSet({in(L"a.txt")}));
+    const wxString parent = in(wxString(L'd', 199 - folder.path().size())), name = L"00000" + wxString(L'f', 53);
+    CreateDirectoryW(parent.wc_str(), nullptr);
+    std::vector<std::string> items;
+    for (const wxString& each : {name, name + L"f"}) {
+        std::ofstream(in(each).wc_str());
+        items.push_back(idsOf(in(each), true));
     }
+    // The first one again and again, each with another number in its name.
+    const auto bytes = [](const wxString& text) {
+        return std::string(reinterpret_cast<const char*>(text.wx_str()), 10);
+    };
+    std::string item = items[0];
+    for (int i = 10001; i < 80000; ++i)
+        items.push_back(item.replace(items[0].find(bytes(name)), 10, bytes(std::to_wstring(i))));
+    const DWORD start = GetTickCount();
+    const PathSet paths = collect(parent, items);
+    EXPECT_LT(GetTickCount() - start, 3000u);
+    EXPECT_EQ(paths.size(), 70000u);
+    EXPECT_EQ(paths.count(parent + L"\\79999" + name.substr(5)), 1u);
 }
 
 TEST_F(SelectionTest, NeverReadsOutsideAForgedBlock)
 {
-    EXPECT_TRUE(collectPaths(nullptr, nullptr, chosenDriveType).empty());
     // Counts and offsets beyond the block, and lists that do not end inside it.
-    const std::vector<UINT> blocks[] = {{},
-                                        {0},
+    const std::vector<UINT> blocks[] = {{0},
                                         {1},
                                         {0, 8},
                                         {1, 12, 0x10000},
                                         {0x40000000, 0},
                                         {0xFFFFFFFF, 0},
                                         {0xFFFFFFFE, 0, 0},
+                                        {1, 12, 15, 0},
                                         {1, 12, 14, 0x7FFF0000},
                                         {1, 12, 14, 0x00010000},
                                         {1, 0xFFFFFFFF, 0xFFFFFFF0, 0},
-                                        {1, 12, 15, 0},
                                         {1, 12, 16, 0, 4, 4}};
+    FORMATETC format{static_cast<CLIPFORMAT>(RegisterClipboardFormatW(L"Shell IDList Array")), nullptr,
+                     DVASPECT_CONTENT, -1, TYMED_HGLOBAL};
     for (const auto& block : blocks) {
-        BlockData data(block);
-        EXPECT_TRUE(collectPaths(nullptr, &data, chosenDriveType).empty()) << testing::PrintToString(block);
-        EXPECT_EQ(data.releases, 1);
+        // OLE's own store of data takes any block.
+        ComPtr<IOleCache> cache;
+        ComPtr<IDataObject> data;
+        CreateDataCache(nullptr, CLSID_NULL, IID_IOleCache, cache.outVoid());
+        STGMEDIUM medium{TYMED_HGLOBAL, {}, nullptr};
+        medium.hGlobal = GlobalAlloc(GMEM_MOVEABLE, block.size() * sizeof(UINT));
+        std::copy(block.begin(), block.end(), static_cast<UINT*>(GlobalLock(medium.hGlobal)));
+        GlobalUnlock(medium.hGlobal);
+        DWORD connection = 0;
+        cache->Cache(&format, 0, &connection);
+        EXPECT_EQ(cache->SetData(&format, &medium, TRUE), S_OK);
+        cache->QueryInterface(IID_IDataObject, data.outVoid());
+        EXPECT_EQ(data->GetData(&format, &medium), S_OK);
+        ReleaseStgMedium(&medium);
+        EXPECT_TRUE(collectPaths(nullptr, data.get(), chosenDriveType).empty()) << testing::PrintToString(block);
     }
 }
 
-TEST_F(SelectionTest, TellsWhatHasVersions)
+TEST_F(SelectionTest, SummarizesVersionsAndStates)
 {
-    const std::wstring base = folder_.path();
-    const ManifestRef manifest(Manifest::Parse(
-        wxString(L"FILES\n" + base + L"\\a.txt\n5:5:5:9:0::0:0\n6:6:6:-1:0::0:0\n\n" + base +
-                 L"\\sub\\deep\\c.txt\n5:5:5:9:0::0:0\n\n" + base + L"\\gone.txt\n5:5:5:9:0::0:0\n\n")));
-    ASSERT_TRUE(manifest);
+    const ManifestRef manifest(Manifest::Parse(L"FILES\n" + in(L"a.txt\n5:5:5:9:0::0:0\n6:6:6:-1:0::0:0\n\n") +
+                                               in(L"sub\\deep\\c.txt\n5:5:5:9:0::0:0\n")));
     manifest.get()->AddRef();
+    DbConnection database;
+    database.open(service.file(L"taviconf.dat"));
+    database.execDML("CREATE TABLE filesystem(folder TEXT PRIMARY KEY, state INTEGER)");
+    for (const wxString& value : {folder.path() + L"',2", in(L"sub',6"), in(L"b.txt',7")})
+        database.execDML(L"INSERT INTO filesystem VALUES('" + value + L")");
     const struct {
-        std::vector<std::wstring> paths;
-        int restoreMode;
+        PathSet paths;
+        int restoreMode, states;
         bool isFolder;
         const wchar_t* name;
     } cases[] = {
-        {{}, 0, false, L""},
-        {{in(L"a.txt")}, 1, false, L"a.txt"},
-        {{in(L"A.TXT")}, 0, false, L"A.TXT"},
-        {{in(L"b.txt")}, 0, false, L"b.txt"},
-        {{in(L"gone.txt")}, 1, false, L"gone.txt"},
-        {{in(L"sub")}, 1, true, L"sub"},
-        {{in(L"sub\\")}, 1, true, L""},
-        {{in(L"su")}, 0, false, L"su"},
-        {{in(L"a.txt"), in(L"b.txt")}, -1, false, L""},
-        {{in(L"a.txt"), in(L"b.txt"), in(L"sub"), in(L"gone.txt")}, -1, true, L""},
-        {{in(L"a.txt"), in(L"sub")}, 1, true, L""},
-        {{L"C:\\"}, base[0] == L'C' ? 1 : 0, true, L""},
+        {{}, 0, 0, false, L""},
+        {{in(L"a.txt")}, 1, 0, false, L"a.txt"},
+        {{in(L"A.TXT")}, 0, 0, false, L"A.TXT"},
+        {{in(L"sub")}, 1, 1, true, L"sub"},
+        {{in(L"sub\\")}, 1, 1, true, L""},
+        {{in(L"su")}, 0, 0, false, L"su"},
+        {{in(L"a.txt"), in(L"b.txt")}, -1, -1, false, L""},
+        {{in(L"a.txt"), in(L"b.txt"), in(L"sub"), in(L"gone.txt")}, -1, -1, true, L""},
+        {{in(L"sub\\deep\\c.txt"), in(L"sub")}, 1, 1, true, L""},
     };
+    FolderStateTable states;
     for (const auto& test : cases) {
-        Selection selection;
-        selection.isFolder = true;
-        selection.paths = pathSet(test.paths);
+        Selection selection{test.paths, 0, 5, true, L"?"};
         summarizeVersions(selection, manifest.get());
-        EXPECT_EQ(selection.restoreMode, test.restoreMode) << testing::PrintToString(test.paths);
-        EXPECT_EQ(selection.isFolder, test.isFolder) << testing::PrintToString(test.paths);
-        EXPECT_EQ(selection.displayName.ToStdWstring(), test.name);
+        EXPECT_EQ(selection.restoreMode, test.restoreMode) << &test - cases;
+        EXPECT_EQ(selection.isFolder, test.isFolder) << &test - cases;
+        EXPECT_EQ(selection.displayName, test.name);
+        EXPECT_EQ(summarizeStates(selection.paths, states), test.states) << &test - cases;
         summarizeVersions(selection, nullptr);
-        EXPECT_EQ(selection.restoreMode, 0);
-        EXPECT_FALSE(selection.isFolder);
+        EXPECT_TRUE(selection.restoreMode == 0 && !selection.isFolder);
     }
-}
-
-TEST_F(SelectionTest, SummarizesFolderStates)
-{
-    sqlite3* database = nullptr;
-    ASSERT_EQ(sqlite3_open(toUtf8(service_.file(L"taviconf.dat")).c_str(), &database), SQLITE_OK);
-    const auto run = [&](const char* sql) {
-        ASSERT_EQ(sqlite3_exec(database, sql, nullptr, nullptr, nullptr), SQLITE_OK);
-    };
-    run("CREATE TABLE filesystem(folder TEXT PRIMARY KEY, state INTEGER);"
-        "INSERT INTO filesystem VALUES('C:\\six',6),('C:\\one',1),('C:\\two',2)");
-    {
-        FolderStateTable states;
-        const struct {
-            std::vector<std::wstring> paths;
-            int summary;
-        } cases[] = {{{}, 0},
-                     {{L"C:\\six"}, 1},
-                     {{L"C:\\six", L"C:\\one\\below"}, 1},
-                     {{L"C:\\two", L"C:\\one", L"D:\\none"}, 0},
-                     {{L"C:\\six", L"C:\\two", L"C:\\six\\below"}, -1}};
-        for (const auto& test : cases)
-            EXPECT_EQ(summarizeStates(pathSet(test.paths), states), test.summary) << testing::PrintToString(test.paths);
-        // A table that can no longer be read: every item is of the second kind.
-        run("DROP TABLE filesystem");
-        EXPECT_EQ(summarizeStates(pathSet({L"C:\\six"}), states), 0);
-    }
-    sqlite3_close(database);
+    // A table that can no longer be read: every item is of the second kind.
+    database.execDML("DROP TABLE filesystem");
+    EXPECT_EQ(summarizeStates({in(L"sub")}, states), 0);
 }
 
 } // namespace

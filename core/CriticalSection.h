@@ -1,0 +1,33 @@
+#pragma once
+
+#include <windows.h>
+
+namespace tavi {
+
+// Not the library's mutex: what that one makes stays behind when the module is unloaded.
+class CriticalSection {
+  public:
+    CriticalSection() noexcept
+    {
+        InitializeCriticalSection(&section_);
+    }
+    CriticalSection(const CriticalSection&) = delete;
+    CriticalSection& operator=(const CriticalSection&) = delete;
+    ~CriticalSection()
+    {
+        DeleteCriticalSection(&section_);
+    }
+    void lock() noexcept
+    {
+        EnterCriticalSection(&section_);
+    }
+    void unlock() noexcept
+    {
+        LeaveCriticalSection(&section_);
+    }
+
+  private:
+    CRITICAL_SECTION section_;
+};
+
+} // namespace tavi
