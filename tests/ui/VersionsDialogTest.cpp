@@ -2,33 +2,22 @@
 
 #include <atomic>
 #include <cstdlib>
-#include <fstream>
 #include <vector>
 
 #include <commctrl.h>
 #include <dlgs.h>
 #include <shlobj.h>
 
-#include <gtest/gtest.h>
-
-#include "core/Module.h"
 #include "statedb/Database.h"
-#include "tests/support/Catalogue.h"
 #include "tests/support/Dialogs.h"
-#include "tests/support/LogCapture.h"
-#include "tests/support/Registry.h"
 #include "ui/CopyTarget.h"
 #include "ui/resource.h"
 
 namespace tavi {
 namespace {
 
-using test::click;
-using test::controlText;
-using test::waitDialog;
-using test::waitUntil;
-
-std::atomic<int> progressWindows{0};
+using namespace test;
+using VersionsDialogTest = UiTest;
 
 Selection selectionOf(const PathSet& paths, bool isFolder = false, int coverage = 1)
 {
@@ -40,33 +29,10 @@ HWND listOf(HWND dialog)
     return GetDlgItem(dialog, TAVI_VERSIONS_LIST);
 }
 
-// The list's texts, a line for each row; the selected row begins with a star.
-std::wstring rowsOf(HWND dialog)
+int enabledActions(HWND dialog)
 {
-    const HWND list = listOf(dialog);
-    std::wstring rows;
-    for (int row = 0; row < ListView_GetItemCount(list); ++row) {
-        rows += ListView_GetItemState(list, row, LVIS_SELECTED) ? L"*" : L"";
-        for (int column = 0; column < Header_GetItemCount(ListView_GetHeader(list)); ++column) {
-            wchar_t text[100] = L"";
-            ListView_GetItemText(list, row, column, text, 100);
-            rows += text + std::wstring(L"|");
-        }
-        rows += L"\n";
-    }
-    return rows;
-}
-
-bool actionsEnabled(HWND dialog)
-{
-    const bool restore = IsWindowEnabled(GetDlgItem(dialog, TAVI_VERSIONS_RESTORE));
-    EXPECT_EQ(restore, IsWindowEnabled(GetDlgItem(dialog, TAVI_VERSIONS_COPY_TO)));
-    return restore;
-}
-
-void waitForThreads(int left = 0)
-{
-    EXPECT_TRUE(waitUntil([&] { return moduleRefCount() == left; }));
+    return IsWindowEnabled(GetDlgItem(dialog, TAVI_VERSIONS_RESTORE)) +
+           IsWindowEnabled(GetDlgItem(dialog, TAVI_VERSIONS_COPY_TO));
 }
 
 HWND open(const Selection& selection, const wxString& files, HWND other = nullptr)
@@ -77,24 +43,6 @@ HWND open(const Selection& selection, const wxString& files, HWND other = nullpt
     return waitDialog(L"Restore Files", {other});
 }
 
-struct VersionsDialogTest : testing::Test {
-    VersionsDialogTest()
-    {
-        _putenv("TZ=UTC0");
-        setModuleInstance(GetModuleHandleW(nullptr));
-        setProgressWindowOpener([] { ++progressWindows; });
-    }
-    ~VersionsDialogTest() override
-    {
-        waitForThreads();
-        setProgressWindowOpener(nullptr);
-    }
-
-    test::LogCapture log;
-    test::InstalledService service;
-    test::TemporaryFolder folder;
-};
-
 const wchar_t* const kVersions =
     L"C:\\d\\50% & more.txt\n1700000000:1600000000:1:10:0::0:0\n1700000000:1:1:11:0::0:0\n1700100000:1:1:-1:0::0:0\n"
     L"1700200000:1600000002:1:2048:0::0:0\n4102444800:4102444860:1:1048577:0::0:0\n\n"
@@ -104,8 +52,10 @@ const wchar_t* const kVersions =
 
 TEST_F(VersionsDialogTest, ListsTheVersionsOfTheSelection)
 {
-    const std::wstring ends = L"11/14/2023 10:13 PM|09/13/2020 12:26 PM|10 bytes|\n",
-                       runs = L"11/14/2023 10:13 PM|\n*11/17/2023 05:46 AM|\n",
+    _putenv("TZ=UTC0");
+    // A line for each row; the selected row begins with a star.
+    const std::wstring ends = L"\n11/14/2023 10:13 PM|09/13/2020 12:26 PM|10 bytes|",
+                       runs = L"\n11/14/2023 10:13 PM|\n*11/17/2023 05:46 AM|",
                        items = L"the items you selected are backed up on the Tavi servers.  You can select one and ";
     const struct {
         Selection selection;
@@ -113,7 +63,7 @@ TEST_F(VersionsDialogTest, ListsTheVersionsOfTheSelection)
     } cases[] = {
         {selectionOf({L"C:\\d\\50% & more.txt"}),
          L"50% & more.txt are backed up on the Tavi servers.  You can select one and restore it", L"File &Versions:",
-         ends + L"11/17/2023 05:46 AM|09/13/2020 12:26 PM|2.0 KB|\n*01/01/2100 12:00 AM|01/01/2100 12:01 AM|1.0 MB|\n"},
+         ends + L"\n11/17/2023 05:46 AM|09/13/2020 12:26 PM|2.0 KB|\n*01/01/2100 12:00 AM|01/01/2100 12:01 AM|1.0 MB|"},
         {selectionOf({L"C:\\d\\deleted.txt"}), L"deleted.txt are", L"File &Versions:", L""},
         {selectionOf({L"C:\\d\\ends.txt"}), L"ends.txt are", L"File &Versions:", ends},
         {selectionOf({L"C:\\d"}, true), items + L"restore the files", L"Available &Versions:", runs},
@@ -124,8 +74,18 @@ TEST_F(VersionsDialogTest, ListsTheVersionsOfTheSelection)
         const HWND dialog = open(test.selection, kVersions);
         EXPECT_EQ(controlText(dialog, TAVI_VERSIONS_MESSAGE).find(L"The following versions of " + test.message), 0u);
         EXPECT_EQ(controlText(dialog, TAVI_VERSIONS_LABEL), test.label);
-        EXPECT_EQ(rowsOf(dialog), test.rows);
-        EXPECT_EQ(actionsEnabled(dialog), test.rows.find(L'*') != std::wstring::npos);
+        const HWND list = listOf(dialog);
+        std::wstring rows;
+        for (int row = 0; row < ListView_GetItemCount(list); ++row) {
+            rows += ListView_GetItemState(list, row, LVIS_SELECTED) ? L"\n*" : L"\n";
+            for (int column = 0; column < Header_GetItemCount(ListView_GetHeader(list)); ++column) {
+                wchar_t text[100] = L"";
+                ListView_GetItemText(list, row, column, text, 100);
+                rows += text + std::wstring(L"|");
+            }
+        }
+        EXPECT_EQ(rows, test.rows);
+        EXPECT_EQ(enabledActions(dialog), rows.find(L'*') == std::wstring::npos ? 0 : 2);
         click(dialog, IDCANCEL);
         waitForThreads();
     }
@@ -142,13 +102,11 @@ TEST_F(VersionsDialogTest, IsReadyForTheKeyboard)
         return GetGUIThreadInfo(GetWindowThreadProcessId(dialog, nullptr), &gui) && gui.hwndFocus == list;
     }));
     EXPECT_EQ(ListView_GetNextItem(list, -1, LVNI_FOCUSED), 2);
-    EXPECT_EQ(ListView_GetExtendedListViewStyle(list), DWORD{LVS_EX_FULLROWSELECT | LVS_EX_DOUBLEBUFFER});
-    EXPECT_TRUE(SendMessageW(dialog, WM_GETICON, ICON_SMALL, 0) && SendMessageW(dialog, WM_GETICON, ICON_BIG, 0));
     // The buttons follow the row that changed last.
     ListView_SetItemState(list, 2, 0, LVIS_SELECTED);
-    EXPECT_FALSE(actionsEnabled(dialog));
+    EXPECT_EQ(enabledActions(dialog), 0);
     ListView_SetItemState(list, 0, LVIS_SELECTED, LVIS_SELECTED);
-    EXPECT_TRUE(actionsEnabled(dialog));
+    EXPECT_EQ(enabledActions(dialog), 2);
     // Version 6 of the controls, whatever the host has: only its buttons know their ideal size.
     SIZE ideal{};
     EXPECT_TRUE(SendMessageW(GetDlgItem(dialog, IDCANCEL), BCM_GETIDEALSIZE, 0, reinterpret_cast<LPARAM>(&ideal)));
@@ -165,7 +123,8 @@ TEST_F(VersionsDialogTest, IsReadyForTheKeyboard)
 TEST_F(VersionsDialogTest, RequestsWhatWasAnswered)
 {
     // Below the test's folder: a file and one deeper are backed up, the targets are in another folder.
-    const auto in = [&](const wchar_t* name) -> wxString { return folder.path() + L"\\" + name; };
+    static std::atomic<int> progressWindows{0};
+    setProgressWindowOpener([] { ++progressWindows; });
     for (const wchar_t* name : {L"f", L"t"})
         CreateDirectoryW(in(name).wc_str(), nullptr);
     for (const wchar_t* name : {L"f\\5%", L"t\\was"})
@@ -180,42 +139,38 @@ TEST_F(VersionsDialogTest, RequestsWhatWasAnswered)
     const Selection one = selectionOf({in(L"f\\5%")}), whole = selectionOf({in(L"f")}, true),
                     several = selectionOf({in(L"f\\5%"), in(L"f\\b")}, true);
     constexpr int kRestore = TAVI_VERSIONS_RESTORE, kCopy = TAVI_VERSIONS_COPY_TO, kCloseWindow = 0;
-    const wchar_t* const loses = L"Restoring this file will overwrite your current version, and you will lose any "
-                                 L"changes\r\nthat have been made since it was last backed up.";
+    const wchar_t* const loses = L"Restoring this file will overwrite your current version, and you will lose any ";
     const wchar_t* const loseAll = L"since they were last backed up.  Would you like to overwrite it?";
-    const wchar_t* const exist = L"One or more of the items you selected already exist.  Would you like to overwrite "
-                                 L"those files, restore to a different filename, or cancel?";
+    const wchar_t* const exist = L"One or more of the items you selected already exist.  Would you like to overwrite ";
     const struct {
         const Selection& selection;
         int row, button;
-        bool blocked;
         std::vector<int> answers; // to one box after the other
         const wchar_t* question;
         // Source, time, attributes, target, whether it may be replaced. The chosen folder ends in a backslash and the
         // rest begins with one.
         const wchar_t* files;
     } cases[] = {
-        {one, 1, kRestore, false, {IDYES}, loses, LR"(f\5% 200 33 f\5% 1;)"},
-        {one, 0, kRestore, false, {IDYES}, loses, LR"(f\5% 100 32 f\5% 1;)"},
-        {one, 1, kRestore, false, {IDNO}, loses, LR"(f\5% 200 33 f\5% (1) 0;)"},
-        {one, 1, kRestore, false, {IDCANCEL}, loses, L""},
-        {one, 1, kRestore, false, {kCloseWindow}, loses, L""},
-        {whole, 0, kRestore, false, {IDYES}, loseAll, LR"(f\5% 100 32 f\5% 1;f\b\c 100 0 f\b\c 1;)"},
+        {one, 1, kRestore, {IDYES}, loses, LR"(f\5% 200 33 f\5% 1)"},
+        {one, 0, kRestore, {IDYES}, loses, LR"(f\5% 100 32 f\5% 1)"},
+        {one, 1, kRestore, {IDNO}, loses, LR"(f\5% 200 33 f\5% (1) 0)"},
+        {one, 1, kRestore, {IDCANCEL}, loses, L""},
+        {one, 1, kRestore, {kCloseWindow}, loses, L""},
+        {whole, 0, kRestore, {IDYES}, loseAll, LR"(f\5% 100 32 f\5% 1;f\b\c 100 0 f\b\c 1)"},
         // The save box itself asks about the file that is there.
-        {one, 1, kCopy, false, {IDOK, IDYES}, L"", LR"(f\5% 200 33 t\was 1;)"},
-        {one, 1, kCopy, false, {IDCANCEL}, L"", L""},
-        {several, 0, kCopy, false, {IDOK}, L"", LR"(f\5% 100 32 t\\5% 0;f\b\c 100 0 t\\b\c 0;)"},
-        {several, 0, kCopy, true, {IDOK, IDYES}, exist, LR"(f\5% 100 32 t\\5% 1;f\b\c 100 0 t\\b\c 1;)"},
-        {several, 0, kCopy, true, {IDOK, IDNO}, exist, LR"(f\5% 100 32 t\\5% (1) 0;f\b\c 100 0 t\\b\c 0;)"},
-        {several, 0, kCopy, true, {IDOK, IDCANCEL}, exist, L""},
-        {several, 0, kCopy, true, {IDCANCEL}, L"", L""},
+        {one, 1, kCopy, {IDOK, IDYES}, L"", LR"(f\5% 200 33 t\was 1)"},
+        {one, 1, kCopy, {IDCANCEL}, L"", L""},
+        {several, 0, kCopy, {IDOK}, L"", LR"(f\5% 100 32 t\\5% 0;f\b\c 100 0 t\\b\c 0)"},
+        {several, 0, kCopy, {IDOK, IDYES}, exist, LR"(f\5% 100 32 t\\5% 1;f\b\c 100 0 t\\b\c 1)"},
+        {several, 0, kCopy, {IDOK, IDNO}, exist, LR"(f\5% 100 32 t\\5% (1) 0;f\b\c 100 0 t\\b\c 0)"},
+        {several, 0, kCopy, {IDOK, IDCANCEL}, exist, L""},
         // The target of a single folder is the chosen folder itself, which is always there.
-        {whole, 0, kCopy, false, {IDOK, IDYES}, exist, LR"(f\5% 100 32 t\\5% 1;f\b\c 100 0 t\\b\c 1;)"},
+        {whole, 0, kCopy, {IDOK, IDYES}, exist, LR"(f\5% 100 32 t\\5% 1;f\b\c 100 0 t\\b\c 1)"},
     };
     for (const auto& test : cases) {
         SCOPED_TRACE(&test - cases);
         DeleteFileW(in(L"t\\5%").wc_str());
-        if (test.blocked)
+        if (test.answers.size() > 1)
             std::ofstream(in(L"t\\5%").wc_str());
         const HWND dialog = open(test.selection, files);
         ListView_SetItemState(listOf(dialog), test.row, LVIS_SELECTED, LVIS_SELECTED);
@@ -223,30 +178,33 @@ TEST_F(VersionsDialogTest, RequestsWhatWasAnswered)
         HWND box = nullptr;
         for (const int answer : test.answers) {
             box = waitDialog(nullptr, {dialog, box});
-            wchar_t title[40] = L"", preset[40] = L"";
-            GetWindowTextW(box, title, 40);
-            if (std::wstring(title) == L"Tavi Remote Backup") {
-                EXPECT_NE(controlText(box, 0xFFFF).find(test.question), std::wstring::npos);
-            } else if (&test.selection != &one) {
-                SendMessageW(box, BFFM_SETSELECTIONW, TRUE, reinterpret_cast<LPARAM>(in(L"t").wc_str()));
-            } else if (GetDlgItemTextW(box, cmb13, preset, 40) > 0) {
-                EXPECT_STREQ(title, L"Restore File As");
-                EXPECT_STREQ(preset, L"5%");
+            if (GetDlgItem(box, cmb13)) {
+                EXPECT_EQ(controlText(box, cmb13), L"5%");
                 SetDlgItemTextW(box, cmb13, in(L"t\\was").wc_str());
             }
+            // The browser is on screen before it has gone to the folder that it begins with.
+            const HWND tree = FindWindowExW(box, nullptr, WC_TREEVIEWW, nullptr);
+            EXPECT_TRUE(!tree || waitUntil([&] {
+                SendMessageW(box, BFFM_SETSELECTIONW, TRUE, reinterpret_cast<LPARAM>(in(L"t").wc_str()));
+                wchar_t name[MAX_PATH] = L"";
+                TVITEMW item{TVIF_TEXT, TreeView_GetSelection(tree), 0, 0, name, MAX_PATH, 0, 0, 0, 0};
+                return TreeView_GetItem(tree, &item) && std::wcscmp(name, L"t") == 0;
+            }));
+            const bool isLast = &answer == &test.answers.back();
+            EXPECT_TRUE(!isLast || controlText(box, 0xFFFF).find(test.question) != std::wstring::npos);
             if (answer == kCloseWindow)
                 PostMessageW(dialog, WM_CLOSE, 0, 0);
             else
                 click(box, answer);
         }
         waitForThreads();
-        DbQuery query = database.execQuery(
-            "SELECT manifest_path, timestamp, attributes, target_path, overwrite FROM restore_files ORDER BY 1");
-        wxString rows;
-        for (const char* text = ""; query.nextRow(); rows += L";") {
-            for (int field = 0; field < 5 && query.fieldText(field, text); ++field)
-                rows += (field == 0 ? L"" : L" ") + fromUtf8(text);
-        }
+        const char* text = "";
+        DbQuery stored = database.execQuery(
+            "SELECT ifnull(group_concat(manifest_path || ' ' || timestamp || ' ' || attributes || ' ' || "
+            "target_path || ' ' || overwrite, ';'), '') FROM restore_files");
+        EXPECT_TRUE(stored.nextRow());
+        stored.fieldText(0, text);
+        wxString rows = fromUtf8(text);
         rows.Replace(in(L""), L"");
         EXPECT_EQ(rows, test.files);
         const int requests = test.files[0] ? 1 : 0;
@@ -254,6 +212,7 @@ TEST_F(VersionsDialogTest, RequestsWhatWasAnswered)
         EXPECT_EQ(progressWindows.exchange(0), requests);
         database.execDML("DELETE FROM restore_files");
     }
+    setProgressWindowOpener(nullptr);
 }
 
 TEST_F(VersionsDialogTest, ManyVersionsAndSeveralWindows)
@@ -276,7 +235,7 @@ TEST_F(VersionsDialogTest, ManyVersionsAndSeveralWindows)
 
 TEST_F(VersionsDialogTest, ShortensALongNameAndTranslates)
 {
-    const test::Catalogue catalogue(service.file(L""), "&Restore", "&Zurueck");
+    translate("&Restore", "&Zurueck");
     const wxString name = L"C:\\d\\begin" + wxString(L'x', 200) + L"end.txt";
     const HWND dialog = open(selectionOf({name}), name + L"\n5:5:5:5:0::0:0");
     EXPECT_EQ(controlText(dialog, TAVI_VERSIONS_RESTORE), L"&Zurueck");
@@ -294,7 +253,6 @@ TEST(CopyTarget, FindsTheCommonPrefix)
         {{}, L""},
         {{L"C:\\w\\bc", L"C:\\w\\bd", L"C:\\w\\sub\\c"}, L"C:\\w"},
         {{L"C:\\", L"C:\\b", L"C:\\c\\d"}, L"C:\\"},
-        {{L"C:\\a", L"D:\\a"}, L""},
         {{deep + L"\\a", deep + L"\\b"}, deep},
     };
     for (const auto& [paths, prefix] : cases)
