@@ -9,22 +9,19 @@ namespace {
 
 TEST(Lifecycle, TheGateComparesTheBeginningOfTheName)
 {
-    const struct {
-        const wchar_t* path;
-        HostKind kind;
-    } cases[] = {{L"C:\\Windows\\explorer.exe", HostKind::fileManager},
-                 {L"EXPLORER.EXE", HostKind::fileManager},
-                 {L"D:\\x\\explorer.exe.old", HostKind::fileManager},
-                 {L"C:\\explorer.exe\\other.exe", HostKind::refused},
-                 {L"C:\\windows\\regsvr32.exe", HostKind::toolOnly},
-                 {L"C:\\VerClsid.exe", HostKind::toolOnly},
-                 {L"C:\\t\\_regdll.TMP", HostKind::toolOnly},
-                 {L"C:\\t\\_RegDLL.tm", HostKind::refused},
-                 {L"C:\\windows\\rundll32.exe", HostKind::refused},
-                 {L"C:\\", HostKind::refused},
-                 {L"", HostKind::refused}};
-    for (const auto& test : cases)
-        EXPECT_EQ(hostKindOf(test.path), test.kind) << test.path;
+    const std::pair<const wchar_t*, HostKind> cases[] = {{L"C:\\Windows\\explorer.exe", HostKind::fileManager},
+                                                         {L"EXPLORER.EXE", HostKind::fileManager},
+                                                         {L"D:\\x\\explorer.exe.old", HostKind::fileManager},
+                                                         {L"C:\\explorer.exe\\other.exe", HostKind::refused},
+                                                         {L"C:\\windows\\regsvr32.exe", HostKind::toolOnly},
+                                                         {L"C:\\VerClsid.exe", HostKind::toolOnly},
+                                                         {L"C:\\t\\_regdll.TMP", HostKind::toolOnly},
+                                                         {L"C:\\t\\_RegDLL.tm", HostKind::refused},
+                                                         {L"C:\\windows\\rundll32.exe", HostKind::refused},
+                                                         {L"C:\\", HostKind::refused},
+                                                         {L"", HostKind::refused}};
+    for (const auto& [path, kind] : cases)
+        EXPECT_EQ(hostKindOf(path), kind) << path;
 
     wchar_t path[MAX_PATH];
     GetModuleFileNameW(nullptr, path, MAX_PATH);

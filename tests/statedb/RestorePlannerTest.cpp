@@ -92,30 +92,27 @@ TEST(RestorePlanner, ChoosesVersionsAndTargets)
 
 TEST(RestorePlanner, FindsFreeNames)
 {
-    const struct {
-        const char* name;
-        int taken;
-        const char* target;
-    } cases[] = {{"report.txt", 0, "report.txt"},
-                 {"report.txt", 1, "report (1).txt"},
-                 {"report.txt", 9999, "report (9999).txt"},
-                 {"report.txt", 10000, "report (10000).txt"}, // the last one is used unasked
-                 {"README", 1, "README (1)"},
-                 {".profile", 1, " (1).profile"},
-                 {"ends.", 1, "ends (1)."}};
-    for (const auto& test : cases) {
-        const std::string path = std::string("C:/dotted.dir/") + test.name;
+    const std::tuple<std::string, int, std::string> cases[] = {
+        {"report.txt", 0, "report.txt"},
+        {"report.txt", 1, "report (1).txt"},
+        {"report.txt", 9999, "report (9999).txt"},
+        {"report.txt", 10000, "report (10000).txt"}, // the last one is used unasked
+        {"README", 1, "README (1)"},
+        {".profile", 1, " (1).profile"},
+        {"ends.", 1, "ends (1)."}};
+    for (const auto& [name, taken, target] : cases) {
+        const std::string path = "C:/dotted.dir/" + name;
         const ManifestRef manifest = manifestOf(path + "\n1:1:1:1:0:x:0:40");
         RestoreRequest request;
         request.selectedPaths.insert(windows(path));
         request.cutoffTime = 1;
         int asked = 0;
         const RestorePlan plan =
-            planRestore(request, *manifest, [&](const std::string&) { return asked++ < test.taken; });
+            planRestore(request, *manifest, [&, most = taken](const std::string&) { return asked++ < most; });
         RestoreFileEntry entry;
         ASSERT_EQ(plan.size(), 1u);
         plan.readEntry(0, entry);
-        EXPECT_EQ(entry.targetPath, std::string("C:\\dotted.dir\\") + test.target);
+        EXPECT_EQ(entry.targetPath, "C:\\dotted.dir\\" + target);
     }
 }
 
