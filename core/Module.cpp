@@ -35,8 +35,15 @@ DWORD WINAPI runModuleThread(void* parameter)
     // The library keeps texts for each thread that it has translated for or logged from, and frees those of its own
     // only.
     guarded("thread clean-up", [] { wxThreadSpecificInfo::ThreadCleanUp(); });
+    releaseThreadRuntime();
     // A plain return would run through code that this very release may unmap.
     FreeLibraryAndExitThread(start.mapping, 0);
+}
+
+// Runs behind every other destructor of the module, which may have used the runtime on the thread that unloads it.
+[[gnu::destructor]] void releaseUnloadingThread()
+{
+    releaseThreadRuntime();
 }
 
 } // namespace
@@ -72,6 +79,26 @@ void releaseShellAllocator() noexcept
 std::atomic<std::int32_t>& moduleRefCount() noexcept
 {
     return theRefCount;
+}
+
+void releaseThreadRuntime() noexcept
+{
+    HMODULE module = nullptr;
+    if (!GetModuleHandleExW(GET_MODULE_HANDLE_EX_FLAG_FROM_ADDRESS | GET_MODULE_HANDLE_EX_FLAG_UNCHANGED_REFCOUNT,
+                            reinterpret_cast<const wchar_t*>(&runModuleThread), &module))
+        return;
+    // The runtime frees a thread's part in the callbacks that the loader runs as the thread ends, which it does not do
+    // for a module that is gone by then.
+    const auto* const base = reinterpret_cast<const BYTE*>(module);
+    const auto* const dos = reinterpret_cast<const IMAGE_DOS_HEADER*>(base);
+    const auto* const headers = reinterpret_cast<const IMAGE_NT_HEADERS*>(base + dos->e_lfanew);
+    const IMAGE_DATA_DIRECTORY& entry = headers->OptionalHeader.DataDirectory[IMAGE_DIRECTORY_ENTRY_TLS];
+    if (entry.VirtualAddress == 0)
+        return;
+    const auto* const tls = reinterpret_cast<const IMAGE_TLS_DIRECTORY*>(base + entry.VirtualAddress);
+    const auto* callback = reinterpret_cast<const PIMAGE_TLS_CALLBACK*>(tls->AddressOfCallBacks);
+    for (; callback && *callback; ++callback)
+        (*callback)(module, DLL_THREAD_DETACH, nullptr);
 }
 
 HANDLE startModuleThread(ThreadBody body, void* argument, bool suspended) noexcept

@@ -36,6 +36,10 @@ class ModuleLock {
     ModuleLock& operator=(const ModuleLock&) = delete;
 };
 
+// Gives back what the static runtime keeps for the calling thread: handles that would outlive the module when another
+// thread unloads it. What the thread needs later is made again. Not while an exception is being handled.
+void releaseThreadRuntime() noexcept;
+
 using ThreadBody = void (*)(void* argument);
 
 // Starts a thread that keeps the module mapped until it has left the module's code; whatever the body throws is logged.

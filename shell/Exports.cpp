@@ -27,6 +27,8 @@ STDAPI DllCanUnloadNow()
         if (moduleRefCount() != 0)
             return S_FALSE;
         requestThreadsStop();
+        // The host may free the module next, on this thread, while the last reference is one of ours.
+        releaseThreadRuntime();
         return S_OK;
     });
 }

@@ -40,14 +40,9 @@ TEST(InstallPaths, FollowTheRegistryAtEveryCallAndUnreadableOptionsAreDeletedInS
 
     service.install().SetValue(L"ConfigPath", wxString(L"C:\\conf"));
     service.install().SetValue(L"DataPath", wxString(L"C:\\data"));
-    wxString data;
-    for (int selector = -1; selector < 9; ++selector)
-        data += GetDataFilePath(selector) + L"|";
-    data.Replace(L"C:\\data", L"*");
-    EXPECT_EQ(data, L"|*\\tavistate.dat|*\\tavi.log|*\\tavilog.dat|*\\changes.dat|*\\filter_raw.log|"
-                    L"*\\tavicache.dat|*\\tavimap.dat|*||");
-    EXPECT_EQ(GetConfigFilePath(0) + L"|" + GetConfigFilePath(1) + L"|" + GetConfigFilePath(2),
-              L"C:\\conf\\taviconf.dat|C:\\conf\\tavikey.dat|");
+    EXPECT_EQ(GetDataFilePath(kLogFile) + GetDataFilePath(kDataDirectory) + GetDataFilePath(8) + GetDataFilePath(-1),
+              L"C:\\data\\tavi.logC:\\data");
+    EXPECT_EQ(GetConfigFilePath(0) + GetConfigFilePath(2), L"C:\\conf\\taviconf.dat");
     service.install().DeleteValue(L"DataPath");
     EXPECT_EQ(GetDataFilePath(kStateDatabase), L"\\tavistate.dat");
 }

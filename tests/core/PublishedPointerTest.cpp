@@ -40,17 +40,10 @@ class Counted {
     }
 
   private:
-    std::atomic<int> refs_{0};
+    std::atomic<int> refs_{1};
     unsigned value_;
     unsigned copy_;
 };
-
-Counted* made(unsigned value)
-{
-    auto* object = new Counted(value);
-    object->AddRef();
-    return object;
-}
 
 // Readers and a writer that swaps without pause: the sanitizers see any touch of a freed or torn object.
 TEST(PublishedPointer, SurvivesSwapsAtEveryInterleaving)
@@ -85,8 +78,8 @@ TEST(PublishedPointer, SurvivesSwapsAtEveryInterleaving)
             });
         }
         for (unsigned i = 0; i < kSwaps; ++i)
-            current.replace(i % 64 == 63 ? nullptr : made(i));
-        current.replace(made(1));
+            current.replace(i % 64 == 63 ? nullptr : new Counted(i));
+        current.replace(new Counted(1));
         while (taken < 1000)
             std::this_thread::yield();
         done = true;
