@@ -40,11 +40,15 @@ DWORD WINAPI runModuleThread(void* parameter)
     FreeLibraryAndExitThread(start.mapping, 0);
 }
 
-// Runs behind every other destructor of the module, which may have used the runtime on the thread that unloads it.
-[[gnu::destructor]] void releaseUnloadingThread()
-{
-    releaseThreadRuntime();
-}
+// Made before every other object and so destroyed after them all: they may use the runtime on the thread that unloads
+// the module, which nobody asks for its part any more.
+struct LastRelease {
+    ~LastRelease()
+    {
+        releaseThreadRuntime();
+    }
+};
+[[gnu::init_priority(101)]] const LastRelease lastRelease;
 
 } // namespace
 
