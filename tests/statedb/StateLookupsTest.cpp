@@ -2,7 +2,6 @@
 
 #include <gtest/gtest.h>
 
-#include "tests/support/LogCapture.h"
 #include "tests/support/Registry.h"
 
 namespace tavi {
@@ -43,14 +42,6 @@ TEST(StateLookups, FoldersInheritFromTheNearestRecordedOne)
     const FolderStateTable::ReadScope reading(states);
     EXPECT_EQ(states.getFolderState(L"C:\\s6\\x"), 8); // not what was so before
     EXPECT_EQ(states.getFolderState(L"C:\\s4\\y"), 4);
-}
-
-TEST(StateLookups, FilesAreUnknownWithoutADatabase)
-{
-    const test::InstalledService service;
-    test::LogCapture log;
-    EXPECT_EQ(FileStateLookup().getFileState(L"C:\\f"), 15);
-    EXPECT_EQ(log.take().at(0), "1: Error: Failed to retrieve file state (1: DB_ERROR[1]: )");
 }
 
 } // namespace
