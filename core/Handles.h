@@ -69,6 +69,20 @@ struct KernelTraits {
 };
 using KernelHandle = UniqueHandle<KernelTraits>;
 
+// What opening a file or pipe gives, which says no with another value than the rest.
+struct FileTraits {
+    using Handle = HANDLE;
+    static Handle none() noexcept
+    {
+        return INVALID_HANDLE_VALUE;
+    }
+    static void free(Handle handle) noexcept
+    {
+        CloseHandle(handle);
+    }
+};
+using FileHandle = UniqueHandle<FileTraits>;
+
 struct RegistryTraits {
     using Handle = HKEY;
     static Handle none() noexcept

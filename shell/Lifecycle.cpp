@@ -6,6 +6,7 @@
 
 #include "backupset/CurrentManifest.h"
 #include "core/Log.h"
+#include "link/StatusListener.h"
 #include "statedb/Database.h"
 #include "ui/MenuBitmap.h"
 
@@ -24,8 +25,8 @@ const HostName kHosts[] = {{L"explorer.exe", HostKind::fileManager},
                            {L"verclsid.exe", HostKind::toolOnly},
                            {L"_RegDLL.tmp", HostKind::toolOnly}};
 
-std::atomic<ThreadBody> statusListener{nullptr};
 std::atomic<bool> statusStopFlag{false};
+std::atomic<ThreadBody> statusListener{[](void*) { listenToStatus([] { return statusStopFlag.load(); }); }};
 HANDLE statusThread = INVALID_HANDLE_VALUE;
 
 } // namespace
@@ -66,9 +67,9 @@ void detachFromFileManager(bool processEnds)
     CloseLog();
 }
 
-void setStatusListener(ThreadBody body) noexcept
+ThreadBody setStatusListener(ThreadBody body) noexcept
 {
-    statusListener = body;
+    return statusListener.exchange(body);
 }
 
 bool statusStopRequested() noexcept
@@ -78,8 +79,7 @@ bool statusStopRequested() noexcept
 
 void StartStatusThread() noexcept
 {
-    const ThreadBody body = statusListener;
-    if (HANDLE thread = body ? startModuleThread(body, nullptr) : nullptr)
+    if (HANDLE thread = startModuleThread(statusListener, nullptr))
         statusThread = thread;
 }
 

@@ -22,7 +22,9 @@
 #include "statedb/RestoreRequest.h"
 #include "ui/ActivationScope.h"
 #include "ui/CopyTarget.h"
+#include "ui/RestoreProgressWindow.h"
 #include "ui/Texts.h"
+#include "ui/WindowFrame.h"
 #include "ui/resource.h"
 
 namespace tavi {
@@ -31,7 +33,7 @@ namespace {
 // The reserved manifest path whose versions stand for the backup runs as a whole.
 constexpr const wchar_t* kBackupRuns = L"simple.map";
 
-std::atomic<ProgressWindowOpener> progressWindowOpener{nullptr};
+std::atomic<ProgressWindowOpener> progressWindowOpener{RestoreProgressWindow::getOrCreate};
 
 struct WindowTraits {
     using Handle = HWND;
@@ -129,31 +131,6 @@ wxString shortenMiddle(const wxString& name, std::size_t kept)
     if (tail < text.length() && IS_LOW_SURROGATE(text[tail]))
         ++tail;
     return wxString(text.data(), head) + L"\u2026" + wxString(text.data() + tail, text.length() - tail);
-}
-
-// Centres the window over the host's, or on the screen where the user is working, inside the work area.
-void placeWindow(HWND window, HWND host)
-{
-    MONITORINFO monitor{};
-    monitor.cbSize = sizeof(monitor);
-    POINT cursor{};
-    GetCursorPos(&cursor);
-    const bool hasHost = IsWindow(host);
-    GetMonitorInfoW(hasHost ? MonitorFromWindow(host, MONITOR_DEFAULTTONEAREST)
-                            : MonitorFromPoint(cursor, MONITOR_DEFAULTTONEAREST),
-                    &monitor);
-    const RECT& work = monitor.rcWork;
-    RECT over = work;
-    if (hasHost && IsWindowVisible(host) && !IsIconic(host))
-        GetWindowRect(host, &over);
-    RECT own{};
-    GetWindowRect(window, &own);
-    const auto place = [](LONG low, LONG high, LONG areaLow, LONG areaHigh, LONG size) {
-        return std::max(areaLow, std::min((low + high - size) / 2, areaHigh - size));
-    };
-    SetWindowPos(window, nullptr, place(over.left, over.right, work.left, work.right, own.right - own.left),
-                 place(over.top, over.bottom, work.top, work.bottom, own.bottom - own.top), 0, 0,
-                 SWP_NOSIZE | SWP_NOZORDER | SWP_NOACTIVATE);
 }
 
 INT_PTR CALLBACK dialogProcedure(HWND window, UINT message, WPARAM wParam, LPARAM lParam)
@@ -264,10 +241,7 @@ HWND VersionsDialog::list() const
 void VersionsDialog::initialize()
 {
     setTexts();
-    const auto icon = reinterpret_cast<LPARAM>(LoadImageW(moduleInstance(), MAKEINTRESOURCEW(TAVI_ICON_RESTORE),
-                                                          IMAGE_ICON, 0, 0, LR_DEFAULTSIZE | LR_SHARED));
-    SendMessageW(window_, WM_SETICON, ICON_SMALL, icon);
-    SendMessageW(window_, WM_SETICON, ICON_BIG, icon);
+    setWindowIcons(window_);
     SendMessageW(list(), LVM_SETEXTENDEDLISTVIEWSTYLE, 0, LVS_EX_FULLROWSELECT | LVS_EX_DOUBLEBUFFER);
     addColumns();
     addRows();

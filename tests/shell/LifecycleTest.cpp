@@ -35,7 +35,7 @@ TEST(Lifecycle, AStatusThreadGetsHalfASecond)
     for (const bool obeys : {true, false}) {
         static std::atomic<bool> listens;
         listens = obeys;
-        setStatusListener([](void*) {
+        const ThreadBody before = setStatusListener([](void*) {
             while (!listens || !statusStopRequested())
                 Sleep(10);
         });
@@ -44,8 +44,8 @@ TEST(Lifecycle, AStatusThreadGetsHalfASecond)
         const DWORD start = GetTickCount();
         StopStatusThread();
         EXPECT_EQ(GetTickCount() - start >= 450, !obeys);
+        setStatusListener(before);
     }
-    setStatusListener(nullptr);
 }
 
 } // namespace

@@ -1,0 +1,287 @@
+#include "link/PipeMessage.h"
+
+#include <algorithm>
+#include <cstring>
+#include <initializer_list>
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "core/Text.h"
+
+namespace tavi {
+namespace {
+
+constexpr std::uint32_t kLastType = 57;
+
+// Codes within the range that no message goes by.
+constexpr struct {
+    std::uint32_t first;
+    std::uint32_t last;
+} kUnusedTypes[] = {{26, 31}, {37, 38}, {41, 50}};
+
+// Fills a buffer with one frame. Writes nothing when the buffer could not grow.
+class FrameWriter {
+  public:
+    FrameWriter(MessageBuffer& buffer, std::uint32_t type, std::uint32_t fixedPayload,
+                std::initializer_list<std::string_view> texts = {})
+    {
+        std::uint64_t size = std::uint64_t{kFrameHeaderSize} + fixedPayload;
+        for (const std::string_view text : texts)
+            size += text.size();
+        const bool fits = size <= UINT32_MAX;
+        if (fits)
+            buffer.ensure(static_cast<std::uint32_t>(size));
+        at_ = fits ? buffer.data() : nullptr;
+        buffer.setLength(at_ ? static_cast<std::uint32_t>(size) : 0);
+        u32(type);
+        u32(static_cast<std::uint32_t>(size - kFrameHeaderSize));
+    }
+    void u32(std::uint32_t value) noexcept
+    {
+        for (int shift = 0; at_ && shift < 32; shift += 8)
+            *at_++ = static_cast<unsigned char>(value >> shift);
+    }
+    void u64(std::uint64_t value) noexcept
+    {
+        u32(static_cast<std::uint32_t>(value));
+        u32(static_cast<std::uint32_t>(value >> 32));
+    }
+    void count(std::string_view text) noexcept
+    {
+        u32(static_cast<std::uint32_t>(text.size()));
+    }
+    void bytes(std::string_view text) noexcept
+    {
+        if (at_ && !text.empty())
+            at_ = std::copy(text.begin(), text.end(), at_);
+    }
+
+  private:
+    unsigned char* at_;
+};
+
+// Reads a payload in order. The buffer's capacity, not the announced length, is what bounds it.
+class PayloadReader {
+  public:
+    explicit PayloadReader(const MessageBuffer& buffer) noexcept : buffer_(buffer) {}
+    std::uint32_t u32() noexcept
+    {
+        std::uint32_t value = 0;
+        for (int shift = 0; shift < 32; shift += 8)
+            value |= std::uint32_t{buffer_.data()[at_++]} << shift;
+        return value;
+    }
+    std::uint64_t u64() noexcept
+    {
+        const std::uint64_t low = u32();
+        return low | std::uint64_t{u32()} << 32;
+    }
+    MessageText text(std::uint32_t count)
+    {
+        const std::uint32_t held = std::min(count, buffer_.capacity() - at_);
+        const auto* const start = reinterpret_cast<const char*>(buffer_.data() + at_);
+        at_ += held;
+        return std::make_shared<const wxString>(fromUtf8({start, held}));
+    }
+
+  private:
+    const MessageBuffer& buffer_;
+    std::uint32_t at_ = 0;
+};
+
+std::optional<MessageKind> kindOf(std::uint32_t type) noexcept
+{
+    if (type > kLastType)
+        return std::nullopt;
+    for (const auto& unused : kUnusedTypes) {
+        if (type >= unused.first && type <= unused.last)
+            return std::nullopt;
+    }
+    switch (type) {
+    case SnapshotMessage::kType:
+        return MessageKind::snapshot;
+    case ItemMessage::kType:
+        return MessageKind::item;
+    case TextTripleMessage::kType:
+        return MessageKind::textTriple;
+    case CounterMessage::kType:
+        return MessageKind::counter;
+    default:
+        return MessageKind::event;
+    }
+}
+
+std::uint32_t smallestPayload(MessageKind kind) noexcept
+{
+    switch (kind) {
+    case MessageKind::snapshot:
+        return SnapshotMessage::kSmallestPayload;
+    case MessageKind::item:
+        return ItemMessage::kSmallestPayload;
+    case MessageKind::textTriple:
+        return TextTripleMessage::kSmallestPayload;
+    case MessageKind::counter:
+        return CounterMessage::kSmallestPayload;
+    case MessageKind::event:
+        break;
+    }
+    return EventMessage::kSmallestPayload;
+}
+
+std::string bytesOf(const MessageText& text)
+{
+    return toUtf8(view(*text));
+}
+
+} // namespace
+
+EventMessage::EventMessage(std::uint32_t type) : EventMessage(type, 0, 0, 0, std::make_shared<const wxString>()) {}
+
+EventMessage::EventMessage(std::uint32_t type, std::uint32_t code_, std::uint64_t value_, std::uint32_t flag_,
+                           MessageText text_)
+    : PipeMessage(MessageKind::event, type), code(code_), value(value_), flag(flag_), text(std::move(text_))
+{
+}
+
+void EventMessage::serialise(MessageBuffer& buffer) const
+{
+    const std::string bytes = bytesOf(text);
+    FrameWriter frame(buffer, type(), kSmallestPayload, {bytes});
+    frame.u32(code);
+    frame.u64(value);
+    frame.u32(flag);
+    frame.count(bytes);
+    frame.bytes(bytes);
+}
+
+std::unique_ptr<PipeMessage> EventMessage::clone() const
+{
+    return std::make_unique<EventMessage>(type(), code, value, flag, text);
+}
+
+SnapshotMessage::SnapshotMessage(std::uint32_t state_, std::uint64_t counter0_, std::uint64_t counter1_,
+                                 std::uint64_t counter2_, std::uint64_t counter3_)
+    : PipeMessage(MessageKind::snapshot, kType), state(state_), counter0(counter0_), counter1(counter1_),
+      counter2(counter2_), counter3(counter3_)
+{
+}
+
+void SnapshotMessage::serialise(MessageBuffer& buffer) const
+{
+    FrameWriter frame(buffer, type(), kSmallestPayload);
+    frame.u32(state);
+    for (const std::uint64_t counter : {counter0, counter1, counter2, counter3})
+        frame.u64(counter);
+}
+
+std::unique_ptr<PipeMessage> SnapshotMessage::clone() const
+{
+    return std::make_unique<SnapshotMessage>(state, counter0, counter1, counter2, counter3);
+}
+
+ItemMessage::ItemMessage(std::uint64_t value_, bool flag_, MessageText text_)
+    : PipeMessage(MessageKind::item, kType), value(value_), flag(flag_), text(std::move(text_))
+{
+}
+
+void ItemMessage::serialise(MessageBuffer& buffer) const
+{
+    const std::string bytes = bytesOf(text);
+    FrameWriter frame(buffer, type(), kSmallestPayload, {bytes});
+    frame.u64(value);
+    frame.u32(flag ? 1 : 0);
+    frame.count(bytes);
+    frame.bytes(bytes);
+}
+
+std::unique_ptr<PipeMessage> ItemMessage::clone() const
+{
+    return std::make_unique<ItemMessage>(value, flag, text);
+}
+
+TextTripleMessage::TextTripleMessage(MessageText text1_, MessageText text2_, MessageText text3_)
+    : PipeMessage(MessageKind::textTriple, kType), text1(std::move(text1_)), text2(std::move(text2_)),
+      text3(std::move(text3_))
+{
+}
+
+void TextTripleMessage::serialise(MessageBuffer& buffer) const
+{
+    const std::string texts[] = {bytesOf(text1), bytesOf(text2), bytesOf(text3)};
+    FrameWriter frame(buffer, type(), kSmallestPayload, {texts[0], texts[1], texts[2]});
+    for (const std::string& text : texts)
+        frame.count(text);
+    for (const std::string& text : texts)
+        frame.bytes(text);
+}
+
+std::unique_ptr<PipeMessage> TextTripleMessage::clone() const
+{
+    return std::make_unique<TextTripleMessage>(text1, text2, text3);
+}
+
+CounterMessage::CounterMessage(std::uint32_t code_, std::uint64_t value1_, std::uint64_t value2_, std::uint32_t flag_)
+    : PipeMessage(MessageKind::counter, kType), code(code_), value1(value1_), value2(value2_), flag(flag_)
+{
+}
+
+void CounterMessage::serialise(MessageBuffer& buffer) const
+{
+    FrameWriter frame(buffer, type(), kSmallestPayload);
+    frame.u32(code);
+    frame.u64(value1);
+    frame.u64(value2);
+    frame.u32(flag);
+}
+
+std::unique_ptr<PipeMessage> CounterMessage::clone() const
+{
+    return std::make_unique<CounterMessage>(code, value1, value2, flag);
+}
+
+std::unique_ptr<PipeMessage> createMessage(std::uint32_t type, const MessageBuffer& buffer)
+{
+    const auto kind = kindOf(type);
+    if (!kind || !buffer.data() || buffer.length() < smallestPayload(*kind))
+        return nullptr;
+    PayloadReader payload(buffer);
+    switch (*kind) {
+    case MessageKind::event: {
+        const std::uint32_t code = payload.u32();
+        const std::uint64_t value = payload.u64();
+        const std::uint32_t flag = payload.u32();
+        return std::make_unique<EventMessage>(type, code, value, flag, payload.text(payload.u32()));
+    }
+    case MessageKind::snapshot: {
+        const std::uint32_t state = payload.u32();
+        std::uint64_t counters[4];
+        for (std::uint64_t& counter : counters)
+            counter = payload.u64();
+        return std::make_unique<SnapshotMessage>(state, counters[0], counters[1], counters[2], counters[3]);
+    }
+    case MessageKind::item: {
+        const std::uint64_t value = payload.u64();
+        const bool flag = payload.u32() != 0;
+        return std::make_unique<ItemMessage>(value, flag, payload.text(payload.u32()));
+    }
+    case MessageKind::textTriple: {
+        std::uint32_t counts[3];
+        for (std::uint32_t& count : counts)
+            count = payload.u32();
+        MessageText texts[3];
+        for (int i = 0; i < 3; ++i)
+            texts[i] = payload.text(counts[i]);
+        return std::make_unique<TextTripleMessage>(texts[0], texts[1], texts[2]);
+    }
+    case MessageKind::counter: {
+        const std::uint32_t code = payload.u32();
+        const std::uint64_t value1 = payload.u64();
+        const std::uint64_t value2 = payload.u64();
+        return std::make_unique<CounterMessage>(code, value1, value2, payload.u32());
+    }
+    }
+    return nullptr;
+}
+
+} // namespace tavi

@@ -1,0 +1,128 @@
+#pragma once
+
+#include <cstdint>
+#include <memory>
+
+#include <wx/string.h>
+
+#include "link/MessageBuffer.h"
+
+// The framed messages of both pipes. A frame is an 8-byte header (type, number of payload bytes) and the payload; every
+// integer is little-endian, a text is a count of bytes and its UTF-8. Pure code. Only one thread at a time touches a
+// message; it is handed on whole.
+namespace tavi {
+
+enum class MessageKind : std::uint32_t { event = 0, snapshot = 1, item = 2, textTriple = 3, counter = 4 };
+
+constexpr std::uint32_t kFrameHeaderSize = 8;
+
+// Shared between a message and its clones.
+using MessageText = std::shared_ptr<const wxString>;
+
+class PipeMessage {
+  public:
+    PipeMessage(const PipeMessage&) = delete;
+    PipeMessage& operator=(const PipeMessage&) = delete;
+
+    // Writes header and payload; the buffer's length is then the frame's size, or 0 when it could not grow.
+    virtual void serialise(MessageBuffer& buffer) const = 0;
+    virtual std::unique_ptr<PipeMessage> clone() const = 0;
+    virtual ~PipeMessage() = default;
+
+    MessageKind kind() const noexcept
+    {
+        return kind_;
+    }
+    std::uint32_t type() const noexcept
+    {
+        return type_;
+    }
+
+  protected:
+    PipeMessage(MessageKind kind, std::uint32_t type) noexcept : kind_(kind), type_(type) {}
+
+  private:
+    const MessageKind kind_;
+    const std::uint32_t type_;
+};
+
+class EventMessage final : public PipeMessage {
+  public:
+    static constexpr std::uint32_t kSmallestPayload = 20;
+
+    explicit EventMessage(std::uint32_t type);
+    EventMessage(std::uint32_t type, std::uint32_t code, std::uint64_t value, std::uint32_t flag, MessageText text);
+    void serialise(MessageBuffer& buffer) const override;
+    std::unique_ptr<PipeMessage> clone() const override;
+
+    const std::uint32_t code;
+    const std::uint64_t value;
+    const std::uint32_t flag;
+    const MessageText text;
+};
+
+class SnapshotMessage final : public PipeMessage {
+  public:
+    static constexpr std::uint32_t kType = 20;
+    static constexpr std::uint32_t kSmallestPayload = 36;
+
+    SnapshotMessage(std::uint32_t state, std::uint64_t counter0, std::uint64_t counter1, std::uint64_t counter2,
+                    std::uint64_t counter3);
+    void serialise(MessageBuffer& buffer) const override;
+    std::unique_ptr<PipeMessage> clone() const override;
+
+    const std::uint32_t state;
+    const std::uint64_t counter0;
+    const std::uint64_t counter1;
+    const std::uint64_t counter2;
+    const std::uint64_t counter3;
+};
+
+class ItemMessage final : public PipeMessage {
+  public:
+    static constexpr std::uint32_t kType = 21;
+    static constexpr std::uint32_t kSmallestPayload = 16;
+
+    ItemMessage(std::uint64_t value, bool flag, MessageText text);
+    void serialise(MessageBuffer& buffer) const override;
+    std::unique_ptr<PipeMessage> clone() const override;
+
+    const std::uint64_t value;
+    const bool flag;
+    const MessageText text;
+};
+
+class TextTripleMessage final : public PipeMessage {
+  public:
+    static constexpr std::uint32_t kType = 22;
+    static constexpr std::uint32_t kSmallestPayload = 12;
+
+    TextTripleMessage(MessageText text1, MessageText text2, MessageText text3);
+    void serialise(MessageBuffer& buffer) const override;
+    std::unique_ptr<PipeMessage> clone() const override;
+
+    const MessageText text1;
+    const MessageText text2;
+    const MessageText text3;
+};
+
+class CounterMessage final : public PipeMessage {
+  public:
+    static constexpr std::uint32_t kType = 23;
+    static constexpr std::uint32_t kSmallestPayload = 24;
+
+    CounterMessage(std::uint32_t code, std::uint64_t value1, std::uint64_t value2, std::uint32_t flag);
+    void serialise(MessageBuffer& buffer) const override;
+    std::unique_ptr<PipeMessage> clone() const override;
+
+    const std::uint32_t code;
+    const std::uint64_t value1;
+    const std::uint64_t value2;
+    const std::uint32_t flag;
+};
+
+// The message of a received frame, whose payload the buffer holds; null when the type stands for no message or the
+// announced payload is below what its kind needs. Text counts are believed, but nothing outside the buffer is read.
+std::unique_ptr<PipeMessage> createMessage(std::uint32_t type, const MessageBuffer& payload);
+
+} // namespace tavi

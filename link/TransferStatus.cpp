@@ -1,0 +1,334 @@
+#include "link/TransferStatus.h"
+
+#include <cmath>
+#include <limits>
+
+namespace tavi {
+namespace {
+
+constexpr std::int32_t kSmallRing = 1024;
+constexpr std::int32_t kLargeRing = 65536;
+constexpr std::uint32_t kTickMilliseconds = 250;
+constexpr std::int32_t kShortSpan = 5000;
+constexpr std::int32_t kLongSpan = 60000;
+// From bytes per millisecond to bits per second.
+constexpr double kBitsPerSecond = 8000;
+
+// Amounts come from outside: sums wrap instead of being undefined.
+std::int64_t sum(std::int64_t value, std::uint64_t added) noexcept
+{
+    return static_cast<std::int64_t>(static_cast<std::uint64_t>(value) + added);
+}
+
+void add(std::atomic<std::int64_t>& amount, std::uint64_t added) noexcept
+{
+    amount = sum(amount, added);
+}
+
+void addUpTo(const std::atomic<std::int64_t>& total, std::atomic<std::int64_t>& done, std::uint64_t added) noexcept
+{
+    const std::int64_t limit = total;
+    const std::int64_t result = sum(done, added);
+    done = result > limit ? limit : result;
+}
+
+// Truncation that is defined for every number.
+template <class Integer>
+Integer truncated(double value) noexcept
+{
+    if (std::isnan(value))
+        return 0;
+    if (value <= static_cast<double>(std::numeric_limits<Integer>::min()))
+        return std::numeric_limits<Integer>::min();
+    if (value >= static_cast<double>(std::numeric_limits<Integer>::max()))
+        return std::numeric_limits<Integer>::max();
+    return static_cast<Integer>(value);
+}
+
+} // namespace
+
+void PublishedText::set(const wxString& text)
+{
+    text_.replace(new Shared(text));
+}
+
+wxString PublishedText::get() const
+{
+    Shared* const shared = text_.acquire();
+    if (!shared)
+        return wxString();
+    const struct Hold {
+        Shared* shared;
+        ~Hold()
+        {
+            shared->Release();
+        }
+    } hold{shared};
+    return shared->text();
+}
+
+TransferStatus::TransferStatus(bool samplingOn, TickSource clock)
+    : ringA(samplingOn ? kSmallRing : 1, clock), ringB(samplingOn ? kLargeRing : 1, clock),
+      restoreRing(samplingOn ? kLargeRing : 1, clock), sampling(samplingOn)
+{
+}
+
+void TransferStatus::apply(const PipeMessage& message)
+{
+    if (message.kind() == MessageKind::event)
+        applyEvent(static_cast<const EventMessage&>(message));
+    else if (message.kind() == MessageKind::snapshot)
+        applySnapshot(static_cast<const SnapshotMessage&>(message));
+}
+
+void TransferStatus::resetBackup()
+{
+    statusTextA.clear();
+    statusTextB.clear();
+    ringA.clearRing();
+    ringB.clearRing();
+    for (auto* const rate : {&rate0, &rate1, &rate2})
+        *rate = 0;
+    for (auto* const amount : {&totalA, &totalB, &doneA, &doneB})
+        *amount = 0;
+    // All but restoreStarted: a restore goes on while backups come and go.
+    for (auto* const flag : {&ended, &ended3, &switch34, &switch32, &switch39, &switch24, &mark10, &ended10, &ended4,
+                             &ended6, &ended8, &ended5, &ended9})
+        *flag = false;
+}
+
+void TransferStatus::resetRestore()
+{
+    restoreText.clear();
+    restoreRing.clearRing();
+    restoreRateShort = 0;
+    restoreRateLong = 0;
+    restoreTotal = 0;
+    restoreDone = 0;
+    restoreStarted = false;
+}
+
+void TransferStatus::zeroRates() noexcept
+{
+    for (auto* const rate : {&rate0, &rate1, &restoreRateShort, &rate2, &restoreRateLong})
+        *rate = 0;
+}
+
+void TransferStatus::applyEvent(const EventMessage& event)
+{
+    const auto endWith = [this](std::atomic<bool>* outcome) {
+        resetBackup();
+        ended = true;
+        if (outcome)
+            *outcome = true;
+    };
+    switch (event.type()) {
+    case 0:
+    // No outcome for 2, although a snapshot's state 2 has one.
+    case 2:
+        endWith(nullptr);
+        break;
+    case 1:
+        resetBackup();
+        break;
+    case 3:
+        endWith(&ended3);
+        break;
+    case 4:
+        endWith(&ended4);
+        break;
+    case 5:
+        endWith(&ended5);
+        break;
+    case 6:
+        endWith(&ended6);
+        break;
+    case 8:
+        endWith(&ended8);
+        break;
+    case 9:
+        endWith(&ended9);
+        break;
+    case 10:
+        endWith(&ended10);
+        mark10 = true;
+        totalB = static_cast<std::int64_t>(event.value);
+        totalA = static_cast<std::int64_t>(event.value);
+        break;
+    case 11:
+        statusTextA.set(*event.text);
+        break;
+    case 12:
+        statusTextA.clear();
+        break;
+    case 13:
+        statusTextB.set(*event.text);
+        break;
+    case 14:
+        statusTextB.clear();
+        break;
+    case 16:
+        addUpTo(totalA, doneA, event.value);
+        if (sampling)
+            ringA.addSample(event.value);
+        break;
+    case 17:
+        addUpTo(totalB, doneB, event.value);
+        if (sampling && event.flag != 0)
+            ringB.addSample(event.value);
+        break;
+    case 18:
+        add(totalA, event.value);
+        break;
+    case 19:
+        add(totalB, event.value);
+        break;
+    case 24:
+    case 25:
+        switch24 = event.type() == 24;
+        break;
+    case 32:
+    case 33:
+        switch32 = event.type() == 32;
+        break;
+    case 34:
+    case 35:
+        switch34 = event.type() == 34;
+        break;
+    case 36:
+        mark10 = false;
+        break;
+    case 39:
+    case 40:
+        switch39 = event.type() == 39;
+        break;
+    case 51:
+        resetRestore();
+        restoreStarted = true;
+        break;
+    case 52:
+        resetRestore();
+        break;
+    case 53:
+        restoreTotal = static_cast<std::int64_t>(event.value);
+        break;
+    case 54:
+        restoreText.set(*event.text);
+        break;
+    case 55:
+        restoreText.clear();
+        break;
+    case 56:
+        addUpTo(restoreTotal, restoreDone, event.value);
+        if (sampling)
+            restoreRing.addSample(event.value);
+        break;
+    case 57:
+        add(restoreTotal, event.value);
+        break;
+    default:
+        break;
+    }
+}
+
+void TransferStatus::applySnapshot(const SnapshotMessage& snapshot)
+{
+    for (RateRing* const ring : {&ringA, &ringB, &restoreRing})
+        ring->clearRing();
+    for (PublishedText* const text : {&statusTextA, &statusTextB, &restoreText})
+        text->clear();
+    zeroRates();
+    // counter2 is not read, and totalB and the restore's amounts keep their values.
+    doneA = static_cast<std::int64_t>(snapshot.counter1);
+    totalA = static_cast<std::int64_t>(snapshot.counter0);
+    doneB = static_cast<std::int64_t>(snapshot.counter3);
+
+    const auto endWith = [this](std::atomic<bool>* outcome) {
+        if (outcome)
+            *outcome = true;
+        ended = true;
+    };
+    switch (snapshot.state) {
+    case 0:
+        endWith(nullptr);
+        break;
+    case 1:
+        // Also zeroes the amounts that were just set.
+        resetBackup();
+        break;
+    case 2:
+    case 3:
+        endWith(&ended3);
+        break;
+    case 4:
+        endWith(&ended4);
+        break;
+    case 5:
+        endWith(&ended5);
+        break;
+    case 6:
+        endWith(&ended6);
+        break;
+    case 8:
+        endWith(&ended8);
+        break;
+    case 9:
+        endWith(&ended9);
+        break;
+    case 10:
+        mark10 = true;
+        endWith(&ended10);
+        break;
+    case 51:
+        restoreStarted = true;
+        break;
+    case 52:
+        resetRestore();
+        break;
+    default:
+        break;
+    }
+}
+
+void TransferStatus::renewRate(std::atomic<float>& rate, std::int32_t span) noexcept
+{
+    // A finished restore, or one with no known total, has no speed.
+    rate = restoreDone < restoreTotal ? static_cast<float>(restoreRing.rateOver(span) * kBitsPerSecond) : 0.0F;
+}
+
+void TransferStatus::timerTick() noexcept
+{
+    for (RateRing* const ring : {&ringA, &ringB, &restoreRing})
+        ring->addSample(0);
+    const std::uint32_t milliseconds = ++ticks_ * kTickMilliseconds;
+    if (milliseconds % 1000 == 0)
+        renewRate(restoreRateShort, kShortSpan);
+    if (milliseconds % 10000 == 0)
+        renewRate(restoreRateLong, kLongSpan);
+}
+
+std::optional<std::uint32_t> TransferStatus::remainingSeconds() const noexcept
+{
+    constexpr std::uint32_t unknown = UINT32_MAX;
+    const double rate = restoreRateLong;
+    if (!(rate * 0.001 >= 1.0))
+        return std::nullopt;
+    const auto left = static_cast<std::uint64_t>(restoreTotal.load()) - static_cast<std::uint64_t>(restoreDone.load());
+    const auto seconds = static_cast<std::uint32_t>(left * 8 / truncated<std::uint64_t>(rate));
+    return seconds == unknown ? std::nullopt : std::optional(seconds);
+}
+
+std::int32_t TransferStatus::barPosition() const noexcept
+{
+    const std::int64_t total = restoreTotal;
+    if (total == 0)
+        return 0;
+    return truncated<std::int32_t>(static_cast<double>(restoreDone.load()) * kBarRange / static_cast<double>(total));
+}
+
+std::uint64_t TransferStatus::restoreSpeed() const noexcept
+{
+    return static_cast<std::uint64_t>(truncated<std::int64_t>(restoreRateShort.load()));
+}
+
+} // namespace tavi

@@ -1,0 +1,34 @@
+#pragma once
+
+#include <cstdio>
+#include <string>
+
+// Frames as readable tables: two hexadecimal digits a byte, blanks anywhere.
+namespace tavi::test {
+
+inline std::string bytes(const std::string& digits)
+{
+    std::string out, pair;
+    for (const char digit : digits) {
+        if (digit != ' ')
+            pair += digit;
+        if (pair.size() == 2) {
+            out += static_cast<char>(std::stoi(pair, nullptr, 16));
+            pair.clear();
+        }
+    }
+    return out;
+}
+
+inline std::string hex(const std::string& text)
+{
+    std::string out;
+    for (const char byte : text) {
+        char pair[3];
+        std::snprintf(pair, sizeof(pair), "%02x", static_cast<unsigned char>(byte));
+        out += pair;
+    }
+    return out;
+}
+
+} // namespace tavi::test

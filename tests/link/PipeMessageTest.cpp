@@ -1,0 +1,129 @@
+#include "link/PipeMessage.h"
+
+#include <cstring>
+
+#include <gtest/gtest.h>
+
+#include "tests/link/Frames.h"
+
+namespace tavi {
+namespace {
+
+using test::bytes;
+using test::hex;
+
+MessageText text(const wxString& content)
+{
+    return std::make_shared<const wxString>(content);
+}
+
+std::string serialised(const PipeMessage& message)
+{
+    const HeldBuffer buffer;
+    message.serialise(*buffer);
+    return {reinterpret_cast<const char*>(buffer->data()), buffer->length()};
+}
+
+// A payload as a reader leaves it in the buffer.
+std::unique_ptr<PipeMessage> created(std::uint32_t type, const std::string& payload, std::uint32_t length)
+{
+    const HeldBuffer buffer;
+    buffer->ensure(static_cast<std::uint32_t>(payload.size()));
+    std::memcpy(buffer->data(), payload.data(), payload.size());
+    buffer->setLength(length);
+    return createMessage(type, *buffer);
+}
+
+TEST(PipeMessage, EveryKindKeepsItsLayoutInBothDirections)
+{
+    const std::pair<std::shared_ptr<PipeMessage>, const char*> cases[] = {
+        {std::make_shared<EventMessage>(52), "34000000 14000000 00000000 0000000000000000 00000000 00000000"},
+        {std::make_shared<EventMessage>(54, 0x01020304, 0x1122334455667788, 5, text(L"\u00e9")),
+         "36000000 16000000 04030201 8877665544332211 05000000 02000000 c3a9"},
+        {std::make_shared<SnapshotMessage>(51, 1, 2, 3, UINT64_MAX),
+         "14000000 24000000 33000000 0100000000000000 0200000000000000 0300000000000000 ffffffffffffffff"},
+        {std::make_shared<ItemMessage>(7, true, text(L"ab")),
+         "15000000 12000000 0700000000000000 01000000 02000000 6162"},
+        {std::make_shared<TextTripleMessage>(text(L"a"), text(L""), text(L"bc")),
+         "16000000 0f000000 01000000 00000000 02000000 616263"},
+        {std::make_shared<CounterMessage>(9, 1, 0x100000000, 0xfffffffe),
+         "17000000 18000000 09000000 0100000000000000 0000000001000000 feffffff"},
+    };
+    for (const auto& [message, frame] : cases) {
+        const std::string expected = bytes(frame);
+        EXPECT_EQ(hex(serialised(*message)), hex(expected));
+        const std::string payload = expected.substr(kFrameHeaderSize);
+        const auto length = static_cast<std::uint32_t>(payload.size());
+        const auto read = created(message->type(), payload, length);
+        ASSERT_TRUE(read) << frame;
+        EXPECT_EQ(read->kind(), message->kind());
+        EXPECT_EQ(hex(serialised(*read->clone())), hex(expected));
+    }
+    // Any flag word but 0 is true, and goes out as 1.
+    const auto item = created(21, bytes("0000000000000000 07000000 00000000"), 16);
+    EXPECT_EQ(hex(serialised(*item)), hex(bytes("15000000 10000000 0000000000000000 01000000 00000000")));
+}
+
+TEST(PipeMessage, TypesAndShortestPayloadsDecideWhatIsMade)
+{
+    const std::string zeros(64, '\0');
+    for (std::uint32_t type = 0; type <= 60; ++type) {
+        const bool unused =
+            (type >= 26 && type <= 31) || type == 37 || type == 38 || (type >= 41 && type <= 50) || type > 57;
+        const struct {
+            std::uint32_t type, kind, least;
+        } special[] = {{20, 1, 36}, {21, 2, 16}, {22, 3, 12}, {23, 4, 24}};
+        std::uint32_t kind = 0, least = 20;
+        for (const auto& row : special) {
+            if (row.type == type)
+                kind = row.kind, least = row.least;
+        }
+        EXPECT_FALSE(created(type, zeros, least - 1)) << type;
+        for (const std::uint32_t length : {least, least + 4}) {
+            const auto message = created(type, zeros, length);
+            ASSERT_EQ(message == nullptr, unused) << type;
+            EXPECT_TRUE(unused || (message->kind() == MessageKind{kind} && message->type() == type)) << type;
+        }
+    }
+    EXPECT_FALSE(created(UINT32_MAX, zeros, 64));
+}
+
+TEST(PipeMessage, TextCountsAreBelievedUpToTheEndOfTheBuffer)
+{
+    // What lies behind the payload is read along, and nothing behind the buffer.
+    const std::string head = bytes("00000000 0000000000000000 00000000");
+    const std::pair<const char*, std::size_t> counts[] = {
+        {"03000000", 3}, {"05000000", 5}, {"ffffffff", 1024 - 20}, {"00000080", 1024 - 20}};
+    for (const auto& [count, length] : counts) {
+        const auto message = created(54, head + bytes(count) + "abc", 23);
+        const auto& event = static_cast<const EventMessage&>(*message);
+        EXPECT_EQ(event.text->length(), length);
+        EXPECT_EQ(event.text->substr(0, 3), L"abc");
+    }
+    const auto triple = created(22, bytes("01000000 ffffffff ffffffff") + "xyz", 15);
+    const auto& texts = static_cast<const TextTripleMessage&>(*triple);
+    EXPECT_EQ(*texts.text1, L"x");
+    EXPECT_EQ(texts.text2->length(), 1024u - 13);
+    EXPECT_TRUE(texts.text3->empty());
+    const auto damaged = created(54, head + bytes("04000000 61ff80c3"), 24);
+    EXPECT_EQ(*static_cast<const EventMessage&>(*damaged).text, L"a\ufffd\ufffd\ufffd");
+}
+
+TEST(PipeMessage, BuffersGrowByAKilobyteMoreThanAsked)
+{
+    const HeldBuffer buffer;
+    const std::pair<std::uint32_t, std::uint32_t> steps[] = {
+        {44, 1024}, {1024, 1024}, {1025, 2049}, {2000, 2049}, {UINT32_MAX, 0}};
+    for (const auto& [size, capacity] : steps) {
+        buffer->ensure(size);
+        EXPECT_EQ(buffer->capacity(), capacity);
+        EXPECT_EQ(buffer->data() == nullptr, capacity == 0);
+    }
+    EXPECT_FALSE(createMessage(52, *buffer));
+    EventMessage(1, 0, 0, 0, text(wxString(L'x', 2000))).serialise(*buffer);
+    EXPECT_EQ(buffer->length(), 2028u);
+    EXPECT_EQ(buffer->capacity(), 2028u + 1024);
+}
+
+} // namespace
+} // namespace tavi
