@@ -39,7 +39,7 @@ class PlayedSource : public ByteSource {
         std::string& part = parts_[at_];
         const std::size_t count = part.copy(reinterpret_cast<char*>(into), size);
         part.erase(0, count);
-        at_ += part.empty() ? 1 : 0;
+        at_ += part.empty();
         ++open;
         return true;
     }

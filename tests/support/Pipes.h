@@ -1,0 +1,66 @@
+#pragma once
+
+#include <string>
+
+#include <windows.h>
+
+#include "core/Handles.h"
+#include "tests/support/Dialogs.h"
+
+namespace tavi::test {
+
+// The service's end of a pipe: one of as many instances as there are in all.
+class PipeServer {
+  public:
+    PipeServer(const wchar_t* name, DWORD access, DWORD instances = 1)
+        : pipe_(CreateNamedPipeW(name, access, PIPE_TYPE_BYTE | PIPE_NOWAIT, instances, 65536, 65536, 0, nullptr))
+    {
+        EXPECT_TRUE(pipe_);
+    }
+    bool waitClient() const
+    {
+        return waitState(ERROR_PIPE_CONNECTED);
+    }
+    // Until the client has closed its end.
+    bool waitHangUp() const
+    {
+        return waitState(ERROR_NO_DATA);
+    }
+    void write(const std::string& bytes) const
+    {
+        DWORD written = 0;
+        EXPECT_TRUE(WriteFile(pipe_.get(), bytes.data(), static_cast<DWORD>(bytes.size()), &written, nullptr));
+        EXPECT_EQ(written, bytes.size());
+    }
+    // Everything up to the client's end.
+    std::string readAll() const
+    {
+        std::string all;
+        waitUntil([&] {
+            char part[256];
+            DWORD count = 0;
+            if (!ReadFile(pipe_.get(), part, sizeof(part), &count, nullptr))
+                return GetLastError() == ERROR_BROKEN_PIPE;
+            all.append(part, count);
+            return false;
+        });
+        return all;
+    }
+    void hangUp() const
+    {
+        DisconnectNamedPipe(pipe_.get());
+    }
+
+  private:
+    bool waitState(DWORD state) const
+    {
+        return waitUntil([&] {
+            ConnectNamedPipe(pipe_.get(), nullptr);
+            return GetLastError() == state;
+        });
+    }
+
+    FileHandle pipe_;
+};
+
+} // namespace tavi::test
