@@ -57,6 +57,14 @@ std::map<std::wstring, Version> History::newest()
     return found;
 }
 
+std::optional<Version> History::find(const std::wstring& path, std::int64_t time)
+{
+    Statement row(database_, "SELECT path, time, size, modified, created, attributes, content FROM versions"
+                             " WHERE path = ? AND time = ?");
+    row.bind(1, path).bind(2, time);
+    return row.next() ? std::optional(readVersion(row)) : std::nullopt;
+}
+
 std::int64_t History::lastRun()
 {
     Statement row(database_, "SELECT ifnull(max(time), 0) FROM versions");

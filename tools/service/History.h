@@ -2,6 +2,7 @@
 
 #include <cstdint>
 #include <map>
+#include <optional>
 #include <string>
 
 #include "Database.h"
@@ -27,6 +28,7 @@ class History {
     explicit History(const Installation& installation);
 
     std::map<std::wstring, Version> newest();
+    std::optional<Version> find(const std::wstring& path, std::int64_t time);
     std::int64_t lastRun();
     // One run, whole or not at all.
     void addRun(const std::map<std::wstring, Version>& versions);

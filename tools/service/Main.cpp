@@ -1,5 +1,6 @@
 #include <windows.h>
 
+#include <algorithm>
 #include <cwchar>
 #include <exception>
 #include <optional>
@@ -9,6 +10,7 @@
 #include "Backup.h"
 #include "Installation.h"
 #include "Reports.h"
+#include "Run.h"
 #include "Text.h"
 
 namespace service {
@@ -57,6 +59,11 @@ int runShow(const Arguments&)
     return exitDone;
 }
 
+int runTell(const Arguments& arguments)
+{
+    return tell(arguments) ? exitDone : exitFailed;
+}
+
 struct Command {
     const wchar_t* name;
     const wchar_t* arguments;
@@ -70,6 +77,9 @@ constexpr Command kCommands[] = {
     {L"install", L"STATEDIR", L"makes the service's folders, databases and registry keys", 1, 1, runInstall},
     {L"backup", L"FOLDER... [--at UNIXTIME]", L"one backup run; exit code 2 when some file could not be read", 1,
      SIZE_MAX, runBackup},
+    {L"run", L"[--rate BYTES] [--search MS]", L"restores what is asked for, --rate bytes a second, and tells of it", 0,
+     6, run},
+    {L"tell", L"ORDER...", L"an order to the service at work", 1, 4, runTell},
     {L"requests", L"", L"prints the restore requests", 0, 0, runRequests},
     {L"show", L"", L"prints the manifest", 0, 0, runShow},
 };
@@ -79,10 +89,10 @@ std::wstring usage()
     std::wstring text = L"taviservice COMMAND: a stand-in for the Tavi Remote Backup service\n";
     for (const Command& command : kCommands) {
         std::wstring line = std::wstring(L"  ") + command.name + L" " + command.arguments;
-        line.resize(38, L' ');
+        line.resize(std::max<std::size_t>(40, line.size() + 2), L' ');
         text += line + command.help + L"\n";
     }
-    return text;
+    return text + ordersHelp();
 }
 
 int runCommand(const Arguments& words)
