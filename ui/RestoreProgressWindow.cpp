@@ -129,6 +129,7 @@ void runMessageLoop(HWND window)
         if (!shown && GetTickCount() - start >= kHiddenMilliseconds) {
             shown = true;
             ShowWindow(window, SW_SHOW);
+            SetForegroundWindow(window);
         }
     }
 }
