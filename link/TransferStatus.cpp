@@ -1,5 +1,6 @@
 #include "link/TransferStatus.h"
 
+#include <algorithm>
 #include <cmath>
 #include <limits>
 
@@ -314,7 +315,8 @@ std::optional<std::uint32_t> TransferStatus::remainingSeconds() const noexcept
     if (!(rate * 0.001 >= 1.0))
         return std::nullopt;
     const auto left = static_cast<std::uint64_t>(restoreTotal.load()) - static_cast<std::uint64_t>(restoreDone.load());
-    const auto seconds = static_cast<std::uint32_t>(left * 8 / truncated<std::uint64_t>(rate));
+    const auto bitsPerSecond = std::max<std::uint64_t>(truncated<std::uint64_t>(rate), 1);
+    const auto seconds = static_cast<std::uint32_t>(left * 8 / bitsPerSecond);
     return seconds == unknown ? std::nullopt : std::optional(seconds);
 }
 

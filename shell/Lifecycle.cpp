@@ -26,8 +26,12 @@ const HostName kHosts[] = {{L"explorer.exe", HostKind::fileManager},
                            {L"_RegDLL.tmp", HostKind::toolOnly}};
 
 std::atomic<bool> statusStopFlag{false};
-std::atomic<ThreadBody> statusListener{[](void*) { listenToStatus([] { return statusStopFlag.load(); }); }};
 HANDLE statusThread = INVALID_HANDLE_VALUE;
+
+void runStatusListener(void*)
+{
+    listenToStatus([] { return statusStopFlag.load(); });
+}
 
 } // namespace
 
@@ -67,19 +71,9 @@ void detachFromFileManager(bool processEnds)
     CloseLog();
 }
 
-ThreadBody setStatusListener(ThreadBody body) noexcept
-{
-    return statusListener.exchange(body);
-}
-
-bool statusStopRequested() noexcept
-{
-    return statusStopFlag;
-}
-
 void StartStatusThread() noexcept
 {
-    if (HANDLE thread = startModuleThread(statusListener, nullptr))
+    if (HANDLE thread = startModuleThread(runStatusListener, nullptr))
         statusThread = thread;
 }
 

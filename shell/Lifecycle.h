@@ -17,9 +17,7 @@ void attachToFileManager(HINSTANCE instance, const wchar_t* hostPath);
 // `processEnds`: nothing is unloaded, so what the system takes back by itself may stay.
 void detachFromFileManager(bool processEnds);
 
-// The status listener's thread. Another body than the listener's may take its place; answers the one before it.
-ThreadBody setStatusListener(ThreadBody body) noexcept;
-bool statusStopRequested() noexcept;
+// The status listener's thread.
 void StartStatusThread() noexcept;
 // Gives the thread half a second, then terminates it.
 void StopStatusThread() noexcept;

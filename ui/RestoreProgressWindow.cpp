@@ -129,7 +129,6 @@ void runMessageLoop(HWND window)
         if (!shown && GetTickCount() - start >= kHiddenMilliseconds) {
             shown = true;
             ShowWindow(window, SW_SHOW);
-            SetForegroundWindow(window);
         }
     }
 }

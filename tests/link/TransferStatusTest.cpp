@@ -1,6 +1,7 @@
 #include "link/TransferStatus.h"
 
 #include <cmath>
+#include <map>
 #include <sstream>
 #include <thread>
 #include <vector>
@@ -27,161 +28,137 @@ void event(TransferStatus& status, std::uint32_t type, std::uint64_t value = 0, 
     status.apply(EventMessage(type, 0, value, flag, text(content)));
 }
 
-// Whatever is set, by name; names in the order of the fields.
-std::string shown(const TransferStatus& status)
+// Whatever is set, by name.
+using Picture = std::map<std::string, std::string>;
+
+Picture pictureOf(const TransferStatus& status)
 {
-    std::ostringstream out;
-    const auto add = [&](const char* name, auto value) {
-        if (value != decltype(value){})
-            out << name << '=' << value << ' ';
-    };
-    add("A", status.statusTextA.get().utf8_string());
-    add("B", status.statusTextB.get().utf8_string());
-    add("text", status.restoreText.get().utf8_string());
-    // 1 ms more than the youngest sample's age takes in every sample.
-    add("ringA", status.ringA.rateOver(100000) * 1000);
-    add("ringB", status.ringB.rateOver(100000) * 1000);
-    add("ring", status.restoreRing.rateOver(100000) * 1000);
-    add("short", status.restoreRateShort.load());
-    add("long", status.restoreRateLong.load());
-    add("unused", status.rate0 + status.rate1 + status.rate2);
-    add("totalA", status.totalA.load());
-    add("totalB", status.totalB.load());
-    add("total", status.restoreTotal.load());
-    add("doneA", status.doneA.load());
-    add("doneB", status.doneB.load());
-    add("done", status.restoreDone.load());
-    const std::pair<const char*, bool> flags[] = {{"ended", status.ended},     {"started", status.restoreStarted},
-                                                  {"ended3", status.ended3},   {"34", status.switch34},
-                                                  {"32", status.switch32},     {"39", status.switch39},
-                                                  {"24", status.switch24},     {"mark", status.mark10},
-                                                  {"ended10", status.ended10}, {"ended4", status.ended4},
-                                                  {"ended6", status.ended6},   {"ended8", status.ended8},
-                                                  {"ended5", status.ended5},   {"ended9", status.ended9}};
-    for (const auto& [name, on] : flags)
-        out << (on ? std::string(name) + " " : "");
-    return out.str();
+    const auto bytes = [](const RateRing& ring) { return ring.rateOver(100000) * 1000; };
+    const auto flag = [](bool on) { return on ? 1.0 : 0.0; };
+    const auto amount = [](std::int64_t value) { return static_cast<double>(value); };
+    const auto& s = status;
+    const struct {
+        const char* names;
+        std::vector<double> values;
+    } groups[] = {{"ringA ringB ring short long rates",
+                   {bytes(s.ringA), bytes(s.ringB), bytes(s.restoreRing), s.restoreRateShort, s.restoreRateLong,
+                    s.rate0 + s.rate1 + s.rate2}},
+                  {"ended started ended3 34 32 39 24 mark",
+                   {flag(s.ended), flag(s.restoreStarted), flag(s.ended3), flag(s.switch34), flag(s.switch32),
+                    flag(s.switch39), flag(s.switch24), flag(s.mark10)}},
+                  {"ended10 ended4 ended6 ended8 ended5 ended9",
+                   {flag(s.ended10), flag(s.ended4), flag(s.ended6), flag(s.ended8), flag(s.ended5), flag(s.ended9)}},
+                  {"totalA totalB total doneA doneB done",
+                   {amount(s.totalA), amount(s.totalB), amount(s.restoreTotal), amount(s.doneA), amount(s.doneB),
+                    amount(s.restoreDone)}}};
+    Picture picture;
+    for (const auto& group : groups) {
+        std::istringstream names(group.names);
+        for (const double value : group.values) {
+            std::string name;
+            names >> name;
+            if (value != 0)
+                picture[name] = std::to_string(static_cast<int>(value));
+        }
+    }
+    for (const auto& [name, content] :
+         {std::pair("A", &status.statusTextA), {"B", &status.statusTextB}, {"text", &status.restoreText}}) {
+        if (!content->get().empty())
+            picture[name] = content->get().utf8_string();
+    }
+    return picture;
 }
 
-// Everything that an event can set is set.
-void fill(TransferStatus& status)
+// Changes are words: name=value, -name, or a group of names that go.
+Picture changed(Picture picture, const std::string& changes)
 {
-    for (const std::uint32_t outcome : {3u, 4u, 5u, 6u, 8u, 9u, 10u})
-        event(status, outcome);
-    for (auto* const flag :
-         {&status.ended3, &status.ended4, &status.ended5, &status.ended6, &status.ended8, &status.ended9})
+    const std::map<std::string, std::string> groups = {
+        {"-backup", "-A -B -ringA -ringB -rates -totalA -totalB -doneA -doneB -ended -ended3 -34 -32 -39 -24 -mark "
+                    "-ended10 -ended4 -ended6 -ended8 -ended5 -ended9"},
+        {"-restore", "-text -ring -short -long -total -done -started"},
+        {"-moving", "-A -B -text -ringA -ringB -ring -short -long -rates"}};
+    std::istringstream words(changes);
+    for (std::string word; words >> word;) {
+        const std::size_t equals = word.find('=');
+        if (const auto group = groups.find(word); group != groups.end())
+            picture = changed(picture, group->second);
+        else if (equals == std::string::npos)
+            picture.erase(word.substr(1));
+        else
+            picture[word.substr(0, equals)] = word.substr(equals + 1);
+    }
+    return picture;
+}
+
+// Rows parted by semicolons: a code and its changes.
+std::map<std::uint32_t, std::string> effectsOf(const std::string& table)
+{
+    std::map<std::uint32_t, std::string> effects;
+    std::istringstream rows(table);
+    for (std::string row; std::getline(rows, row, ';');) {
+        std::size_t end = 0;
+        const auto code = static_cast<std::uint32_t>(std::stoul(row, &end));
+        effects[code] = row.substr(end);
+    }
+    return effects;
+}
+
+// Everything that a message can change is set.
+Picture fill(TransferStatus& status)
+{
+    for (auto* const flag : {&status.ended, &status.ended3, &status.mark10, &status.ended10, &status.ended4,
+                             &status.ended6, &status.ended8, &status.ended5, &status.ended9, &status.restoreStarted,
+                             &status.switch24, &status.switch32, &status.switch34, &status.switch39})
         *flag = true;
-    event(status, 51);
     for (auto* const rate :
          {&status.rate0, &status.rate1, &status.rate2, &status.restoreRateShort, &status.restoreRateLong})
         *rate = 1;
-    for (const std::uint32_t on : {24u, 32u, 34u, 39u})
-        event(status, on);
-    event(status, 11, 0, 0, L"a");
-    event(status, 13, 0, 0, L"b");
-    event(status, 54, 0, 0, L"t");
-    event(status, 18, 100);
-    event(status, 19, 200);
-    event(status, 53, 300);
+    const std::pair<std::uint32_t, std::uint64_t> events[] = {{11, 0},   {13, 0},   {54, 0},
+                                                              {18, 100}, {19, 200}, {53, 300}};
+    for (const auto& [type, value] : events)
+        event(status, type, value, 0, L"old");
     now += 1000;
     event(status, 16, 10);
     event(status, 17, 20, 1);
     event(status, 56, 30);
-}
-
-const char* const kRestore = "text=t ring=30 short=1 long=1 total=300 done=30 started ";
-const char* const kFull =
-    "A=a B=b text=t ringA=10 ringB=20 ring=30 short=1 long=1 unused=3 totalA=100 totalB=200 total=300 "
-    "doneA=10 doneB=20 done=30 ended started ended3 34 32 39 24 mark ended10 ended4 ended6 ended8 "
-    "ended5 ended9 ";
-
-std::string without(std::string all, const std::vector<std::string>& gone)
-{
-    for (const std::string& name : gone)
-        all.erase(all.find(name + " "), name.size() + 1);
-    return all;
+    return pictureOf(status);
 }
 
 TEST(TransferStatus, EveryEventHasItsEffect)
 {
-    const std::string full = kFull, restore = kRestore;
-    const auto ended = [&](const std::string& outcome) {
-        return without(restore, {"started"}) + "ended started " + outcome;
-    };
-    std::vector<std::string> expected(58, full);
-    expected[0] = expected[2] = ended("");
-    expected[1] = restore;
-    expected[3] = ended("ended3 ");
-    expected[4] = ended("ended4 ");
-    expected[5] = ended("ended5 ");
-    expected[6] = ended("ended6 ");
-    expected[8] = ended("ended8 ");
-    expected[9] = ended("ended9 ");
-    expected[10] = "text=t ring=30 short=1 long=1 totalA=500 totalB=500 total=300 done=30 ended started mark ended10 ";
-    const auto replaced = [&](const std::string& from, const std::string& to) {
-        std::string changed = full;
-        return changed.replace(changed.find(from + " "), from.size() + 1, to.empty() ? to : to + " ");
-    };
-    expected[11] = replaced("A=a", "A=new");
-    expected[12] = replaced("A=a", "");
-    expected[13] = replaced("B=b", "B=new");
-    expected[14] = replaced("B=b", "");
-    // The sample takes another 1000 ms; the sum is cut to the total.
-    expected[16] = without(replaced("doneA=10", "doneA=100"), {}).replace(full.find("ringA=10"), 8, "ringA=255");
-    expected[17] = replaced("doneB=20", "doneB=200"); // no flag: no sample
-    expected[18] = replaced("totalA=100", "totalA=600");
-    expected[19] = replaced("totalB=200", "totalB=700");
-    expected[25] = without(full, {"24"});
-    expected[33] = without(full, {"32"});
-    expected[35] = without(full, {"34"});
-    expected[36] = without(full, {"mark"});
-    expected[40] = without(full, {"39"});
-    const std::vector<std::string> restoreOnly = {"text=t", "ring=30", "short=1", "long=1", "total=300", "done=30"};
-    expected[51] = without(full, restoreOnly);
-    expected[52] = without(expected[51], {"started"});
-    expected[53] = replaced("total=300", "total=500");
-    expected[54] = replaced("text=t", "text=new");
-    expected[55] = without(full, {"text=t"});
-    expected[56] = replaced("done=30", "done=300").replace(full.find("ring=30"), 7, "ring=265");
-    expected[57] = replaced("total=300", "total=800");
-    for (std::uint32_t type = 0; type < expected.size(); ++type) {
+    // 16: no more than the total, but the sample counts. 17: without the flag no sample.
+    const auto effects = effectsOf(
+        "0 -backup ended=1; 1 -backup; 2 -backup ended=1; 3 -backup ended=1 ended3=1; 4 -backup ended=1 ended4=1;"
+        "5 -backup ended=1 ended5=1; 6 -backup ended=1 ended6=1; 7; 8 -backup ended=1 ended8=1;"
+        "9 -backup ended=1 ended9=1; 10 -backup ended=1 ended10=1 mark=1 totalA=500 totalB=500; 11 A=new; 12 -A;"
+        "13 B=new; 14 -B; 15; 16 doneA=100 ringA=255; 17 doneB=200; 18 totalA=600; 19 totalB=700; 24; 25 -24; 32;"
+        "33 -32; 34; 35 -34; 36 -mark; 39; 40 -39; 51 -restore started=1; 52 -restore; 53 total=500; 54 text=new;"
+        "55 -text; 56 done=300 ring=265; 57 total=800; 20; 30; 99");
+    for (const auto& [type, effect] : effects) {
         TransferStatus status(true, tick);
-        fill(status);
-        ASSERT_EQ(shown(status), full);
+        const Picture full = fill(status);
+        ASSERT_EQ(full.size(), 29u);
         now += 1000;
         event(status, type, 500, 0, L"new");
-        EXPECT_EQ(shown(status), expected[type]) << "type " << type;
+        EXPECT_EQ(pictureOf(status), changed(full, effect)) << "type " << type;
     }
 }
 
 TEST(TransferStatus, EverySnapshotHasItsEffect)
 {
-    const std::string amounts = "totalA=1 totalB=200 total=300 doneA=2 doneB=4 done=30 ", flags = "34 32 39 24 ";
-    const std::pair<std::uint32_t, std::string> cases[] = {
-        {0, amounts + "ended " + flags},
-        {1, "total=300 done=30 "},
-        {2, amounts + "ended ended3 " + flags},
-        {3, amounts + "ended ended3 " + flags},
-        {4, amounts + "ended " + flags + "ended4 "},
-        {5, amounts + "ended " + flags + "ended5 "},
-        {6, amounts + "ended " + flags + "ended6 "},
-        {7, amounts + flags},
-        {8, amounts + "ended " + flags + "ended8 "},
-        {9, amounts + "ended " + flags + "ended9 "},
-        {10, amounts + "ended " + flags + "mark ended10 "},
-        {51, amounts + "started " + flags},
-        {52, "totalA=1 totalB=200 doneA=2 doneB=4 " + flags},
-        {99, amounts + flags},
-    };
-    for (const auto& [state, expected] : cases) {
+    const auto effects = effectsOf(
+        "0 ended=1; 1 -backup; 2 ended=1 ended3=1; 3 ended=1 ended3=1; 4 ended=1 ended4=1; 5 ended=1 ended5=1;"
+        "6 ended=1 ended6=1; 7; 8 ended=1 ended8=1; 9 ended=1 ended9=1; 10 ended=1 ended10=1 mark=1; 51 started=1;"
+        "52 -restore; 53; 99");
+    for (const auto& [state, effect] : effects) {
         TransferStatus status(true, tick);
         fill(status);
-        for (auto* const flag :
-             {&status.ended, &status.ended3, &status.ended4, &status.ended5, &status.ended6, &status.ended8,
-              &status.ended9, &status.ended10, &status.mark10, &status.restoreStarted})
-            *flag = false;
+        event(status, 1);
+        event(status, 19, 200);
+        status.restoreStarted = false;
+        const Picture before = pictureOf(status);
         status.apply(SnapshotMessage(state, 1, 2, 3, 4));
-        EXPECT_EQ(shown(status), expected) << "state " << state;
+        EXPECT_EQ(pictureOf(status), changed(before, "-moving totalA=1 doneA=2 doneB=4 " + effect)) << state;
     }
 }
 

@@ -30,23 +30,5 @@ TEST(Lifecycle, TheGateComparesTheBeginningOfTheName)
     EXPECT_EQ(GetLastError(), DWORD{ERROR_DLL_INIT_FAILED});
 }
 
-TEST(Lifecycle, AStatusThreadGetsHalfASecond)
-{
-    for (const bool obeys : {true, false}) {
-        static std::atomic<bool> listens;
-        listens = obeys;
-        const ThreadBody before = setStatusListener([](void*) {
-            while (!listens || !statusStopRequested())
-                Sleep(10);
-        });
-        StartStatusThread();
-        requestThreadsStop();
-        const DWORD start = GetTickCount();
-        StopStatusThread();
-        EXPECT_EQ(GetTickCount() - start >= 450, !obeys);
-        setStatusListener(before);
-    }
-}
-
 } // namespace
 } // namespace tavi

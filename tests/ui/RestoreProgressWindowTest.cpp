@@ -167,15 +167,5 @@ TEST_F(RestoreProgressWindowTest, SurvivesEveryOrderOfEnds)
     });
 }
 
-TEST_F(RestoreProgressWindowTest, SpeaksTheLanguageOfTheCatalogue)
-{
-    translate("Waiting to begin restore...", "Gleich geht es los");
-    RestoreProgressWindow::getOrCreate();
-    const HWND dialog = hiddenDialog();
-    shows(dialog, TAVI_PROGRESS_STATUS, L"Gleich geht es los");
-    tell(52);
-    EXPECT_TRUE(gone(dialog));
-}
-
 } // namespace
 } // namespace tavi

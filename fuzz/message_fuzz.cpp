@@ -1,0 +1,74 @@
+#include <algorithm>
+#include <cstdint>
+#include <cstdlib>
+#include <cstring>
+
+#include "link/MessageReader.h"
+#include "link/TransferStatus.h"
+
+namespace {
+
+using namespace tavi;
+
+// A peer that sends the input, as many bytes at a time as the input itself says.
+class Peer : public ByteSource {
+  public:
+    Peer(const std::uint8_t* bytes, std::size_t length) : bytes_(bytes), length_(length) {}
+    bool peek(std::uint32_t& available) override
+    {
+        available = static_cast<std::uint32_t>(std::min(length_, part_));
+        return length_ > 0;
+    }
+    void pause() override {}
+    bool startRead(unsigned char* into, std::uint32_t size) override
+    {
+        const std::size_t count = std::min({std::size_t{size}, length_, part_});
+        std::memcpy(into, bytes_, count);
+        bytes_ += count;
+        length_ -= count;
+        part_ = length_ > 0 ? std::size_t{bytes_[0]} + 1 : 1;
+        return count > 0;
+    }
+    bool finishRead() override
+    {
+        return true;
+    }
+    void abandonRead() override {}
+
+  private:
+    const std::uint8_t* bytes_;
+    std::size_t length_;
+    std::size_t part_ = SIZE_MAX;
+};
+
+std::uint32_t clock()
+{
+    static std::uint32_t ticks = 0;
+    return ticks += 100;
+}
+
+} // namespace
+
+// Whatever arrives is applied; a message that is written and read again must be the same one.
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t length)
+{
+    static TransferStatus status(false, clock);
+    Peer peer(bytes, length);
+    while (const auto message = readFrame(peer, nullptr)) {
+        status.apply(*message);
+        status.timerTick();
+        (void)status.remainingSeconds();
+        (void)status.barPosition();
+        (void)status.restoreSpeed();
+        (void)status.restoreText.get();
+        const HeldBuffer once, again, payload;
+        message->clone()->serialise(*once);
+        payload->ensure(once->length());
+        payload->setLength(once->length() - kFrameHeaderSize);
+        std::memcpy(payload->data(), once->data() + kFrameHeaderSize, payload->length());
+        createMessage(message->type(), *payload)->serialise(*again);
+        if (once->length() != again->length() || std::memcmp(once->data(), again->data(), once->length()) != 0)
+            std::abort();
+    }
+    return 0;
+}
