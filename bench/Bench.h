@@ -43,7 +43,7 @@ class Bench {
     }
 
     // Runs `child` with these arguments in a process of its own, so that what it measures of the process is its own
-    // doing. The numbers that it returns come back.
+    // doing. The numbers that it returns come back. Any thread.
     std::vector<double> inOwnProcess(const std::string& child, const std::vector<std::string>& arguments);
 
   private:

@@ -1,6 +1,7 @@
 #include "bench/Bench.h"
 
 #include <algorithm>
+#include <atomic>
 #include <chrono>
 #include <cstdio>
 #include <cstring>
@@ -77,7 +78,9 @@ std::vector<double> Bench::inOwnProcess(const std::string& child, const std::vec
 {
     char program[MAX_PATH] = "";
     GetModuleFileNameA(nullptr, program, MAX_PATH);
-    const std::string resultFile = dataFolder_ + "/child-" + std::to_string(GetCurrentProcessId()) + ".txt";
+    static std::atomic<int> started{0};
+    const std::string resultFile =
+        dataFolder_ + "/child-" + std::to_string(GetCurrentProcessId()) + "-" + std::to_string(++started) + ".txt";
     std::string line = '"' + std::string(program) + "\" --child \"" + resultFile + "\" " + child;
     for (const std::string& argument : arguments)
         line += " \"" + argument + '"';

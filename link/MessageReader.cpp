@@ -5,8 +5,8 @@
 namespace tavi {
 namespace {
 
-// Up to here an announced length is believed before anything of it is there.
-constexpr std::uint32_t kTrustedLength = 1024 * 1024;
+// Up to here an announced length is believed before anything of it is there: the longest path has less.
+constexpr std::uint32_t kTrustedLength = 128 * 1024;
 
 std::uint32_t u32At(const unsigned char* bytes) noexcept
 {

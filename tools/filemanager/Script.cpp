@@ -1,5 +1,6 @@
 #include "Script.h"
 
+#include <psapi.h>
 #include <shlobj.h>
 #include <tlhelp32.h>
 #include <winternl.h>
@@ -30,6 +31,15 @@ std::vector<std::wstring> split(const std::wstring& text, wchar_t separator)
         at = end + 1;
     }
     return parts;
+}
+
+// The words from `first` on as the one command that they were.
+std::wstring joined(const std::vector<std::wstring>& words, std::size_t first)
+{
+    std::wstring line = words[first];
+    for (std::size_t at = first + 1; at < words.size(); ++at)
+        line += L" | " + words[at];
+    return line;
 }
 
 int number(const std::wstring& text)
@@ -249,8 +259,11 @@ std::wstring objectCounts()
     for (BOOL more = Thread32First(snapshot, &entry); more; more = Thread32Next(snapshot, &entry))
         threads += entry.th32OwnerProcessID == GetCurrentProcessId();
     CloseHandle(snapshot);
+    PROCESS_MEMORY_COUNTERS memory = {};
+    GetProcessMemoryInfo(GetCurrentProcess(), &memory, sizeof memory);
     return L"handles " + std::to_wstring(handles) + L", gdi " + std::to_wstring(gdi ? gdi : wineGdiObjects()) +
-           L", threads " + std::to_wstring(threads);
+           L", threads " + std::to_wstring(threads) + L", memory " + std::to_wstring(memory.PagefileUsage / 1024) +
+           L" KB";
 }
 
 struct KeyName {
@@ -344,7 +357,9 @@ const std::vector<Script::Command>& Script::commands()
              });
              s.output_.line(a[0] + (GetModuleHandleW(a[0].c_str()) ? L" is still mapped" : L" is not mapped"));
          }},
-        {L"counts", L"", L"prints this process's handles, GDI objects and threads", 0, 0,
+        {L"hold", L"CLSID", L"keeps a COM class at work until the end", 1, 1,
+         [](S& s, const A& a) { s.onWindow([&] { s.hold(a[0]); }); }},
+        {L"counts", L"", L"prints this process's handles, GDI objects, threads and private memory", 0, 0,
          [](S& s, const A&) { s.output_.line(objectCounts()); }},
         {L"expect", L"TEXT | ...", L"fails unless the command before printed each TEXT", 1, SIZE_MAX,
          [](S& s, const A& a) { s.expect(a, true); }},
@@ -352,6 +367,8 @@ const std::vector<Script::Command>& Script::commands()
          [](S& s, const A& a) { s.expect(a, false); }},
         {L"repeat", L"N | COMMAND", L"runs a command N times; only the last prints", 2, SIZE_MAX,
          [](S& s, const A& a) { s.repeat(a); }},
+        {L"try", L"COMMAND", L"runs a command that may fail, and prints why it did", 1, SIZE_MAX,
+         [](S& s, const A& a) { s.tryLine(joined(a, 0)); }},
         {L"exit", L"", L"closes the file manager", 0, 0, [](S& s, const A&) { s.ended_ = true; }},
     };
     return table;
@@ -376,6 +393,8 @@ Script::Script(FolderWindow& window, Output& output, std::wstring text)
 
 Script::~Script()
 {
+    for (IUnknown* const factory : held_)
+        factory->Release();
     if (thread_)
         CloseHandle(thread_);
     CloseHandle(stop_);
@@ -546,12 +565,31 @@ void Script::press(const std::wstring& name)
 
 void Script::repeat(const Arguments& arguments)
 {
-    std::wstring line = arguments[1];
-    for (std::size_t at = 2; at < arguments.size(); ++at)
-        line += L" | " + arguments[at];
+    const std::wstring line = joined(arguments, 1);
     for (int count = number(arguments[0]); count > 0; --count) {
         output_.mute(count > 1);
         runLine(line);
+    }
+}
+
+void Script::hold(const std::wstring& classId)
+{
+    CLSID id = {};
+    IUnknown* factory = nullptr;
+    HRESULT result = CLSIDFromString(classId.c_str(), &id);
+    if (SUCCEEDED(result))
+        result = CoGetClassObject(id, CLSCTX_INPROC_SERVER, nullptr, IID_IUnknown, reinterpret_cast<void**>(&factory));
+    if (FAILED(result))
+        throw Failure{L"no class " + classId + L": " + hexCode(result)};
+    held_.push_back(factory);
+}
+
+void Script::tryLine(const std::wstring& line)
+{
+    try {
+        runLine(line);
+    } catch (const Failure& failure) {
+        output_.line(L"failed: " + failure.text);
     }
 }
 

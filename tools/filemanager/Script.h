@@ -50,6 +50,8 @@ class Script {
     void showMenu();
     void press(const std::wstring& name);
     void repeat(const Arguments& arguments);
+    void hold(const std::wstring& classId);
+    void tryLine(const std::wstring& line);
     void expect(const Arguments& texts, bool present);
 
     FolderWindow& folder_;
@@ -58,6 +60,7 @@ class Script {
     std::wstring text_;
     HANDLE stop_;
     HANDLE thread_ = nullptr;
+    std::vector<IUnknown*> held_;
     int lineNumber_ = 0;
     bool ended_ = false;
     bool failed_ = false;
