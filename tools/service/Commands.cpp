@@ -26,8 +26,11 @@ std::wstring hexOf(const std::string& bytes)
 
 CommandServer::CommandServer(std::function<bool()> cancel) : cancel_(std::move(cancel))
 {
+    std::vector<std::unique_ptr<PipeEnd>> pipes;
     for (int i = 0; i < kInstances; ++i)
-        threads_.emplace_back([this] { serve(); });
+        pipes.push_back(std::make_unique<PipeEnd>(kCommandPipe, PIPE_ACCESS_INBOUND, stop_.get()));
+    for (auto& made : pipes)
+        threads_.emplace_back([this, pipe = std::move(made)] { serve(*pipe); });
 }
 
 CommandServer::~CommandServer()
@@ -37,19 +40,26 @@ CommandServer::~CommandServer()
         thread.join();
 }
 
-void CommandServer::serve()
+void CommandServer::serve(PipeEnd& pipe)
 {
-    PipeEnd pipe(kCommandPipe, PIPE_ACCESS_INBOUND, stop_.get());
     while (pipe.connect() || WaitForSingleObject(stop_.get(), 10) == WAIT_TIMEOUT) {
         std::string frame, part;
-        while (frame.size() < kLongest && pipe.read(part, kLongest, kPatience))
+        // One time limit for the whole frame: a client that sends it byte by byte must not keep the instance.
+        const DWORD start = GetTickCount();
+        for (DWORD spent = 0; frame.size() < kLongest && !isCancelCommand(frame) && spent < kPatience &&
+                              pipe.read(part, kLongest, kPatience - spent);
+             spent = GetTickCount() - start)
             frame += part;
         pipe.disconnect();
         if (frame.empty())
             continue;
-        const wchar_t* const answer = !isCancelCommand(frame) ? L"refused"
-                                      : cancel_()             ? L"cancel"
-                                                              : L"nothing to cancel";
+        std::wstring answer = L"refused";
+        try {
+            if (isCancelCommand(frame))
+                answer = cancel_() ? L"cancel" : L"nothing to cancel";
+        } catch (const Failure& failure) {
+            answer = failure.text;
+        }
         print(L"command " + hexOf(frame.substr(0, 64)) + L": " + answer + L"\n");
     }
 }

@@ -20,7 +20,7 @@ class CommandServer {
     ~CommandServer();
 
   private:
-    void serve();
+    void serve(PipeEnd& pipe);
 
     std::function<bool()> cancel_;
     Handle stop_ = makeEvent();

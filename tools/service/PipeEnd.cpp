@@ -9,10 +9,10 @@ Handle makeEvent()
     return Handle(CreateEventW(nullptr, TRUE, FALSE, nullptr));
 }
 
-PipeEnd::PipeEnd(const wchar_t* name, DWORD access, HANDLE stop) : stop_(stop), event_(makeEvent())
+PipeEnd::PipeEnd(const wchar_t* name, DWORD access, HANDLE stop, DWORD instances) : stop_(stop), event_(makeEvent())
 {
-    const HANDLE pipe = CreateNamedPipeW(name, access | FILE_FLAG_OVERLAPPED, PIPE_TYPE_BYTE | PIPE_WAIT,
-                                         PIPE_UNLIMITED_INSTANCES, 65536, 65536, 0, nullptr);
+    const HANDLE pipe = CreateNamedPipeW(name, access | FILE_FLAG_OVERLAPPED, PIPE_TYPE_BYTE | PIPE_WAIT, instances,
+                                         65536, 65536, 0, nullptr);
     if (pipe == INVALID_HANDLE_VALUE)
         throw systemFailure(name, GetLastError());
     pipe_.reset(pipe);

@@ -23,7 +23,7 @@ Handle makeEvent();
 class PipeEnd {
   public:
     // `access` is PIPE_ACCESS_INBOUND and so on. Throws when the instance cannot be made.
-    PipeEnd(const wchar_t* name, DWORD access, HANDLE stop);
+    PipeEnd(const wchar_t* name, DWORD access, HANDLE stop, DWORD instances = PIPE_UNLIMITED_INSTANCES);
 
     bool connect();
     bool write(std::string_view bytes, DWORD milliseconds = INFINITE);

@@ -33,6 +33,12 @@ void makeFolders(const std::wstring& path)
         throw systemFailure(path, GetLastError());
 }
 
+void removeFile(const std::wstring& path)
+{
+    SetFileAttributesW(longPath(path).c_str(), FILE_ATTRIBUTE_NORMAL);
+    DeleteFileW(longPath(path).c_str());
+}
+
 FILETIME fileTime(std::uint64_t time)
 {
     return {static_cast<DWORD>(time), static_cast<DWORD>(time >> 32)};
@@ -76,6 +82,7 @@ bool Restorer::isIdle()
 
 bool Restorer::cancel()
 {
+    const std::lock_guard guard(mutex_);
     if (!restoring_ && oldestRequest() == 0)
         return false;
     cancelled_ = true;
@@ -93,22 +100,38 @@ void Restorer::work()
 {
     while (!stop_) {
         try {
-            if (const std::int64_t request = oldestRequest())
+            if (const std::int64_t request = oldestRequest()) {
                 restore(request);
-            else
-                pause(settings_.poll);
+                continue;
+            }
+            const std::lock_guard guard(mutex_);
+            if (cancelled_ && !stop_ && oldestRequest() == 0) {
+                cancelled_ = false;
+                ResetEvent(interrupt_.get());
+            }
+        } catch (const Failure& failure) {
+            printError(failure.text + L"\n");
+        }
+        WaitForSingleObject(interrupt_.get(), settings_.poll);
+    }
+}
+
+bool Restorer::forget(std::int64_t id)
+{
+    while (!stop_) {
+        try {
+            Database state(installation_.stateDatabase());
+            Transaction transaction(state);
+            Statement(state, "DELETE FROM restore_files WHERE restore_id = ?").bind(1, id).next();
+            Statement(state, "DELETE FROM restores WHERE rowid = ?").bind(1, id).next();
+            transaction.commit();
+            return true;
         } catch (const Failure& failure) {
             printError(failure.text + L"\n");
             WaitForSingleObject(interrupt_.get(), settings_.poll);
-        } catch (const Interrupted&) {
-            if (!stop_ && !cancelled_)
-                ResetEvent(interrupt_.get());
-        }
-        if (cancelled_ && !stop_ && oldestRequest() == 0) {
-            cancelled_ = false;
-            ResetEvent(interrupt_.get());
         }
     }
+    return false;
 }
 
 void Restorer::restore(std::int64_t id)
@@ -137,12 +160,13 @@ void Restorer::restore(std::int64_t id)
         History history(installation_);
         for (const File& file : files) {
             status_.send(itemStarted, 0, file.target);
+            left_ = static_cast<std::uint64_t>(std::max<std::int64_t>(file.size, 0));
             try {
                 restoreFile(history, file);
             } catch (const Failure& failure) {
                 print(L"failed   " + failure.text + L"\n");
-                report(static_cast<std::uint64_t>(std::max<std::int64_t>(file.size, 0)), true);
             }
+            report(left_, true);
             status_.send(itemEnded);
         }
     } catch (const Interrupted&) {
@@ -151,25 +175,25 @@ void Restorer::restore(std::int64_t id)
             restoring_ = false;
             return;
         }
-        cancelled_ = false;
-        ResetEvent(interrupt_.get());
         end = L"cancelled";
     }
-    {
-        Database state(installation_.stateDatabase());
-        Transaction transaction(state);
-        Statement(state, "DELETE FROM restore_files WHERE restore_id = ?").bind(1, id).next();
-        Statement(state, "DELETE FROM restores WHERE rowid = ?").bind(1, id).next();
-        transaction.commit();
+    if (forget(id)) {
+        status_.send(restoreEnded);
+        print(name + end + L"\n");
     }
-    status_.send(restoreEnded);
-    print(name + end + L"\n");
+    const std::lock_guard guard(mutex_);
     restoring_ = false;
+    // A cancel that came too late for this request is not meant for the next.
+    if (!stop_) {
+        cancelled_ = false;
+        ResetEvent(interrupt_.get());
+    }
 }
 
 void Restorer::report(std::uint64_t bytes, bool now)
 {
     unreported_ += bytes;
+    left_ -= std::min(bytes, left_);
     if (unreported_ == 0 || (!now && GetTickCount() - lastReport_ < kReportMilliseconds))
         return;
     status_.send(bytesDone, std::exchange(unreported_, 0));
@@ -195,7 +219,6 @@ void Restorer::copyContent(const std::wstring& from, const std::wstring& to)
         report(count, false);
         pause(rate > 0 ? std::uint64_t{count} * 1000 / static_cast<std::uint64_t>(rate) : 0);
     }
-    report(0, true);
 }
 
 void Restorer::restoreFile(History& history, const File& file)
@@ -205,13 +228,13 @@ void Restorer::restoreFile(History& history, const File& file)
         throw Failure{file.path + L": there is no such version"};
     const DWORD present = GetFileAttributesW(longPath(file.target).c_str());
     if (present != INVALID_FILE_ATTRIBUTES && !file.overwrite) {
-        report(static_cast<std::uint64_t>(version->size), true);
         print(L"kept     " + file.target + L"\n");
         return;
     }
     makeFolders(parentOf(file.target));
     // Under its name the file appears whole, whatever happens before.
-    const std::wstring incoming = file.target + L".tavi-part";
+    const std::wstring incoming = parentOf(file.target) + L"\\incoming.tavi-part";
+    removeFile(incoming);
     try {
         copyContent(store_.pathOf(version->content), incoming);
         {
@@ -221,16 +244,24 @@ void Restorer::restoreFile(History& history, const File& file)
                              version->modified ? &modified : nullptr))
                 throw systemFailure(incoming, GetLastError());
         }
-        if (present != INVALID_FILE_ATTRIBUTES && (present & FILE_ATTRIBUTE_READONLY))
-            SetFileAttributesW(longPath(file.target).c_str(), FILE_ATTRIBUTE_NORMAL);
-        if (!MoveFileExW(longPath(incoming).c_str(), longPath(file.target).c_str(), MOVEFILE_REPLACE_EXISTING))
-            throw systemFailure(file.target, GetLastError());
+        const DWORD attributes = version->attributes & kSettableAttributes;
+        if (!SetFileAttributesW(longPath(incoming).c_str(), attributes ? attributes : FILE_ATTRIBUTE_NORMAL))
+            throw systemFailure(incoming, GetLastError());
+        const bool locked = present != INVALID_FILE_ATTRIBUTES && (present & FILE_ATTRIBUTE_READONLY);
+        if (locked)
+            SetFileAttributesW(longPath(file.target).c_str(), present & ~DWORD{FILE_ATTRIBUTE_READONLY});
+        // A file that has come meanwhile is replaced no more than one that was there.
+        if (!MoveFileExW(longPath(incoming).c_str(), longPath(file.target).c_str(),
+                         file.overwrite ? MOVEFILE_REPLACE_EXISTING : 0)) {
+            const DWORD error = GetLastError();
+            if (locked)
+                SetFileAttributesW(longPath(file.target).c_str(), present);
+            throw systemFailure(file.target, error);
+        }
     } catch (...) {
-        DeleteFileW(longPath(incoming).c_str());
+        removeFile(incoming);
         throw;
     }
-    if (const DWORD attributes = version->attributes & kSettableAttributes)
-        SetFileAttributesW(longPath(file.target).c_str(), attributes);
     print(L"restored " + file.target + L"\n");
 }
 

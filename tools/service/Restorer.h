@@ -2,6 +2,7 @@
 
 #include <atomic>
 #include <cstdint>
+#include <mutex>
 #include <string>
 #include <thread>
 #include <vector>
@@ -53,16 +54,21 @@ class Restorer {
     void report(std::uint64_t bytes, bool now);
     void pause(std::uint64_t milliseconds);
     std::int64_t oldestRequest();
+    // Tries until it is done; false when the service stops before.
+    bool forget(std::int64_t id);
 
     const Installation installation_;
     const RunSettings& settings_;
     StatusServer& status_;
     ContentStore store_;
     // Signalled: whatever goes on ends. The two flags tell why.
+    std::mutex mutex_;
     Handle interrupt_ = makeEvent();
     std::atomic<bool> stop_{false};
     std::atomic<bool> cancelled_{false};
     std::atomic<bool> restoring_{false};
+    // Of the file in work, the bytes that have not been counted as done.
+    std::uint64_t left_ = 0;
     std::uint64_t unreported_ = 0;
     DWORD lastReport_ = 0;
     std::thread thread_;

@@ -54,7 +54,7 @@ class Service {
     RunSettings settings;
 
   private:
-    void takeOrders();
+    void takeOrders(PipeEnd& pipe);
     std::wstring beHostile(std::int64_t seconds);
     std::wstring waitIdle(std::int64_t seconds);
 
@@ -107,7 +107,8 @@ std::wstring Service::waitIdle(std::int64_t seconds)
             if (session_ && session_->restorer.isIdle())
                 return L"idle";
         }
-        Sleep(50);
+        if (WaitForSingleObject(theEnd, 50) != WAIT_TIMEOUT)
+            break;
     }
     throw Failure{L"still at work"};
 }
@@ -146,9 +147,8 @@ std::wstring Service::obey(const Words& words)
 }
 
 // An order is words with a tab between, an answer a digit for refused (1) or done (0) and a text.
-void Service::takeOrders()
+void Service::takeOrders(PipeEnd& pipe)
 {
-    PipeEnd pipe(kControlPipe, PIPE_ACCESS_DUPLEX, end_.get());
     while (pipe.connect() || WaitForSingleObject(end_.get(), 10) == WAIT_TIMEOUT) {
         std::string line, part;
         while (line.find('\n') == std::string::npos && pipe.read(part, 4096, kControlPatience))
@@ -168,29 +168,34 @@ void Service::takeOrders()
                 answer = L"0" + obey(words);
             } catch (const Failure& failure) {
                 answer = L"1" + failure.text;
+            } catch (const std::exception& error) {
+                answer = L"1" + fromUtf8(error.what());
             }
         }
         pipe.write(toUtf8(answer + L"\n"), kControlPatience);
-        if (words[0] == L"kill")
+        const bool accepted = answer[0] == L'0';
+        if (accepted && words[0] == L"kill")
             TerminateProcess(GetCurrentProcess(), 1);
-        if (words[0] == L"stop")
-            SetEvent(theEnd);
         // The client hangs up once it has the answer.
         pipe.read(part, 1, kControlPatience);
+        if (accepted && words[0] == L"stop")
+            SetEvent(theEnd);
         pipe.disconnect();
     }
 }
 
 void Service::work()
 {
-    std::thread orders([this] { takeOrders(); });
+    // The only instance: a second service cannot make it, and ends.
+    PipeEnd control(kControlPipe, PIPE_ACCESS_DUPLEX, end_.get(), 1);
+    {
+        const std::lock_guard guard(mutex_);
+        session_.emplace(installation_, settings);
+    }
+    std::thread orders([this, &control] { takeOrders(control); });
     const HANDLE events[] = {theEnd, restart_.get()};
     DWORD woken = WAIT_OBJECT_0 + 1;
     while (woken == WAIT_OBJECT_0 + 1) {
-        {
-            const std::lock_guard guard(mutex_);
-            session_.emplace(installation_, settings);
-        }
         print(L"ready\n");
         woken = WaitForMultipleObjects(2, events, FALSE, INFINITE);
         {
@@ -198,8 +203,10 @@ void Service::work()
             session_.reset();
         }
         ResetEvent(restart_.get());
-        if (woken == WAIT_OBJECT_0 + 1)
-            WaitForSingleObject(theEnd, away_);
+        if (woken == WAIT_OBJECT_0 + 1 && WaitForSingleObject(theEnd, away_) == WAIT_TIMEOUT) {
+            const std::lock_guard guard(mutex_);
+            session_.emplace(installation_, settings);
+        }
     }
     SetEvent(end_.get());
     orders.join();

@@ -13,6 +13,7 @@ namespace {
 constexpr wchar_t kStatusPipe[] = L"\\\\.\\pipe\\tavistatus";
 constexpr DWORD kPatience = 10000;
 constexpr std::size_t kLongQueue = 20;
+constexpr std::size_t kLongestQueue = 2000;
 
 } // namespace
 
@@ -27,7 +28,9 @@ struct StatusServer::Client {
 
 StatusServer::StatusServer()
 {
-    acceptor_ = std::thread([this] { accept(); });
+    // Here, so that a client finds the pipe as soon as there is a server.
+    auto first = std::make_unique<PipeEnd>(kStatusPipe, PIPE_ACCESS_OUTBOUND, stop_.get());
+    acceptor_ = std::thread([this, pipe = std::move(first)]() mutable { accept(std::move(pipe)); });
 }
 
 StatusServer::~StatusServer()
@@ -53,9 +56,8 @@ void StatusServer::dropLeft(bool all)
         client->thread.join();
 }
 
-void StatusServer::accept()
+void StatusServer::accept(std::unique_ptr<PipeEnd> next)
 {
-    auto next = std::make_unique<PipeEnd>(kStatusPipe, PIPE_ACCESS_OUTBOUND, stop_.get());
     while (next->connect() || WaitForSingleObject(stop_.get(), 10) == WAIT_TIMEOUT) {
         // The next instance first: a client that comes again at once must find one.
         auto connected = std::exchange(next, std::make_unique<PipeEnd>(kStatusPipe, PIPE_ACCESS_OUTBOUND, stop_.get()));
@@ -75,7 +77,8 @@ void StatusServer::accept()
         Client& kept = *clients_.emplace_back(std::move(client));
         kept.thread = std::thread([this, &kept] {
             serve(kept);
-            kept.pipe->disconnect();
+            // Not disconnected, which would take back what the client has not read yet.
+            kept.pipe.reset();
             kept.left = true;
         });
         SetEvent(kept.wake.get());
@@ -141,6 +144,13 @@ void StatusServer::post(const Outgoing& message)
         client->queue.push_back(message);
         if (client->queue.size() > kLongQueue)
             collapse(client->queue);
+        if (client->queue.size() > kLongestQueue) {
+            client->queue.clear();
+            Outgoing end;
+            end.repeat = 0;
+            end.hangUp = true;
+            client->queue.push_back(end);
+        }
         SetEvent(client->wake.get());
     }
 }
@@ -193,7 +203,9 @@ bool StatusServer::sendGarbage(const std::wstring& kind)
     } else if (kind == L"count") {
         garbage.raw = header(itemStarted, 25) + fields + "\xff\xff\xff\x7f" + "abcde";
     } else if (kind == L"huge") {
-        garbage.raw = header(itemStarted, 64 << 20) + std::string(64 << 20, 'x');
+        // Many small parts: a client that does not read them would keep the whole in memory.
+        garbage.raw = std::string(65536, 'x');
+        garbage.repeat = 1024;
     } else if (kind == L"short") {
         garbage.raw = header(restoreEnded, 19) + std::string(19, '\0');
     } else if (kind == L"type") {
@@ -216,6 +228,8 @@ bool StatusServer::sendGarbage(const std::wstring& kind)
         return false;
     }
     const std::lock_guard guard(mutex_);
+    if (kind == L"huge")
+        post({0, 0, {}, header(itemStarted, 64 << 20)});
     post(garbage);
     return true;
 }

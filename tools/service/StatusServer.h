@@ -40,7 +40,7 @@ class StatusServer {
     };
     struct Client;
 
-    void accept();
+    void accept(std::unique_ptr<PipeEnd> next);
     void serve(Client& client);
     void post(const Outgoing& message);
     static void collapse(std::deque<Outgoing>& queue);
