@@ -2,6 +2,7 @@
 
 #include <wx/datetime.h>
 
+#include "backupset/Graylist.h"
 #include "backupset/ManifestWatcher.h"
 #include "core/Boundary.h"
 #include "core/Handles.h"
@@ -12,7 +13,6 @@ namespace tavi {
 namespace {
 
 WatcherState watcher;
-std::atomic<ExclusionBuilder> exclusionBuilder{nullptr};
 // Made before the process entry runs; serialises only the start of the watcher.
 const KernelHandle manifestMutex(CreateMutexW(nullptr, FALSE, nullptr));
 
@@ -38,8 +38,7 @@ class SystemServices : public WatcherServices {
     }
     void buildExclusions(bool firstLoad) override
     {
-        if (const ExclusionBuilder build = exclusionBuilder)
-            build(firstLoad);
+        BuildGraylist(!firstLoad);
     }
 };
 
@@ -87,11 +86,6 @@ const Manifest* GetCurrentManifest() noexcept
     return watcher.manifest.acquire();
 }
 
-void setExclusionBuilder(ExclusionBuilder builder) noexcept
-{
-    exclusionBuilder = builder;
-}
-
 void requestWatcherStop() noexcept
 {
     watcher.stopFlag = 1;
@@ -107,6 +101,7 @@ void StopManifestWatcher() noexcept
         closeWatcherHandle();
     }
     watcher.manifest.replace(nullptr);
+    DropGraylist();
 }
 
 } // namespace tavi

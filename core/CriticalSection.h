@@ -21,6 +21,10 @@ class CriticalSection {
     {
         EnterCriticalSection(&section_);
     }
+    bool try_lock() noexcept
+    {
+        return TryEnterCriticalSection(&section_) != FALSE;
+    }
     void unlock() noexcept
     {
         LeaveCriticalSection(&section_);

@@ -1,0 +1,29 @@
+#pragma once
+
+#include <vector>
+
+#include <windows.h>
+#include <wx/string.h>
+
+// The registry hives of all users of the machine, for as long as the list of default exclusions is built. Callers
+// serialise LoadUserHives, ShellFolderPaths and UnloadUserHives among themselves.
+namespace tavi {
+
+// Makes every profile's hive reachable below HKEY_USERS, those of users who are not logged on under temporary names.
+// Nests: only the outermost pair works. What cannot be loaded is left out in silence; without the backup and restore
+// privileges that is every hive that the system has not loaded itself.
+void LoadUserHives();
+void UnloadUserHives();
+
+// The named value of every user's "Shell Folders" key, in long form and in the order of the hives; without those that
+// do not exist. A user whose hive can be reached twice contributes twice.
+std::vector<wxString> ShellFolderPaths(const wxString& valueName);
+
+// The long form of an existing path, with an upper-case drive letter; empty when it does not exist. Any thread.
+wxString LongPath(const wxString& path);
+
+// Any failure answers false. Any thread.
+bool IsPrivilegeEnabled(HANDLE token, const wchar_t* privilege);
+bool SetPrivilege(HANDLE token, const wchar_t* privilege, bool enable);
+
+} // namespace tavi
