@@ -5,9 +5,11 @@
 
 #include <strsafe.h>
 
+#include "backupset/CurrentManifest.h"
 #include "core/Boundary.h"
 #include "core/Handles.h"
 #include "ui/ContextMenu.h"
+#include "ui/PropertyPage.h"
 
 namespace tavi {
 namespace {
@@ -77,9 +79,11 @@ STDMETHODIMP_(ULONG) ShellExt::Release()
     });
 }
 
-STDMETHODIMP ShellExt::AddPages(LPFNADDPROPSHEETPAGE, LPARAM)
+STDMETHODIMP ShellExt::AddPages(LPFNADDPROPSHEETPAGE addPage, LPARAM parameter)
 {
-    return guarded("ShellExt::AddPages", E_FAIL, [] { return E_NOTIMPL; });
+    guarded("ShellExt::AddPages",
+            [&] { addPropertyPage(selection_, ManifestRef(GetCurrentManifest()), addPage, parameter); });
+    return S_OK;
 }
 
 STDMETHODIMP ShellExt::ReplacePage(EXPPS, LPFNADDPROPSHEETPAGE, LPARAM)

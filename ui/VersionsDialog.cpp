@@ -9,6 +9,7 @@
 
 #include <commctrl.h>
 #include <ole2.h>
+#include <prsht.h>
 #include <wx/datetime.h>
 #include <wx/intl.h>
 #include <wx/log.h>
@@ -222,7 +223,9 @@ INT_PTR VersionsDialog::handleMessage(HWND window, UINT message, WPARAM wParam, 
         runCommand(LOWORD(wParam));
         return TRUE;
     case WM_CLOSE:
-        DestroyWindow(window);
+        // A page's window is the sheet's to destroy.
+        if (ownThread_)
+            DestroyWindow(window);
         return TRUE;
     case WM_DESTROY:
         if (ownThread_)
@@ -241,7 +244,8 @@ HWND VersionsDialog::list() const
 void VersionsDialog::initialize()
 {
     setTexts();
-    setWindowIcons(window_);
+    if (ownThread_)
+        setWindowIcons(window_);
     SendMessageW(list(), LVM_SETEXTENDEDLISTVIEWSTYLE, 0, LVS_EX_FULLROWSELECT | LVS_EX_DOUBLEBUFFER);
     addColumns();
     addRows();
@@ -389,8 +393,12 @@ void VersionsDialog::runCommand(UINT id)
         });
     }
     // Whatever was answered; a box may have outlived the window.
-    if (IsWindow(window_))
+    if (!IsWindow(window_))
+        return;
+    if (ownThread_)
         DestroyWindow(window_);
+    else if (id == IDCANCEL)
+        PostMessageW(GetParent(window_), PSM_PRESSBUTTON, PSBTN_CANCEL, 0);
 }
 
 std::optional<bool> VersionsDialog::askOverwrite(const wxString& question, UINT icon) const

@@ -27,7 +27,8 @@ void setProgressWindowOpener(ProgressWindowOpener opener) noexcept;
 // because the boxes it opens run message loops in which the window and its host's hold on the object may go.
 class VersionsDialog : public std::enable_shared_from_this<VersionsDialog> {
   public:
-    // With `ownThread` the end of the window ends the thread's message loop.
+    // With `ownThread` the end of the window ends the thread's message loop; without it the window is a page of a
+    // sheet.
     VersionsDialog(const Selection& selection, ManifestRef manifest, bool ownThread);
     VersionsDialog(const VersionsDialog&) = delete;
     VersionsDialog& operator=(const VersionsDialog&) = delete;

@@ -90,12 +90,10 @@ class Model {
             static const char* const whole[] = {"006222", "117333", "006222", "117333", "006222",
                                                 "117333", "006222", "117333", "006222", "000000"};
             PathState& own = nodes_[path];
+            const PathState row = own > 8 ? 9 : own;
+            const int column = (mixed ? 4 : marked ? 2 : 0) + plain;
             if (entries > 0)
-                own = static_cast<PathState>((children == entries ? whole : others)[std::min(own, 9u)][(mixed    ? 4
-                                                                                                        : marked ? 2
-                                                                                                                 : 0) +
-                                                                                                       plain] -
-                                             '0');
+                own = static_cast<PathState>((children == entries ? whole : others)[row][column] - '0');
         }
     }
 

@@ -1,0 +1,82 @@
+#include "ui/PropertyPage.h"
+
+#include <algorithm>
+#include <memory>
+
+#include <wx/intl.h>
+#include <wx/log.h>
+
+#include "core/Boundary.h"
+#include "core/Module.h"
+#include "core/Text.h"
+#include "ui/ActivationScope.h"
+#include "ui/VersionsDialog.h"
+#include "ui/resource.h"
+
+namespace tavi {
+namespace {
+
+// Lives from the page's making until the sheet releases the page, shown or not.
+struct Page {
+    Page(const Selection& selection, ManifestRef manifest)
+        : dialog(std::make_shared<VersionsDialog>(selection, std::move(manifest), false)), title(_("Tavi"))
+    {
+    }
+    ModuleLock lock;
+    std::shared_ptr<VersionsDialog> dialog;
+    const wxString title;
+};
+
+INT_PTR CALLBACK pageProcedure(HWND window, UINT message, WPARAM wParam, LPARAM lParam)
+{
+    return guarded("property page", INT_PTR{0}, [&]() -> INT_PTR {
+        if (message == WM_INITDIALOG)
+            SetWindowLongPtrW(window, GWLP_USERDATA, reinterpret_cast<const PROPSHEETPAGEW*>(lParam)->lParam);
+        const auto* const page = reinterpret_cast<const Page*>(GetWindowLongPtrW(window, GWLP_USERDATA));
+        return page ? page->dialog->handleMessage(window, message, wParam, lParam) : 0;
+    });
+}
+
+UINT CALLBACK pageCallback(HWND, UINT message, PROPSHEETPAGEW* description)
+{
+    return guarded("property page release", UINT{1}, [&] {
+        if (message == PSPCB_RELEASE)
+            delete reinterpret_cast<const Page*>(std::exchange(description->lParam, 0));
+        return UINT{1};
+    });
+}
+
+} // namespace
+
+void addPropertyPage(const Selection& selection, ManifestRef manifest, LPFNADDPROPSHEETPAGE addPage, LPARAM parameter)
+{
+    const bool isOffered = addPage && manifest &&
+                           std::any_of(selection.paths.begin(), selection.paths.end(),
+                                       [&](const wxString& path) { return manifest->IsBackedUp(view(path), 0); });
+    if (!isOffered)
+        return;
+    const ActivationScope activation;
+    auto page = std::make_unique<Page>(selection, std::move(manifest));
+    PROPSHEETPAGEW description{};
+    description.dwSize = sizeof(description);
+    description.dwFlags = PSP_USETITLE | PSP_USEREFPARENT | PSP_USECALLBACK;
+    description.hInstance = moduleInstance();
+    description.pszTemplate = MAKEINTRESOURCEW(TAVI_DIALOG_VERSIONS);
+    description.pszTitle = page->title.wc_str();
+    description.pfnDlgProc = pageProcedure;
+    description.lParam = reinterpret_cast<LPARAM>(page.get());
+    description.pfnCallback = pageCallback;
+    static_assert(sizeof(moduleRefCount()) == sizeof(UINT), "the system counts in the module's own count");
+    description.pcRefParent = reinterpret_cast<UINT*>(&moduleRefCount());
+    const HPROPSHEETPAGE handle = CreatePropertySheetPageW(&description);
+    if (!handle) {
+        wxLogError("Unable to create the property page (%lu)", GetLastError());
+        return;
+    }
+    // From here on the page's callback frees it, once.
+    static_cast<void>(page.release());
+    if (!addPage(handle, parameter))
+        DestroyPropertySheetPage(handle);
+}
+
+} // namespace tavi
