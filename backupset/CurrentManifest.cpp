@@ -12,6 +12,9 @@
 namespace tavi {
 namespace {
 
+// The mutex is only ever held for a start.
+constexpr DWORD kStartPatience = 1000;
+
 WatcherState watcher;
 // Made before the process entry runs; serialises only the start of the watcher.
 const KernelHandle manifestMutex(CreateMutexW(nullptr, FALSE, nullptr));
@@ -47,13 +50,23 @@ void closeWatcherHandle() noexcept
     KernelHandle(watcher.thread.exchange(nullptr));
 }
 
+void startIfNone() noexcept;
+
 void watcherThread(void*)
 {
-    guarded("manifest watcher", [] {
-        SystemServices services;
-        RunManifestWatcher(watcher, services);
-    });
+    bool stopped = false;
+    do {
+        stopped = false;
+        guarded("manifest watcher", [&] {
+            SystemServices services;
+            RunManifestWatcher(watcher, services);
+            stopped = true;
+        });
+    } while (stopped && watcher.stopFlag == 0);
     closeWatcherHandle();
+    // Whoever took the request back between the two lines above has seen a thread that was still there.
+    if (stopped && watcher.stopFlag == 0)
+        startIfNone();
 }
 
 void startWatcher() noexcept
@@ -64,6 +77,16 @@ void startWatcher() noexcept
         watcher.thread = thread;
         ResumeThread(thread);
     }
+}
+
+void startIfNone() noexcept
+{
+    const DWORD wait = WaitForSingleObject(manifestMutex.get(), kStartPatience);
+    if (wait != WAIT_OBJECT_0 && wait != WAIT_ABANDONED)
+        return;
+    if (!watcher.thread.load())
+        startWatcher();
+    ReleaseMutex(manifestMutex.get());
 }
 
 } // namespace
@@ -89,6 +112,12 @@ const Manifest* GetCurrentManifest() noexcept
 void requestWatcherStop() noexcept
 {
     watcher.stopFlag = 1;
+}
+
+void resumeWatcher() noexcept
+{
+    if (watcher.stopFlag.exchange(0) != 0)
+        startIfNone();
 }
 
 void StopManifestWatcher() noexcept

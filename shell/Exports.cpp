@@ -17,7 +17,10 @@ STDAPI DllGetClassObject(REFCLSID classId, REFIID interfaceId, void** object)
             return E_POINTER;
         *object = nullptr;
         const ComPtr<IClassFactory> factory(makeClassFactory(classId));
-        return factory ? factory->QueryInterface(interfaceId, object) : CLASS_E_CLASSNOTAVAILABLE;
+        if (!factory)
+            return CLASS_E_CLASSNOTAVAILABLE;
+        resumeThreads();
+        return factory->QueryInterface(interfaceId, object);
     });
 }
 

@@ -1,10 +1,16 @@
 #include "shell/Lifecycle.h"
 
+#include <atomic>
 #include <cwchar>
+#include <memory>
+#include <mutex>
+#include <utility>
 
 #include <wx/log.h>
 
 #include "backupset/CurrentManifest.h"
+#include "core/Boundary.h"
+#include "core/CriticalSection.h"
 #include "core/Log.h"
 #include "link/StatusListener.h"
 #include "statedb/Database.h"
@@ -25,12 +31,29 @@ const HostName kHosts[] = {{L"explorer.exe", HostKind::fileManager},
                            {L"verclsid.exe", HostKind::toolOnly},
                            {L"_RegDLL.tmp", HostKind::toolOnly}};
 
-std::atomic<bool> statusStopFlag{false};
+// Each listener has its own: one that was asked to stop stays so when another takes its place.
+using StopFlag = std::shared_ptr<std::atomic<bool>>;
+CriticalSection statusLock;
+StopFlag statusStopFlag;
 HANDLE statusThread = INVALID_HANDLE_VALUE;
 
-void runStatusListener(void*)
+void runStatusListener(void* argument)
 {
-    listenToStatus([] { return statusStopFlag.load(); });
+    const std::unique_ptr<StopFlag> stop(static_cast<StopFlag*>(argument));
+    listenToStatus([&] { return (*stop)->load(); });
+}
+
+bool stopWasRequested() noexcept
+{
+    const std::lock_guard guard(statusLock);
+    return statusStopFlag && *statusStopFlag;
+}
+
+void requestStatusStop() noexcept
+{
+    const std::lock_guard guard(statusLock);
+    if (statusStopFlag)
+        *statusStopFlag = true;
 }
 
 } // namespace
@@ -64,7 +87,7 @@ void detachFromFileManager(bool processEnds)
     releaseShellAllocator();
     freeMenuBitmaps();
     StopManifestWatcher();
-    statusStopFlag = true;
+    requestStatusStop();
     StopStatusThread();
     if (!processEnds)
         shutDownDatabaseLibrary();
@@ -73,8 +96,17 @@ void detachFromFileManager(bool processEnds)
 
 void StartStatusThread() noexcept
 {
-    if (HANDLE thread = startModuleThread(runStatusListener, nullptr))
-        statusThread = thread;
+    guarded("status thread start", [] {
+        auto stop = std::make_unique<StopFlag>(std::make_shared<std::atomic<bool>>(false));
+        const std::lock_guard guard(statusLock);
+        if (statusThread != INVALID_HANDLE_VALUE)
+            CloseHandle(std::exchange(statusThread, INVALID_HANDLE_VALUE));
+        statusStopFlag = *stop;
+        if (HANDLE thread = startModuleThread(runStatusListener, stop.get())) {
+            statusThread = thread;
+            static_cast<void>(stop.release());
+        }
+    });
 }
 
 void StopStatusThread() noexcept
@@ -93,7 +125,15 @@ void StopStatusThread() noexcept
 void requestThreadsStop() noexcept
 {
     requestWatcherStop();
-    statusStopFlag = true;
+    requestStatusStop();
+}
+
+void resumeThreads() noexcept
+{
+    if (!stopWasRequested())
+        return;
+    StartStatusThread();
+    resumeWatcher();
 }
 
 } // namespace tavi

@@ -24,5 +24,8 @@ void StopStatusThread() noexcept;
 
 // Asks both background threads to end, without waiting.
 void requestThreadsStop() noexcept;
+// Starts them again where they were asked to end and the module is used after all: the host may come back before it, or
+// the last of the threads, has let go of the mapping. Then nothing detaches and nothing attaches.
+void resumeThreads() noexcept;
 
 } // namespace tavi

@@ -20,6 +20,7 @@
 #include "shell/ClassIds.h"
 #include "statedb/Database.h"
 #include "tests/backupset/ManifestSupport.h"
+#include "tests/support/Pipes.h"
 #include "tests/support/Registry.h"
 
 namespace tavi {
@@ -179,6 +180,15 @@ TEST_F(ModuleHost, AnswersAsAComServer)
         EXPECT_EQ(module.canUnload(), S_FALSE);
     }
     EXPECT_EQ(module.canUnload(), S_OK);
+}
+
+TEST_F(ModuleHost, ComesBackToLifeWhenItIsUsedAfterAll)
+{
+    LoadedModule module;
+    EXPECT_EQ(module.canUnload(), S_OK);
+    const test::PipeServer service(L"\\\\.\\pipe\\tavistatus", PIPE_ACCESS_OUTBOUND);
+    const auto factory = module.factory(kShellExtClassId);
+    EXPECT_TRUE(service.waitClient()) << "the listener listens again";
 }
 
 TEST_F(ModuleHost, CarriesTheOverlayTableBehindTheOthers)
