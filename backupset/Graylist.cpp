@@ -134,8 +134,7 @@ class SystemSources final : public ExclusionSources {
     }
     std::optional<wxString> registryText(const wxString& key, const wxString& value) override
     {
-        wxString text;
-        return readRegistryText(wxRegKey::HKLM, key, value, text) ? std::optional(text) : std::nullopt;
+        return readRegistryText(HKEY_LOCAL_MACHINE, key, value);
     }
     std::vector<wxString> registryTexts(const wxString& key, const wxString& value) override
     {

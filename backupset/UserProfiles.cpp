@@ -96,10 +96,11 @@ bool readOwner(const wxString& profile, wxString& owner)
 
 void loadHive(const wxString& profile)
 {
-    wxString image, owner;
-    if (!readRegistryText(wxRegKey::HKLM, profile, L"ProfileImagePath", image) || !readOwner(profile, owner))
+    wxString owner;
+    const auto image = readRegistryText(HKEY_LOCAL_MACHINE, profile, L"ProfileImagePath");
+    if (!image || !readOwner(profile, owner))
         return;
-    const wxString file = image + L"\\ntuser.dat";
+    const wxString file = *image + L"\\ntuser.dat";
     if (GetFileAttributesW(file.wc_str()) == INVALID_FILE_ATTRIBUTES)
         return;
     const wxString name = wxString::Format("tavi%d", hiveCounter);
@@ -144,10 +145,8 @@ std::vector<wxString> ShellFolderPaths(const wxString& valueName)
 {
     std::vector<wxString> paths;
     for (const wxString& user : subKeys(HKEY_USERS, nullptr)) {
-        wxString value;
-        if (!readRegistryText(wxRegKey::HKUSR, user + kShellFolders, valueName, value))
-            continue;
-        const wxString path = LongPath(value);
+        const auto value = readRegistryText(HKEY_USERS, user + kShellFolders, valueName);
+        const wxString path = value ? LongPath(*value) : wxString();
         if (path.length() >= 3)
             paths.push_back(path);
     }

@@ -1,15 +1,24 @@
 #include "core/RegistryText.h"
 
+#include <cwchar>
+#include <vector>
+
 namespace tavi {
 
-bool readRegistryText(wxRegKey::StdKey root, const wxString& path, const wxString& name, wxString& text)
+std::optional<wxString> readRegistryText(HKEY root, const wxString& path, const wxString& name)
 {
-    // Asked before it is read: the library logs what it cannot read.
-    wxRegKey key(root, path);
-    if (!key.Exists() || !key.Open(wxRegKey::Read) || !key.HasValue(name))
-        return false;
-    const wxRegKey::ValueType type = key.GetValueType(name);
-    return (type == wxRegKey::Type_String || type == wxRegKey::Type_Expand_String) && key.QueryValue(name, text);
+    std::vector<wchar_t> buffer(MAX_PATH);
+    for (;;) {
+        auto bytes = static_cast<DWORD>(buffer.size() * sizeof(wchar_t));
+        const LONG result =
+            RegGetValueW(root, path.wc_str(), name.wc_str(), RRF_RT_REG_SZ, nullptr, buffer.data(), &bytes);
+        if (result == ERROR_SUCCESS)
+            return wxString(buffer.data(), wcsnlen(buffer.data(), bytes / sizeof(wchar_t)));
+        if (result != ERROR_MORE_DATA)
+            return std::nullopt;
+        // The size that is told may be that of the text before its references are expanded.
+        buffer.resize(buffer.size() * 2 + bytes / sizeof(wchar_t));
+    }
 }
 
 } // namespace tavi

@@ -1,13 +1,14 @@
 #pragma once
 
+#include <optional>
+
 #include <windows.h>
 #include <wx/string.h>
-#include <wx/msw/registry.h>
 
 namespace tavi {
 
-// A text value with environment references expanded. False, in silence, when key or value is missing or is no text. Any
-// thread.
-bool readRegistryText(wxRegKey::StdKey root, const wxString& path, const wxString& name, wxString& text);
+// A text value with environment references expanded; nothing, in silence, when key or value is missing or is no text.
+// Any thread.
+std::optional<wxString> readRegistryText(HKEY root, const wxString& path, const wxString& name);
 
 } // namespace tavi
