@@ -8,9 +8,12 @@
 
 #include <gtest/gtest.h>
 
+#include "backupset/ManifestWatcher.h"
 #include "backupset/UserProfiles.h"
 #include "backupset/Volumes.h"
 #include "core/Handles.h"
+#include "core/Options.h"
+#include "tests/support/Counts.h"
 #include "tests/support/LogCapture.h"
 #include "tests/support/Registry.h"
 
@@ -283,6 +286,61 @@ TEST(Graylist, IsBuiltPublishedAndReplaced)
     EXPECT_FALSE(IsUserData(GetDataFilePath(kDataDirectory)));
     DropGraylist();
     EXPECT_TRUE(IsGrayed(windows)) << "built again when there is none";
+    DropGraylist();
+}
+
+// The watcher's own work on the real system; only the waiting is left out.
+class AnHour : public WatcherServices {
+  public:
+    const Manifest* loadManifest() override
+    {
+        ++loads;
+        return ReadStoredManifest();
+    }
+    bool manifestTime(std::int64_t& milliseconds) override
+    {
+        // The service writes a new list every ten minutes.
+        milliseconds = readManifestTime().value_or(0) + ++rounds / 120 * 600000;
+        return true;
+    }
+    std::int64_t now() override
+    {
+        return rounds / 120 * 600000;
+    }
+    void sleep(std::uint32_t milliseconds) override
+    {
+        slept += milliseconds;
+        if (slept == 600000)
+            early = countNow();
+        state.stopFlag = slept >= 3600000;
+    }
+    void buildExclusions(bool firstLoad) override
+    {
+        ++builds;
+        BuildGraylist(!firstLoad);
+    }
+
+    WatcherState state;
+    std::uint32_t slept = 0, rounds = 0, loads = 0, builds = 0;
+    std::array<std::size_t, 3> early{};
+};
+
+TEST(ManifestWatcher, KeepsItsCountsThroughAnHourOfRounds)
+{
+    const InstalledService service;
+    const TemporaryFolder history;
+    const AbsentUser user(L"S-1-5-21-1-2-3-4005", L"History", history.path());
+    LogCapture log;
+    AnHour hour;
+    RunManifestWatcher(hour.state, hour);
+    EXPECT_EQ(hour.rounds, 719u);
+    EXPECT_EQ(hour.loads, 6u);
+    EXPECT_EQ(hour.builds, 40u);
+    EXPECT_EQ(countNow(), hour.early);
+    EXPECT_TRUE(temporaryHives().empty());
+    for (const std::string& line : log.take())
+        EXPECT_NE(line.find("stored manifest"), std::string::npos) << line; // there is none in this test
+    hour.state.manifest.replace(nullptr);
     DropGraylist();
 }
 

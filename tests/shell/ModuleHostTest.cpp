@@ -20,6 +20,7 @@
 #include "shell/ClassIds.h"
 #include "statedb/Database.h"
 #include "tests/backupset/ManifestSupport.h"
+#include "tests/support/Counts.h"
 #include "tests/support/Pipes.h"
 #include "tests/support/Registry.h"
 
@@ -86,35 +87,6 @@ bool moduleGoesWithin(DWORD milliseconds)
     while (GetModuleHandleW(L"tavishell.dll") && GetTickCount() - start < milliseconds)
         Sleep(10);
     return !GetModuleHandleW(L"tavishell.dll");
-}
-
-// Handles, GDI objects and threads of this process. The system's own counters answer 0 under Wine 8: each handle that
-// can be is tried, and the table of GDI objects is read where the process has it.
-std::array<std::size_t, 3> countNow()
-{
-    struct GdiEntry {
-        std::uint64_t object;
-        DWORD owner;
-        WORD unique;
-        BYTE type, flags;
-        std::uint64_t user;
-    };
-    std::array<std::size_t, 3> counts{};
-    DWORD flags = 0;
-    for (ULONG_PTR value = 4; value < 0x10000; value += 4)
-        counts[0] += GetHandleInformation(reinterpret_cast<HANDLE>(value), &flags) ? 1u : 0u;
-    PROCESS_BASIC_INFORMATION process{};
-    NtQueryInformationProcess(GetCurrentProcess(), ProcessBasicInformation, &process, sizeof(process), nullptr);
-    const auto* const peb = reinterpret_cast<const BYTE*>(process.PebBaseAddress);
-    const auto* const table = *reinterpret_cast<const GdiEntry* const*>(peb + (sizeof(void*) == 4 ? 0x94 : 0xF8));
-    counts[1] = static_cast<std::size_t>(
-        std::count_if(table, table + 4096, [](const GdiEntry& entry) { return entry.type != 0; }));
-    const KernelHandle snapshot(CreateToolhelp32Snapshot(TH32CS_SNAPTHREAD, 0));
-    THREADENTRY32 entry{};
-    entry.dwSize = sizeof(entry);
-    for (BOOL more = Thread32First(snapshot.get(), &entry); more; more = Thread32Next(snapshot.get(), &entry))
-        counts[2] += entry.th32OwnerProcessID == GetCurrentProcessId() ? 1u : 0u;
-    return counts;
 }
 
 class ModuleHost : public testing::Test {
@@ -236,7 +208,7 @@ TEST_F(ModuleHost, TwentyRoundsOfLoadAndUnloadLeaveNothingBehind)
     constexpr int kRounds = 23, kWarmUp = 3;
     for (int round = 0; round < kRounds; ++round) {
         if (round == kWarmUp)
-            before = countNow();
+            before = test::countNow();
         {
             LoadedModule module;
             const auto init = module.object<IShellExtInit>(kShellExtClassId, IID_IShellExtInit);
@@ -257,7 +229,7 @@ TEST_F(ModuleHost, TwentyRoundsOfLoadAndUnloadLeaveNothingBehind)
         ASSERT_TRUE(moduleGoesWithin(5000)) << "round " << round;
     }
     ILFree(root);
-    const auto after = countNow();
+    const auto after = test::countNow();
     FreeLibrary(dialogs);
     // The compiler's static thread runtime leaves the two semaphores of its key lock behind at each unload; nobody else
     // may leave anything.
