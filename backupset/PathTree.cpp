@@ -90,6 +90,12 @@ PathTree::PathTree(bool foldersOnly, EntryCounter counter) : counter_(std::move(
     root_.foldersOnly = foldersOnly;
 }
 
+void PathTree::Release() const noexcept
+{
+    if (--refs_ < 1)
+        delete this;
+}
+
 PathTree::~PathTree()
 {
     removeChildren(root_);

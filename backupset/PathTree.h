@@ -50,11 +50,7 @@ class PathTree {
     {
         refs_ += count;
     }
-    void Release() const noexcept
-    {
-        if (--refs_ < 1)
-            delete this;
-    }
+    void Release() const noexcept;
 
     // Every node but the root, parents first, names in order.
     void forEach(const std::function<void(const wxString& path, PathState state)>& visit) const;

@@ -98,7 +98,7 @@ wxString VolumeTable::resolveLink(const wxString& device) const
     return target;
 }
 
-void VolumeTable::addVolume(wxString name)
+void VolumeTable::addVolume(const wxString& name)
 {
     const wxString bare = name.EndsWith(L"\\") ? name.Left(name.length() - 1) : name;
     wchar_t target[kDeviceCharacters] = L"";

@@ -45,7 +45,7 @@ class VolumeTable {
 
   private:
     wxString resolveLink(const wxString& device) const;
-    void addVolume(wxString name);
+    void addVolume(const wxString& name);
 
     const VolumeFunctions functions_;
     mutable CriticalSection lock_;

@@ -9,7 +9,7 @@ std::optional<wxString> readRegistryText(HKEY root, const wxString& path, const 
 {
     std::vector<wchar_t> buffer(MAX_PATH);
     for (;;) {
-        auto bytes = static_cast<DWORD>(buffer.size() * sizeof(wchar_t));
+        DWORD bytes = static_cast<DWORD>(buffer.size()) * DWORD{sizeof(wchar_t)};
         const LONG result =
             RegGetValueW(root, path.wc_str(), name.wc_str(), RRF_RT_REG_SZ, nullptr, buffer.data(), &bytes);
         if (result == ERROR_SUCCESS)

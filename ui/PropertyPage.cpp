@@ -46,6 +46,37 @@ UINT CALLBACK pageCallback(HWND, UINT message, PROPSHEETPAGEW* description)
     });
 }
 
+// The page functions of the controls that the module's own manifest names. Resolved on first use, inside an activation
+// scope, and kept: the library stays, since a page may outlive whoever made it.
+struct SheetFunctions {
+    SheetFunctions() noexcept
+    {
+        if (const HMODULE controls = LoadLibraryW(L"comctl32.dll")) {
+            find(controls, "CreatePropertySheetPageW", create);
+            find(controls, "DestroyPropertySheetPage", destroy);
+        }
+    }
+    template <class Function>
+    static void find(HMODULE module, const char* name, Function& function) noexcept
+    {
+        function = reinterpret_cast<Function>(reinterpret_cast<void*>(GetProcAddress(module, name)));
+    }
+    decltype(&CreatePropertySheetPageW) create = nullptr;
+    decltype(&DestroyPropertySheetPage) destroy = nullptr;
+};
+
+const SheetFunctions& sheetFunctions() noexcept
+{
+    static const SheetFunctions functions;
+    return functions;
+}
+
+BOOL destroyPage(HPROPSHEETPAGE page) noexcept
+{
+    const auto destroy = sheetFunctions().destroy;
+    return destroy ? destroy(page) : FALSE;
+}
+
 } // namespace
 
 void addPropertyPage(const Selection& selection, ManifestRef manifest, LPFNADDPROPSHEETPAGE addPage, LPARAM parameter)
@@ -68,7 +99,8 @@ void addPropertyPage(const Selection& selection, ManifestRef manifest, LPFNADDPR
     description.pfnCallback = pageCallback;
     static_assert(sizeof(moduleRefCount()) == sizeof(UINT), "the system counts in the module's own count");
     description.pcRefParent = reinterpret_cast<UINT*>(&moduleRefCount());
-    const HPROPSHEETPAGE handle = CreatePropertySheetPageW(&description);
+    const auto create = sheetFunctions().create;
+    const HPROPSHEETPAGE handle = create ? create(&description) : nullptr;
     if (!handle) {
         wxLogError("Unable to create the property page (%lu)", GetLastError());
         return;
@@ -76,7 +108,7 @@ void addPropertyPage(const Selection& selection, ManifestRef manifest, LPFNADDPR
     // From here on the page's callback frees it, once.
     static_cast<void>(page.release());
     if (!addPage(handle, parameter))
-        DestroyPropertySheetPage(handle);
+        destroyPage(handle);
 }
 
 } // namespace tavi
