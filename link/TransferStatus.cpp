@@ -115,46 +115,58 @@ void TransferStatus::zeroRates() noexcept
         *rate = 0;
 }
 
+std::atomic<bool>* TransferStatus::outcomeOf(std::uint32_t code) noexcept
+{
+    switch (code) {
+    case 3:
+        return &ended3;
+    case 4:
+        return &ended4;
+    case 5:
+        return &ended5;
+    case 6:
+        return &ended6;
+    case 8:
+        return &ended8;
+    case 9:
+        return &ended9;
+    case 10:
+        return &ended10;
+    default:
+        return nullptr;
+    }
+}
+
+void TransferStatus::endWith(std::atomic<bool>* outcome) noexcept
+{
+    ended = true;
+    if (outcome)
+        *outcome = true;
+}
+
 void TransferStatus::applyEvent(const EventMessage& event)
 {
-    const auto endWith = [this](std::atomic<bool>* outcome) {
-        resetBackup();
-        ended = true;
-        if (outcome)
-            *outcome = true;
-    };
     switch (event.type()) {
-    case 0:
-    // No outcome for 2, although a snapshot's state 2 has one.
-    case 2:
-        endWith(nullptr);
-        break;
     case 1:
         resetBackup();
         break;
+    case 0:
+    case 2:
     case 3:
-        endWith(&ended3);
-        break;
     case 4:
-        endWith(&ended4);
-        break;
     case 5:
-        endWith(&ended5);
-        break;
     case 6:
-        endWith(&ended6);
-        break;
     case 8:
-        endWith(&ended8);
-        break;
     case 9:
-        endWith(&ended9);
-        break;
     case 10:
-        endWith(&ended10);
-        mark10 = true;
-        totalB = static_cast<std::int64_t>(event.value);
-        totalA = static_cast<std::int64_t>(event.value);
+        resetBackup();
+        // No outcome for 2, although a snapshot's state 2 has one.
+        endWith(outcomeOf(event.type()));
+        if (event.type() == 10) {
+            mark10 = true;
+            totalB = static_cast<std::int64_t>(event.value);
+            totalA = static_cast<std::int64_t>(event.value);
+        }
         break;
     case 11:
         statusTextA.set(*event.text);
@@ -244,41 +256,23 @@ void TransferStatus::applySnapshot(const SnapshotMessage& snapshot)
     totalA = static_cast<std::int64_t>(snapshot.counter0);
     doneB = static_cast<std::int64_t>(snapshot.counter3);
 
-    const auto endWith = [this](std::atomic<bool>* outcome) {
-        if (outcome)
-            *outcome = true;
-        ended = true;
-    };
     switch (snapshot.state) {
-    case 0:
-        endWith(nullptr);
-        break;
     case 1:
         // Also zeroes the amounts that were just set.
         resetBackup();
         break;
+    case 0:
     case 2:
     case 3:
-        endWith(&ended3);
-        break;
     case 4:
-        endWith(&ended4);
-        break;
     case 5:
-        endWith(&ended5);
-        break;
     case 6:
-        endWith(&ended6);
-        break;
     case 8:
-        endWith(&ended8);
-        break;
     case 9:
-        endWith(&ended9);
-        break;
     case 10:
-        mark10 = true;
-        endWith(&ended10);
+        endWith(snapshot.state == 2 ? &ended3 : outcomeOf(snapshot.state));
+        if (snapshot.state == 10)
+            mark10 = true;
         break;
     case 51:
         restoreStarted = true;

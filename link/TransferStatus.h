@@ -109,6 +109,9 @@ struct TransferStatus {
   private:
     void applyEvent(const EventMessage& event);
     void applySnapshot(const SnapshotMessage& snapshot);
+    // The flag that tells how a backup has ended; null for codes that have none.
+    std::atomic<bool>* outcomeOf(std::uint32_t code) noexcept;
+    void endWith(std::atomic<bool>* outcome) noexcept;
     void zeroRates() noexcept;
     void renewRate(std::atomic<float>& rate, std::int32_t span) noexcept;
 
