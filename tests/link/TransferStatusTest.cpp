@@ -253,23 +253,30 @@ TEST(RateRing, CountsItsNewestSamples)
     }
 }
 
-// The listener, a window's thread and a reader at once: the thread sanitizer sees any touch without order, the address
+// The listener, a window's thread and readers at once: the thread sanitizer sees any touch without order, the address
 // sanitizer any of a freed text.
 TEST(TransferStatus, IsReadWhileItChanges)
 {
     TransferStatus status(true, tick);
+    PublishedText swapped;
     std::atomic<bool> done{false};
     std::atomic<int> torn{0};
-    std::thread listener([&] {
-        for (std::uint32_t round = 0; round < 2000; ++round) {
-            event(status, 51 + round % 7, 1000 + round % 50, 1,
-                  wxString(static_cast<wchar_t>(L'a' + round % 26), round % 40));
-            if (round % 500 == 0)
+    const auto check = [&](const wxString& text) {
+        torn += text.empty() || text == wxString(text[0], text.length()) ? 0 : 1;
+    };
+    std::vector<std::thread> threads;
+    threads.emplace_back([&] {
+        for (std::uint32_t round = 0; round < 200000; ++round) {
+            const wxString text(static_cast<wchar_t>(L'a' + round % 26), round % 40);
+            round % 64 == 63 ? swapped.clear() : swapped.set(text);
+            if (round % 100 == 0)
+                event(status, 51 + round / 100 % 7, 1000 + round % 50, 1, text);
+            if (round % 50000 == 0)
                 status.apply(SnapshotMessage(51, 1, 2, 3, 4));
         }
         done = true;
     });
-    std::thread window([&] {
+    threads.emplace_back([&] {
         while (!done) {
             ++now;
             status.timerTick();
@@ -279,12 +286,16 @@ TEST(TransferStatus, IsReadWhileItChanges)
             status.restoreRing.clearRing();
         }
     });
-    while (!done) {
-        const wxString whole = status.restoreText.get();
-        torn += whole.empty() || whole == wxString(whole[0], whole.length()) ? 0 : 1;
+    for (int reader = 0; reader < 3; ++reader) {
+        threads.emplace_back([&] {
+            while (!done) {
+                check(swapped.get());
+                check(status.restoreText.get());
+            }
+        });
     }
-    listener.join();
-    window.join();
+    for (std::thread& thread : threads)
+        thread.join();
     EXPECT_EQ(torn, 0);
 }
 

@@ -111,18 +111,6 @@ TEST_F(ContextMenuTest, AnswersVerbsAndHelp)
     }
 }
 
-TEST_F(ContextMenuTest, InvokesByOffsetOnly)
-{
-    CMINVOKECOMMANDINFO info{};
-    for (const LPCSTR verb : {LPCSTR{"TaviRestore"}, LPCSTR{MAKEINTRESOURCEA(3)}, LPCSTR{MAKEINTRESOURCEA(2)},
-                              LPCSTR{MAKEINTRESOURCEA(1)}, LPCSTR{nullptr}}) {
-        EXPECT_EQ(moduleRefCount(), 0);
-        info.lpVerb = verb;
-        EXPECT_EQ(invokeCommand(info, one), verb <= MAKEINTRESOURCEA(2) ? S_OK : E_INVALIDARG);
-    }
-    PostMessageW(test::waitDialog(L"Restore Files"), WM_CLOSE, 0, 0);
-}
-
 using MenuBitmapTest = test::UiTest;
 
 TEST_F(MenuBitmapTest, IsTheIconOnTheFirstBackgroundUntilFreed)

@@ -10,7 +10,6 @@
 
 #include "statedb/Database.h"
 #include "tests/support/Dialogs.h"
-#include "ui/CopyTarget.h"
 #include "ui/resource.h"
 
 namespace tavi {
@@ -35,12 +34,12 @@ int enabledActions(HWND dialog)
            IsWindowEnabled(GetDlgItem(dialog, TAVI_VERSIONS_COPY_TO));
 }
 
-HWND open(const Selection& selection, const wxString& files, HWND other = nullptr)
+HWND open(const Selection& selection, const wxString& files)
 {
     Manifest* const manifest = Manifest::Parse(L"FILES\n" + files);
     manifest->AddRef();
     EXPECT_TRUE(startVersionsDialog(selection, ManifestRef(manifest), nullptr));
-    return waitDialog(L"Restore Files", {other});
+    return waitDialog(L"Restore Files");
 }
 
 const wchar_t* const kVersions =
@@ -215,24 +214,6 @@ TEST_F(VersionsDialogTest, RequestsWhatWasAnswered)
     setProgressWindowOpener(nullptr);
 }
 
-TEST_F(VersionsDialogTest, ManyVersionsAndSeveralWindows)
-{
-    std::wstring files = L"C:\\f\n";
-    for (int i = 0; i < 5000; ++i)
-        files += std::to_wstring(1700000000 + i * 1000) + L":1:1:1:0::0:0\n";
-    const DWORD start = GetTickCount();
-    const HWND first = open(selectionOf({L"C:\\f"}), files + L"\n" + kVersions);
-    EXPECT_LT(GetTickCount() - start, 3000u);
-    EXPECT_EQ(ListView_GetItemCount(listOf(first)), 5000);
-    EXPECT_EQ(ListView_GetNextItem(listOf(first), -1, LVNI_SELECTED), 4999);
-    EXPECT_TRUE(ListView_IsItemVisible(listOf(first), 4999));
-    const HWND second = open(selectionOf({L"C:\\d"}, true), kVersions, first);
-    EXPECT_EQ(ListView_GetItemCount(listOf(second)), 2);
-    click(first, IDCANCEL);
-    waitForThreads(1);
-    click(second, IDCANCEL);
-}
-
 TEST_F(VersionsDialogTest, ShortensALongNameAndTranslates)
 {
     translate("&Restore", "&Zurueck");
@@ -244,19 +225,6 @@ TEST_F(VersionsDialogTest, ShortensALongNameAndTranslates)
     EXPECT_NE(message.find(L"xend.txt are backed up"), std::wstring::npos);
     EXPECT_LT(message.length(), 250u);
     click(dialog, IDCANCEL);
-}
-
-TEST(CopyTarget, FindsTheCommonPrefix)
-{
-    const wxString deep = L"C:\\" + wxString(L'x', 400);
-    const std::pair<PathSet, wxString> cases[] = {
-        {{}, L""},
-        {{L"C:\\w\\bc", L"C:\\w\\bd", L"C:\\w\\sub\\c"}, L"C:\\w"},
-        {{L"C:\\", L"C:\\b", L"C:\\c\\d"}, L"C:\\"},
-        {{deep + L"\\a", deep + L"\\b"}, deep},
-    };
-    for (const auto& [paths, prefix] : cases)
-        EXPECT_EQ(commonPrefix(paths), prefix);
 }
 
 } // namespace
