@@ -57,13 +57,9 @@ void waitForRetry(const StopCheck& stopCheck)
 // Until the connection fails, brings something that is no message, or is no longer wanted.
 void followConnection(HANDLE pipe, const StopCheck& stopCheck)
 {
-    const DWORD start = GetTickCount();
     std::unique_ptr<PipeMessage> message;
     while (!stopCheck() && readMessage(pipe, &message, stopCheck))
         dispatch(std::move(message));
-    // The next attempt follows at once; a peer that hangs up at once must not make that a busy loop.
-    if (GetTickCount() == start)
-        Sleep(kHangUpMilliseconds);
 }
 
 } // namespace
@@ -96,10 +92,15 @@ void listenToStatus(const StopCheck& stopCheck)
             pipe = openStatusPipe();
         }
         // One message too many for the memory there is must not silence the rest.
+        const DWORD start = GetTickCount();
         guarded("status connection", [&] { followConnection(pipe.get(), stopCheck); });
         pipe = FileHandle();
         if (stopCheck())
             return;
+        // The next attempt follows at once; but a peer that hangs up before the first pause of the reader must not make
+        // that a busy loop.
+        if (GetTickCount() == start)
+            Sleep(kHangUpMilliseconds);
     }
 }
 

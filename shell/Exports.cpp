@@ -30,6 +30,11 @@ STDAPI DllCanUnloadNow()
         if (moduleRefCount() != 0)
             return S_FALSE;
         requestThreadsStop();
+        // An object that was made meanwhile found the threads still running.
+        if (moduleRefCount() != 0) {
+            resumeThreads();
+            return S_FALSE;
+        }
         // The host may free the module next, on this thread, while the last reference is one of ours.
         releaseThreadRuntime();
         return S_OK;

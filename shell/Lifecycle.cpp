@@ -34,6 +34,7 @@ const HostName kHosts[] = {{L"explorer.exe", HostKind::fileManager},
 // Each listener has its own: one that was asked to stop stays so when another takes its place.
 using StopFlag = std::shared_ptr<std::atomic<bool>>;
 CriticalSection statusLock;
+std::atomic<bool> isAttached{false};
 StopFlag statusStopFlag;
 HANDLE statusThread = INVALID_HANDLE_VALUE;
 
@@ -41,12 +42,6 @@ void runStatusListener(void* argument)
 {
     const std::unique_ptr<StopFlag> stop(static_cast<StopFlag*>(argument));
     listenToStatus([&] { return (*stop)->load(); });
-}
-
-bool stopWasRequested() noexcept
-{
-    const std::lock_guard guard(statusLock);
-    return statusStopFlag && *statusStopFlag;
 }
 
 void requestStatusStop() noexcept
@@ -80,6 +75,7 @@ void attachToFileManager(HINSTANCE instance, const wchar_t* hostPath)
     if (const Manifest* manifest = GetCurrentManifest())
         manifest->Release();
     StartStatusThread();
+    isAttached = true;
 }
 
 void detachFromFileManager(bool processEnds)
@@ -98,13 +94,19 @@ void StartStatusThread() noexcept
 {
     guarded("status thread start", [] {
         auto stop = std::make_unique<StopFlag>(std::make_shared<std::atomic<bool>>(false));
+        // Looked at and replaced in one step: two threads that come back at once must not start two.
         const std::lock_guard guard(statusLock);
+        if (statusStopFlag && !*statusStopFlag)
+            return;
         if (statusThread != INVALID_HANDLE_VALUE)
             CloseHandle(std::exchange(statusThread, INVALID_HANDLE_VALUE));
         statusStopFlag = *stop;
         if (HANDLE thread = startModuleThread(runStatusListener, stop.get())) {
             statusThread = thread;
             static_cast<void>(stop.release());
+        } else {
+            // To be tried again when the module is used next.
+            *statusStopFlag = true;
         }
     });
 }
@@ -130,7 +132,7 @@ void requestThreadsStop() noexcept
 
 void resumeThreads() noexcept
 {
-    if (!stopWasRequested())
+    if (!isAttached)
         return;
     StartStatusThread();
     resumeWatcher();

@@ -25,7 +25,7 @@ namespace {
 
 constexpr UINT kPipeMessage = WM_USER + 1;
 // From a thread that dropped the last reference: only the window's own thread can destroy the window.
-constexpr UINT kEndWindow = WM_USER + 2;
+constexpr UINT kEndWindow = WM_APP;
 constexpr UINT_PTR kTimer = 1;
 constexpr UINT kTimerMilliseconds = 250;
 constexpr DWORD kHiddenMilliseconds = 500;
@@ -92,8 +92,12 @@ INT_PTR handleWithoutObject(HWND window, UINT message, LPARAM lParam)
         PostQuitMessage(0);
         return TRUE;
     case kPipeMessage:
-        messageTray.take(reinterpret_cast<const PipeMessage*>(lParam));
-        return TRUE;
+        return messageTray.take(reinterpret_cast<const PipeMessage*>(lParam)) ? TRUE : FALSE;
+    case kEndWindow:
+    // Should the request not have come through.
+    case WM_TIMER:
+        DestroyWindow(window);
+        return FALSE;
     default:
         return FALSE;
     }
@@ -102,10 +106,6 @@ INT_PTR handleWithoutObject(HWND window, UINT message, LPARAM lParam)
 INT_PTR CALLBACK progressProcedure(HWND window, UINT message, WPARAM wParam, LPARAM lParam)
 {
     return guarded("progress window", INT_PTR{FALSE}, [&]() -> INT_PTR {
-        if (message == kEndWindow) {
-            DestroyWindow(window);
-            return TRUE;
-        }
         const auto object = RestoreProgressWindow::current();
         // By the time this window goes there may be a new one: its object is none of ours.
         const bool isOurs =
@@ -162,8 +162,11 @@ void RestoreProgressWindow::getOrCreate()
         transferStatus();
         setMessageSink(deliver);
         theWindow.window = std::make_shared<RestoreProgressWindow>();
-        if (!KernelHandle(startModuleThread(runProgressWindow, nullptr)))
+        if (!KernelHandle(startModuleThread(runProgressWindow, nullptr))) {
             wxLogError("Unable to start the progress window (%lu)", GetLastError());
+            theWindow.window.reset();
+            return;
+        }
     }
     ++theWindow.window->refs_;
 }
@@ -232,9 +235,12 @@ INT_PTR RestoreProgressWindow::handleMessage(HWND window, UINT message, WPARAM w
         refresh();
         return TRUE;
     case kPipeMessage:
-        if (const auto received = messageTray.take(reinterpret_cast<const PipeMessage*>(lParam)))
+        // The dialog manager has the same number for another message of its own, which carries none of ours.
+        if (const auto received = messageTray.take(reinterpret_cast<const PipeMessage*>(lParam))) {
             handlePipeMessage(*received);
-        return TRUE;
+            return TRUE;
+        }
+        return FALSE;
     case WM_COMMAND:
         if (LOWORD(wParam) == TAVI_PROGRESS_CANCEL) {
             auto command = CommandPipe::CancelRestore();

@@ -21,7 +21,7 @@ class PipeMessage;
 // Counted: each queued restore holds one reference, which the service's report of its end drops, and whoever is at work
 // with the window holds one meanwhile. With the last one the window goes. When the user closes it, it goes at once
 // whatever references remain; dropping those later does nothing. The memory lives as long as any of them.
-class RestoreProgressWindow : public std::enable_shared_from_this<RestoreProgressWindow> {
+class RestoreProgressWindow {
   public:
     // Makes the window if there is none, and adds the reference that stands for the restore. Any thread.
     static void getOrCreate();
@@ -70,7 +70,6 @@ class RestoreProgressWindow : public std::enable_shared_from_this<RestoreProgres
     void release();
     void destroy(HWND window);
     bool isRegistered() const;
-    void startThread();
     void initialize(HWND window);
     void handlePipeMessage(const PipeMessage& message);
     void handleEvent(const EventMessage& event);

@@ -88,6 +88,9 @@ TEST_F(RestoreProgressWindowTest, FollowsARestoreToItsEnd)
     EXPECT_TRUE(IsWindow(dialog));
     // Others know the message number too.
     SendMessageW(dialog, WM_USER + 1, 0, 0x1234);
+    SendMessageW(dialog, WM_APP, 0, 0);
+    SendMessageW(dialog, DM_SETDEFID, TAVI_PROGRESS_CANCEL, 0);
+    EXPECT_EQ(LOWORD(SendMessageW(dialog, DM_GETDEFID, 0, 0)), TAVI_PROGRESS_CANCEL);
     tell(52);
     EXPECT_TRUE(gone(dialog));
 }
