@@ -19,7 +19,11 @@ class PipeServer {
     }
     bool waitClient() const
     {
-        return waitState(ERROR_PIPE_CONNECTED);
+        return waitUntil([&] {
+            if (ConnectNamedPipe(pipe_.get(), nullptr), GetLastError() == ERROR_NO_DATA)
+                hangUp(); // one that came and went
+            return GetLastError() == ERROR_PIPE_CONNECTED;
+        });
     }
     // Until the client has closed its end.
     bool waitHangUp() const
