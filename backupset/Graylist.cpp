@@ -16,6 +16,7 @@
 #include "core/InstallPaths.h"
 #include "core/Options.h"
 #include "core/PublishedPointer.h"
+#include "core/Reference.h"
 #include "core/RegistryText.h"
 
 namespace tavi {
@@ -29,45 +30,14 @@ PublishedTree graylist;
 PublishedTree userData;
 std::atomic<std::uint32_t> lastListings{0};
 
-class TreeReference {
-  public:
-    // Adopts the caller's reference.
-    explicit TreeReference(const PathTree* tree) noexcept : tree_(tree) {}
-    TreeReference(TreeReference&& other) noexcept : tree_(std::exchange(other.tree_, nullptr)) {}
-    TreeReference& operator=(TreeReference&&) = delete;
-    ~TreeReference()
-    {
-        if (tree_)
-            tree_->Release();
-    }
-    const PathTree* operator->() const noexcept
-    {
-        return tree_;
-    }
-    explicit operator bool() const noexcept
-    {
-        return tree_ != nullptr;
-    }
-    const PathTree* release() noexcept
-    {
-        return std::exchange(tree_, nullptr);
-    }
-
-  private:
-    const PathTree* tree_;
-};
+using TreeReference = Reference<const PathTree>;
 
 bool isOn(PathState state) noexcept
 {
     return state == 1 || state == 3 || state == 5 || state == 7;
 }
 
-struct SearchTraits {
-    using Handle = HANDLE;
-    static Handle none() noexcept
-    {
-        return INVALID_HANDLE_VALUE;
-    }
+struct SearchTraits : InvalidIsNone {
     static void free(Handle search) noexcept
     {
         FindClose(search);
@@ -252,7 +222,7 @@ TreeReference obtain(PublishedTree& published, AddRules addRules, bool refresh, 
     }
     TreeReference built = build(addRules);
     built->AddRef();
-    published.current.replace(built.operator->());
+    published.current.replace(built.get());
     return built;
 }
 
@@ -269,7 +239,7 @@ const PathTree* GetGraylist(bool refresh)
     bool waited = false;
     TreeReference tree = obtain(graylist, addMachineRules, refresh, waited);
     // Who has waited for another builder gets no reference; the published one keeps the tree until the next refresh.
-    return waited ? tree.operator->() : tree.release();
+    return waited ? tree.get() : tree.release();
 }
 
 void BuildGraylist(bool refresh)
@@ -281,7 +251,7 @@ void BuildGraylist(bool refresh)
 const PathTree* GetUserDataTree(bool refresh)
 {
     bool waited = false;
-    return obtain(userData, addUserRules, refresh, waited).operator->();
+    return obtain(userData, addUserRules, refresh, waited).get();
 }
 
 bool IsGrayed(const wxString& path)

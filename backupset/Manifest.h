@@ -11,6 +11,7 @@
 #include <wx/string.h>
 
 #include "backupset/ManifestStorage.h"
+#include "core/Reference.h"
 
 // The parsed backup set. A manifest never changes once parsed: any thread that holds a reference reads it without a
 // lock.
@@ -205,48 +206,7 @@ class Manifest {
 };
 
 // Holds one reference.
-class ManifestRef {
-  public:
-    ManifestRef() noexcept = default;
-    // Takes over a reference that the caller has.
-    explicit ManifestRef(const Manifest* adopted) noexcept : manifest_(adopted) {}
-    ManifestRef(const ManifestRef& other) noexcept : manifest_(other.manifest_)
-    {
-        if (manifest_)
-            manifest_->AddRef();
-    }
-    ManifestRef(ManifestRef&& other) noexcept : manifest_(std::exchange(other.manifest_, nullptr)) {}
-    ManifestRef& operator=(ManifestRef other) noexcept
-    {
-        std::swap(manifest_, other.manifest_);
-        return *this;
-    }
-    ~ManifestRef()
-    {
-        if (manifest_)
-            manifest_->Release();
-    }
-
-    const Manifest* get() const noexcept
-    {
-        return manifest_;
-    }
-    const Manifest* operator->() const noexcept
-    {
-        return manifest_;
-    }
-    const Manifest& operator*() const noexcept
-    {
-        return *manifest_;
-    }
-    explicit operator bool() const noexcept
-    {
-        return manifest_ != nullptr;
-    }
-
-  private:
-    const Manifest* manifest_ = nullptr;
-};
+using ManifestRef = Reference<const Manifest>;
 
 inline ManifestPatch ManifestPatchList::operator[](std::size_t i) const noexcept
 {

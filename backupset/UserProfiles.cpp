@@ -86,11 +86,10 @@ bool readOwner(const wxString& profile, wxString& owner)
     if (RegOpenKeyExW(HKEY_LOCAL_MACHINE, profile.wc_str(), 0, KEY_READ, key.out()) != ERROR_SUCCESS ||
         RegQueryValueExW(key.get(), L"Sid", nullptr, nullptr, sid, &size) != ERROR_SUCCESS || !IsValidSid(sid))
         return false;
-    LPWSTR text = nullptr;
-    if (!ConvertSidToStringSidW(sid, &text))
+    LocalText text;
+    if (!ConvertSidToStringSidW(sid, text.out()))
         return false;
-    owner = text;
-    LocalFree(text);
+    owner = text.get();
     return true;
 }
 

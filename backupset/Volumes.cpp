@@ -7,7 +7,7 @@
 
 #include <wx/log.h>
 
-#include "core/Handles.h"
+#include "core/ModuleFunction.h"
 
 namespace tavi {
 namespace {
@@ -18,11 +18,22 @@ constexpr std::size_t kVolumePrefix = 4;
 constexpr NTSTATUS kBufferTooSmall = static_cast<NTSTATUS>(0xC0000023);
 constexpr ULONG kCaseInsensitive = 0x40;
 
+// Ends what was begun with one of the functions that a table is given.
 template <class Function>
-void find(HMODULE module, const char* name, Function& function) noexcept
-{
-    function = reinterpret_cast<Function>(reinterpret_cast<void*>(GetProcAddress(module, name)));
-}
+class Ending {
+  public:
+    Ending(Function function, HANDLE handle) noexcept : function_(function), handle_(handle) {}
+    Ending(const Ending&) = delete;
+    Ending& operator=(const Ending&) = delete;
+    ~Ending()
+    {
+        function_(handle_);
+    }
+
+  private:
+    const Function function_;
+    const HANDLE handle_;
+};
 
 VolumeTable theTable(VolumeFunctions::system());
 
@@ -32,9 +43,9 @@ VolumeFunctions VolumeFunctions::system()
 {
     VolumeFunctions found;
     if (const HMODULE kernel = GetModuleHandleW(L"ntdll.dll")) {
-        find(kernel, "NtOpenSymbolicLinkObject", found.openLink);
-        find(kernel, "NtQuerySymbolicLinkObject", found.queryLink);
-        find(kernel, "NtClose", found.closeLink);
+        findFunction(kernel, "NtOpenSymbolicLinkObject", found.openLink);
+        findFunction(kernel, "NtQuerySymbolicLinkObject", found.queryLink);
+        findFunction(kernel, "NtClose", found.closeLink);
     }
     if (!found.openLink || !found.queryLink || !found.closeLink)
         found.openLink = nullptr;
@@ -55,14 +66,7 @@ void VolumeTable::RefreshVolumes()
     const HANDLE search = functions_.findFirst(name, kVolumeNameCharacters);
     if (search == INVALID_HANDLE_VALUE)
         return;
-    const struct Close {
-        const VolumeFunctions& functions;
-        HANDLE search;
-        ~Close()
-        {
-            functions.findClose(search);
-        }
-    } close{functions_, search};
+    const Ending closing(functions_.findClose, search);
     do
         addVolume(name);
     while (functions_.findNext(search, name, kVolumeNameCharacters));
@@ -84,6 +88,7 @@ wxString VolumeTable::resolveLink(const wxString& device) const
     HANDLE link = nullptr;
     if (functions_.openLink(&link, GENERIC_READ, &attributes) < 0)
         return device;
+    const Ending closing(functions_.closeLink, link);
     wxString target = device;
     UNICODE_STRING text{};
     ULONG bytes = 0;
@@ -94,7 +99,6 @@ wxString VolumeTable::resolveLink(const wxString& device) const
         if (functions_.queryLink(link, &text, &bytes) >= 0)
             target = wxString(buffer.data(), text.Length / sizeof(wchar_t));
     }
-    functions_.closeLink(link);
     return target;
 }
 

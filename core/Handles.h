@@ -56,12 +56,24 @@ class UniqueHandle {
     Handle handle_ = Traits::none();
 };
 
-struct KernelTraits {
-    using Handle = HANDLE;
+// What stands for no handle differs from kind to kind.
+template <class Type>
+struct NullIsNone {
+    using Handle = Type;
     static Handle none() noexcept
     {
         return nullptr;
     }
+};
+struct InvalidIsNone {
+    using Handle = HANDLE;
+    static Handle none() noexcept
+    {
+        return INVALID_HANDLE_VALUE;
+    }
+};
+
+struct KernelTraits : NullIsNone<HANDLE> {
     static void free(Handle handle) noexcept
     {
         CloseHandle(handle);
@@ -69,13 +81,7 @@ struct KernelTraits {
 };
 using KernelHandle = UniqueHandle<KernelTraits>;
 
-// What opening a file or pipe gives, which says no with another value than the rest.
-struct FileTraits {
-    using Handle = HANDLE;
-    static Handle none() noexcept
-    {
-        return INVALID_HANDLE_VALUE;
-    }
+struct FileTraits : InvalidIsNone {
     static void free(Handle handle) noexcept
     {
         CloseHandle(handle);
@@ -83,12 +89,7 @@ struct FileTraits {
 };
 using FileHandle = UniqueHandle<FileTraits>;
 
-struct RegistryTraits {
-    using Handle = HKEY;
-    static Handle none() noexcept
-    {
-        return nullptr;
-    }
+struct RegistryTraits : NullIsNone<HKEY> {
     static void free(Handle key) noexcept
     {
         RegCloseKey(key);
@@ -96,14 +97,17 @@ struct RegistryTraits {
 };
 using RegistryKey = UniqueHandle<RegistryTraits>;
 
-template <class Object>
-struct GdiTraits {
-    using Handle = Object;
-    static Handle none() noexcept
+struct LocalTextTraits : NullIsNone<LPWSTR> {
+    static void free(Handle text) noexcept
     {
-        return nullptr;
+        LocalFree(text);
     }
-    static void free(Handle object) noexcept
+};
+using LocalText = UniqueHandle<LocalTextTraits>;
+
+template <class Object>
+struct GdiTraits : NullIsNone<Object> {
+    static void free(Object object) noexcept
     {
         DeleteObject(object);
     }
@@ -111,12 +115,7 @@ struct GdiTraits {
 using BitmapHandle = UniqueHandle<GdiTraits<HBITMAP>>;
 using BrushHandle = UniqueHandle<GdiTraits<HBRUSH>>;
 
-struct IconTraits {
-    using Handle = HICON;
-    static Handle none() noexcept
-    {
-        return nullptr;
-    }
+struct IconTraits : NullIsNone<HICON> {
     static void free(Handle icon) noexcept
     {
         DestroyIcon(icon);
@@ -124,12 +123,7 @@ struct IconTraits {
 };
 using IconHandle = UniqueHandle<IconTraits>;
 
-struct MemoryDcTraits {
-    using Handle = HDC;
-    static Handle none() noexcept
-    {
-        return nullptr;
-    }
+struct MemoryDcTraits : NullIsNone<HDC> {
     static void free(Handle dc) noexcept
     {
         DeleteDC(dc);

@@ -91,8 +91,8 @@ void listenToStatus(const StopCheck& stopCheck)
             waitForRetry(stopCheck);
             pipe = openStatusPipe();
         }
-        // One message too many for the memory there is must not silence the rest.
         const DWORD start = GetTickCount();
+        // One message too many for the memory there is must not silence the rest.
         guarded("status connection", [&] { followConnection(pipe.get(), stopCheck); });
         pipe = FileHandle();
         if (stopCheck())

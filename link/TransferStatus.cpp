@@ -4,6 +4,8 @@
 #include <cmath>
 #include <limits>
 
+#include "core/Reference.h"
+
 namespace tavi {
 namespace {
 
@@ -33,6 +35,12 @@ void addUpTo(const std::atomic<std::int64_t>& total, std::atomic<std::int64_t>& 
     done = result > limit ? limit : result;
 }
 
+// Of the codes of events and of the states of snapshots alike.
+bool endsBackup(std::uint32_t code) noexcept
+{
+    return code <= 10 && code != 1 && code != 7;
+}
+
 // Truncation that is defined for every number.
 template <class Integer>
 Integer truncated(double value) noexcept
@@ -55,17 +63,8 @@ void PublishedText::set(const wxString& text)
 
 wxString PublishedText::get() const
 {
-    Shared* const shared = text_.acquire();
-    if (!shared)
-        return wxString();
-    const struct Hold {
-        Shared* shared;
-        ~Hold()
-        {
-            shared->Release();
-        }
-    } hold{shared};
-    return shared->text();
+    const Reference<Shared> shared(text_.acquire());
+    return shared ? shared->text() : wxString();
 }
 
 TransferStatus::TransferStatus(bool samplingOn, TickSource clock)
@@ -109,12 +108,6 @@ void TransferStatus::resetRestore()
     restoreStarted = false;
 }
 
-void TransferStatus::zeroRates() noexcept
-{
-    for (auto* const rate : {&rate0, &rate1, &restoreRateShort, &rate2, &restoreRateLong})
-        *rate = 0;
-}
-
 std::atomic<bool>* TransferStatus::outcomeOf(std::uint32_t code) noexcept
 {
     switch (code) {
@@ -146,27 +139,19 @@ void TransferStatus::endWith(std::atomic<bool>* outcome) noexcept
 
 void TransferStatus::applyEvent(const EventMessage& event)
 {
+    if (endsBackup(event.type())) {
+        resetBackup();
+        // No outcome for 2, although a snapshot's state 2 has one.
+        endWith(outcomeOf(event.type()));
+    }
     switch (event.type()) {
     case 1:
         resetBackup();
         break;
-    case 0:
-    case 2:
-    case 3:
-    case 4:
-    case 5:
-    case 6:
-    case 8:
-    case 9:
     case 10:
-        resetBackup();
-        // No outcome for 2, although a snapshot's state 2 has one.
-        endWith(outcomeOf(event.type()));
-        if (event.type() == 10) {
-            mark10 = true;
-            totalB = static_cast<std::int64_t>(event.value);
-            totalA = static_cast<std::int64_t>(event.value);
-        }
+        mark10 = true;
+        totalB = static_cast<std::int64_t>(event.value);
+        totalA = static_cast<std::int64_t>(event.value);
         break;
     case 11:
         statusTextA.set(*event.text);
@@ -250,29 +235,22 @@ void TransferStatus::applySnapshot(const SnapshotMessage& snapshot)
         ring->clearRing();
     for (PublishedText* const text : {&statusTextA, &statusTextB, &restoreText})
         text->clear();
-    zeroRates();
+    for (auto* const rate : {&rate0, &rate1, &restoreRateShort, &rate2, &restoreRateLong})
+        *rate = 0;
     // counter2 is not read, and totalB and the restore's amounts keep their values.
     doneA = static_cast<std::int64_t>(snapshot.counter1);
     totalA = static_cast<std::int64_t>(snapshot.counter0);
     doneB = static_cast<std::int64_t>(snapshot.counter3);
 
+    if (endsBackup(snapshot.state))
+        endWith(snapshot.state == 2 ? &ended3 : outcomeOf(snapshot.state));
     switch (snapshot.state) {
     case 1:
         // Also zeroes the amounts that were just set.
         resetBackup();
         break;
-    case 0:
-    case 2:
-    case 3:
-    case 4:
-    case 5:
-    case 6:
-    case 8:
-    case 9:
     case 10:
-        endWith(snapshot.state == 2 ? &ended3 : outcomeOf(snapshot.state));
-        if (snapshot.state == 10)
-            mark10 = true;
+        mark10 = true;
         break;
     case 51:
         restoreStarted = true;

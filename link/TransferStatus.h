@@ -112,7 +112,6 @@ struct TransferStatus {
     // The flag that tells how a backup has ended; null for codes that have none.
     std::atomic<bool>* outcomeOf(std::uint32_t code) noexcept;
     void endWith(std::atomic<bool>* outcome) noexcept;
-    void zeroRates() noexcept;
     void renewRate(std::atomic<float>& rate, std::int32_t span) noexcept;
 
     std::atomic<std::uint32_t> ticks_{0};

@@ -7,12 +7,7 @@
 namespace tavi {
 namespace {
 
-struct ContextTraits {
-    using Handle = HANDLE;
-    static Handle none() noexcept
-    {
-        return INVALID_HANDLE_VALUE;
-    }
+struct ContextTraits : InvalidIsNone {
     static void free(Handle context) noexcept
     {
         ReleaseActCtx(context);

@@ -8,6 +8,7 @@
 
 #include "core/Boundary.h"
 #include "core/Module.h"
+#include "core/ModuleFunction.h"
 #include "core/Text.h"
 #include "ui/ActivationScope.h"
 #include "ui/VersionsDialog.h"
@@ -52,14 +53,9 @@ struct SheetFunctions {
     SheetFunctions() noexcept
     {
         if (const HMODULE controls = LoadLibraryW(L"comctl32.dll")) {
-            find(controls, "CreatePropertySheetPageW", create);
-            find(controls, "DestroyPropertySheetPage", destroy);
+            findFunction(controls, "CreatePropertySheetPageW", create);
+            findFunction(controls, "DestroyPropertySheetPage", destroy);
         }
-    }
-    template <class Function>
-    static void find(HMODULE module, const char* name, Function& function) noexcept
-    {
-        function = reinterpret_cast<Function>(reinterpret_cast<void*>(GetProcAddress(module, name)));
     }
     decltype(&CreatePropertySheetPageW) create = nullptr;
     decltype(&DestroyPropertySheetPage) destroy = nullptr;

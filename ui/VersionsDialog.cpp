@@ -36,12 +36,7 @@ constexpr const wchar_t* kBackupRuns = L"simple.map";
 
 std::atomic<ProgressWindowOpener> progressWindowOpener{RestoreProgressWindow::getOrCreate};
 
-struct WindowTraits {
-    using Handle = HWND;
-    static Handle none() noexcept
-    {
-        return nullptr;
-    }
+struct WindowTraits : NullIsNone<HWND> {
     static void free(Handle window) noexcept
     {
         if (IsWindow(window))
@@ -50,12 +45,7 @@ struct WindowTraits {
 };
 using WindowHandle = UniqueHandle<WindowTraits>;
 
-struct ScreenDcTraits {
-    using Handle = HDC;
-    static Handle none() noexcept
-    {
-        return nullptr;
-    }
+struct ScreenDcTraits : NullIsNone<HDC> {
     static void free(Handle dc) noexcept
     {
         ReleaseDC(nullptr, dc);
