@@ -1,26 +1,27 @@
 #include "backupset/CurrentManifest.h"
 
+#include <atomic>
+
 #include <wx/datetime.h>
 
 #include "backupset/Graylist.h"
 #include "backupset/ManifestWatcher.h"
-#include "core/Boundary.h"
+#include "core/BackgroundThread.h"
 #include "core/Handles.h"
-#include "core/Module.h"
 #include "core/Options.h"
 
 namespace tavi {
 namespace {
 
-// The mutex is only ever held for a start.
-constexpr DWORD kStartPatience = 1000;
-
 WatcherState watcher;
-// Made before the process entry runs; serialises only the start of the watcher.
+// The reference of the newest menu.
+std::atomic<const Manifest*> menuManifest{nullptr};
+// Created before the process entry runs; serialises only the start of the watcher.
 const KernelHandle manifestMutex(CreateMutexW(nullptr, FALSE, nullptr));
 
 class SystemServices : public WatcherServices {
   public:
+    explicit SystemServices(const BackgroundThread& thread) : thread_(thread) {}
     const Manifest* loadManifest() override
     {
         return ReadStoredManifest();
@@ -39,54 +40,28 @@ class SystemServices : public WatcherServices {
     {
         Sleep(milliseconds);
     }
+    bool isStopping() override
+    {
+        return thread_.isStopping();
+    }
     void buildExclusions(bool firstLoad) override
     {
         BuildGraylist(!firstLoad);
     }
+
+  private:
+    const BackgroundThread& thread_;
 };
 
-void closeWatcherHandle() noexcept
-{
-    KernelHandle(watcher.thread.exchange(nullptr));
-}
+BackgroundThread watcherThread("manifest watcher", [](const BackgroundThread& self) {
+    SystemServices services(self);
+    RunManifestWatcher(watcher, services);
+});
 
-void startIfNone() noexcept;
-
-void watcherThread(void*)
+void replaceMenuManifest(const Manifest* next) noexcept
 {
-    bool stopped = false;
-    do {
-        stopped = false;
-        guarded("manifest watcher", [&] {
-            SystemServices services;
-            RunManifestWatcher(watcher, services);
-            stopped = true;
-        });
-    } while (stopped && watcher.stopFlag == 0);
-    closeWatcherHandle();
-    // Whoever took the request back between the two lines above has seen a thread that was still there.
-    if (stopped && watcher.stopFlag == 0)
-        startIfNone();
-}
-
-void startWatcher() noexcept
-{
-    watcher.stopFlag = 0;
-    // Suspended until the handle is stored: the thread takes it back as it ends, which may be at once.
-    if (HANDLE thread = startModuleThread(watcherThread, nullptr, true)) {
-        watcher.thread = thread;
-        ResumeThread(thread);
-    }
-}
-
-void startIfNone() noexcept
-{
-    const DWORD wait = WaitForSingleObject(manifestMutex.get(), kStartPatience);
-    if (wait != WAIT_OBJECT_0 && wait != WAIT_ABANDONED)
-        return;
-    if (!watcher.thread.load())
-        startWatcher();
-    ReleaseMutex(manifestMutex.get());
+    if (const Manifest* const previous = menuManifest.exchange(next))
+        previous->Release();
 }
 
 } // namespace
@@ -101,35 +76,42 @@ const Manifest* GetCurrentManifest() noexcept
             ReleaseMutex(manifestMutex.get());
             return manifest;
         }
-        if (!watcher.thread.load())
-            startWatcher();
+        watcherThread.start();
     }
     // Also without the mutex: releasing what is not held fails, and that is all.
     ReleaseMutex(manifestMutex.get());
     return watcher.manifest.acquire();
 }
 
+void holdManifestForMenu() noexcept
+{
+    replaceMenuManifest(GetCurrentManifest());
+}
+
 void requestWatcherStop() noexcept
 {
-    watcher.stopFlag = 1;
+    watcherThread.requestStop();
 }
 
 void resumeWatcher() noexcept
 {
-    if (watcher.stopFlag.exchange(0) != 0)
-        startIfNone();
+    watcherThread.start();
+}
+
+bool isWatcherActive() noexcept
+{
+    return watcherThread.isActive();
 }
 
 void StopManifestWatcher() noexcept
 {
     requestWatcherStop();
-    if (watcher.thread.load()) {
-        // The wait is for a start in progress, not for the thread, and the mutex stays taken: nothing may start after
-        // this.
+    // The wait is for a start in progress, not for the thread, and the mutex stays taken: nothing may start after this.
+    if (isWatcherActive())
         WaitForSingleObject(manifestMutex.get(), INFINITE);
-        closeWatcherHandle();
-    }
+    KernelHandle(watcherThread.releaseHandle());
     watcher.manifest.replace(nullptr);
+    replaceMenuManifest(nullptr);
     DropGraylist();
 }
 

@@ -9,14 +9,21 @@ namespace tavi {
 // watcher. Never waits; any thread.
 const Manifest* GetCurrentManifest() noexcept;
 
-// Asks the watcher to end; it does so within half a second, in its own time.
+// Starts the watcher like GetCurrentManifest. The manifest in force stays referenced until the next menu asks or the
+// module is unmapped, whatever is loaded meanwhile. Any thread.
+void holdManifestForMenu() noexcept;
+
+// Asks the watcher to end. It does so within half a second, and nobody waits for it.
 void requestWatcherStop() noexcept;
 
-// Takes the request back; starts the watcher again if it has ended.
+// Withdraws the request, or starts the watcher again if it has ended.
 void resumeWatcher() noexcept;
 
-// Detach only: asks the watcher to end, drops the current manifest and the list of default exclusions. Does not wait
-// for the thread.
+// False before the watcher has been started and once it has ended.
+bool isWatcherActive() noexcept;
+
+// Detach only: asks the watcher to end and releases the current manifest, the menu's and the list of default
+// exclusions. Does not wait for the thread.
 void StopManifestWatcher() noexcept;
 
 } // namespace tavi

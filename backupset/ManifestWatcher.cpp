@@ -46,28 +46,33 @@ const Manifest* ReadStoredManifest()
 
 void RunManifestWatcher(WatcherState& state, WatcherServices& services)
 {
-    const auto stopping = [&] { return state.stopFlag.load() != 0; };
-    std::int64_t lastLoad = 0;
     const auto load = [&] {
         guarded("manifest load", [&] { publish(state, services.loadManifest()); });
-        lastLoad = services.now();
+        state.lastLoad = services.now();
+    };
+    const auto loadIfChanged = [&] {
+        guarded("manifest check", [&] {
+            std::int64_t changed = 0;
+            if (services.manifestTime(changed) && changed > state.lastLoad)
+                load();
+        });
     };
 
     guarded("exclusion build", [&] { services.buildExclusions(true); });
-    load();
-    for (std::uint32_t cycles = 0; !stopping();) {
+    // A watcher that starts again while the host keeps the module finds the manifest of the one before it.
+    if (state.manifest.isSet())
+        loadIfChanged();
+    else
+        load();
+    for (std::uint32_t cycles = 0; !services.isStopping();) {
         for (int naps = 0; naps < kNapsPerCycle; ++naps) {
-            if (stopping())
+            if (services.isStopping())
                 return;
             services.sleep(kNapMilliseconds);
         }
-        if (stopping())
+        if (services.isStopping())
             return;
-        guarded("manifest check", [&] {
-            std::int64_t changed = 0;
-            if (services.manifestTime(changed) && changed > lastLoad)
-                load();
-        });
+        loadIfChanged();
         if (++cycles % kCyclesPerExclusionBuild == 0)
             guarded("exclusion build", [&] { services.buildExclusions(false); });
     }

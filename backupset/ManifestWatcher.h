@@ -1,9 +1,6 @@
 #pragma once
 
-#include <atomic>
 #include <cstdint>
-
-#include <windows.h>
 
 #include "backupset/Manifest.h"
 #include "core/PublishedPointer.h"
@@ -12,10 +9,9 @@ namespace tavi {
 
 // What the watcher thread shares with the rest of the module.
 struct WatcherState {
-    std::atomic<std::uint8_t> stopFlag{0};
-    // Owned by whoever exchanges it for null.
-    std::atomic<HANDLE> thread{nullptr};
     PublishedPointer<const Manifest> manifest;
+    // The local time of the last load in milliseconds since 1970. Only the watcher thread uses it.
+    std::int64_t lastLoad = 0;
 };
 
 // What the watcher needs of the outside; each is called on the watcher's thread.
@@ -28,11 +24,13 @@ class WatcherServices {
     virtual bool manifestTime(std::int64_t& milliseconds) = 0;
     virtual std::int64_t now() = 0;
     virtual void sleep(std::uint32_t milliseconds) = 0;
+    // True when the watcher is to return.
+    virtual bool isStopping() = 0;
     virtual void buildExclusions(bool firstLoad) = 0;
 };
 
-// Loads the manifest and keeps it current until the stop flag is set; what fails in one round is logged and the next
-// goes on.
+// Loads the manifest unless the one in force is still fresh, and keeps it current until the services say stop. A
+// failure in one round is logged and the next round continues.
 void RunManifestWatcher(WatcherState& state, WatcherServices& services);
 
 // The stored manifest, parsed: an empty one when there is none or the database fails, which is logged; null for an

@@ -304,15 +304,15 @@ void barePolling()
 // so many are done.
 class Services final : public WatcherServices {
   public:
-    explicit Services(WatcherState& state, unsigned rounds = 0) : state_(state), left_(rounds) {}
+    explicit Services(unsigned rounds) : inTime_(rounds == 0), left_(rounds) {}
     const Manifest* loadManifest() override
     {
         return Manifest::Parse(wxString());
     }
     bool manifestTime(std::int64_t& milliseconds) override
     {
-        if (left_ > 0 && --left_ == 0)
-            state_.stopFlag = 1;
+        if (!inTime_)
+            --left_;
         const auto time = readManifestTime();
         milliseconds = time.value_or(0);
         return time.has_value();
@@ -323,22 +323,24 @@ class Services final : public WatcherServices {
     }
     void sleep(std::uint32_t milliseconds) override
     {
-        if (left_ > 0)
-            return;
-        Sleep(milliseconds);
-        state_.stopFlag = stopped();
+        if (inTime_)
+            Sleep(milliseconds);
+    }
+    bool isStopping() override
+    {
+        return inTime_ ? stopped() : left_ == 0;
     }
     void buildExclusions(bool) override {}
 
   private:
-    WatcherState& state_;
+    const bool inTime_;
     unsigned left_;
 };
 
 void runWatcher(unsigned rounds)
 {
     WatcherState state;
-    Services services(state, rounds);
+    Services services(rounds);
     RunManifestWatcher(state, services);
     state.manifest.replace(nullptr);
 }

@@ -27,6 +27,12 @@ include(cmake/resources.cmake)
 
 add_library(tavishell SHARED shell/DllMain.cpp shell/Exports.cpp shell/tavishell.def ui/tavishell.rc)
 set_target_properties(tavishell PROPERTIES PREFIX "" LINK_FLAGS_RELEASE "-s")
+# Only 32-bit names are decorated.
+if(CMAKE_SIZEOF_VOID_P EQUAL 4)
+    target_link_options(tavishell PRIVATE -Wl,--entry=_tavishellEntry@12)
+else()
+    target_link_options(tavishell PRIVATE -Wl,--entry=tavishellEntry)
+endif()
 set_property(SOURCE ui/tavishell.rc APPEND PROPERTY OBJECT_DEPENDS "${resource_files}")
 target_include_directories(tavishell PRIVATE ${resource_folder})
 target_link_libraries(tavishell PRIVATE tavi_rooms tavi_warnings)

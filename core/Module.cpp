@@ -1,5 +1,6 @@
 #include "core/Module.h"
 
+#include <exception>
 #include <memory>
 #include <utility>
 
@@ -87,6 +88,9 @@ std::atomic<std::int32_t>& moduleRefCount() noexcept
 
 void releaseThreadRuntime() noexcept
 {
+    // The runtime's part holds the exceptions in flight: a handler further up would read freed memory.
+    if (std::uncaught_exceptions() != 0 || std::current_exception())
+        return;
     HMODULE module = nullptr;
     if (!GetModuleHandleExW(GET_MODULE_HANDLE_EX_FLAG_FROM_ADDRESS | GET_MODULE_HANDLE_EX_FLAG_UNCHANGED_REFCOUNT,
                             reinterpret_cast<const wchar_t*>(&runModuleThread), &module))

@@ -36,8 +36,9 @@ class ModuleLock {
     ModuleLock& operator=(const ModuleLock&) = delete;
 };
 
-// Gives back what the static runtime keeps for the calling thread: handles that would outlive the module when another
-// thread unloads it. What the thread needs later is made again. Not while an exception is being handled.
+// Releases what the static runtime keeps for the calling thread: handles that would outlive the module when another
+// thread unloads it. The runtime creates again what the thread needs later. Does nothing while an exception is in
+// flight or being handled on the thread.
 void releaseThreadRuntime() noexcept;
 
 using ThreadBody = void (*)(void* argument);

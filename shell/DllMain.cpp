@@ -34,3 +34,16 @@ extern "C" BOOL WINAPI DllMain(HINSTANCE instance, DWORD reason, LPVOID reserved
         return TRUE;
     });
 }
+
+extern "C" BOOL WINAPI DllMainCRTStartup(HINSTANCE instance, DWORD reason, LPVOID reserved);
+extern "C" BOOL WINAPI tavishellEntry(HINSTANCE instance, DWORD reason, LPVOID reserved);
+
+// The entry that the linker is given. At the end of a process it bypasses the C runtime, which would destroy the static
+// objects of a module whose threads were killed at arbitrary instructions, and would wait for the locks that they held.
+// At attach the runtime chooses the stack protector's cookie, so this function must not check one.
+extern "C" __attribute__((no_stack_protector)) BOOL WINAPI tavishellEntry(HINSTANCE instance, DWORD reason,
+                                                                          LPVOID reserved)
+{
+    return reason == DLL_PROCESS_DETACH && reserved ? DllMain(instance, reason, reserved)
+                                                    : DllMainCRTStartup(instance, reason, reserved);
+}

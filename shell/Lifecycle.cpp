@@ -2,15 +2,12 @@
 
 #include <atomic>
 #include <cwchar>
-#include <memory>
-#include <mutex>
-#include <utility>
 
 #include <wx/log.h>
 
 #include "backupset/CurrentManifest.h"
-#include "core/Boundary.h"
-#include "core/CriticalSection.h"
+#include "core/BackgroundThread.h"
+#include "core/Handles.h"
 #include "core/Log.h"
 #include "link/StatusListener.h"
 #include "statedb/Database.h"
@@ -31,25 +28,10 @@ const HostName kHosts[] = {{L"explorer.exe", HostKind::fileManager},
                            {L"verclsid.exe", HostKind::toolOnly},
                            {L"_RegDLL.tmp", HostKind::toolOnly}};
 
-// Each listener has its own: one that was asked to stop stays so when another takes its place.
-using StopFlag = std::shared_ptr<std::atomic<bool>>;
-CriticalSection statusLock;
 std::atomic<bool> isAttached{false};
-StopFlag statusStopFlag;
-HANDLE statusThread = INVALID_HANDLE_VALUE;
 
-void runStatusListener(void* argument)
-{
-    const std::unique_ptr<StopFlag> stop(static_cast<StopFlag*>(argument));
-    listenToStatus([&] { return (*stop)->load(); });
-}
-
-void requestStatusStop() noexcept
-{
-    const std::lock_guard guard(statusLock);
-    if (statusStopFlag)
-        *statusStopFlag = true;
-}
+BackgroundThread statusThread("status listener",
+                              [](const BackgroundThread& self) { listenToStatus([&] { return self.isStopping(); }); });
 
 } // namespace
 
@@ -81,53 +63,37 @@ void attachToFileManager(HINSTANCE instance, const wchar_t* hostPath)
 void detachFromFileManager(bool processEnds)
 {
     releaseShellAllocator();
+    // At the end of a process every other thread was killed at an arbitrary instruction, perhaps inside a lock of the
+    // heap, of a C stream or of GDI. The kernel takes back the rest without asking those.
+    if (processEnds)
+        return;
     freeMenuBitmaps();
     StopManifestWatcher();
-    requestStatusStop();
+    statusThread.requestStop();
     StopStatusThread();
-    if (!processEnds)
-        shutDownDatabaseLibrary();
+    shutDownDatabaseLibrary();
     CloseLog();
 }
 
 void StartStatusThread() noexcept
 {
-    guarded("status thread start", [] {
-        auto stop = std::make_unique<StopFlag>(std::make_shared<std::atomic<bool>>(false));
-        // Looked at and replaced in one step: two threads that come back at once must not start two.
-        const std::lock_guard guard(statusLock);
-        if (statusStopFlag && !*statusStopFlag)
-            return;
-        if (statusThread != INVALID_HANDLE_VALUE)
-            CloseHandle(std::exchange(statusThread, INVALID_HANDLE_VALUE));
-        statusStopFlag = *stop;
-        if (HANDLE thread = startModuleThread(runStatusListener, stop.get())) {
-            statusThread = thread;
-            static_cast<void>(stop.release());
-        } else {
-            // To be tried again when the module is used next.
-            *statusStopFlag = true;
-        }
-    });
+    statusThread.start();
 }
 
 void StopStatusThread() noexcept
 {
-    const HANDLE thread = std::exchange(statusThread, INVALID_HANDLE_VALUE);
-    if (thread == INVALID_HANDLE_VALUE)
-        return;
+    const KernelHandle thread(statusThread.releaseHandle());
     // The thread's own last reference may be what unloads the module: then this runs on it, and it must not wait for
     // itself.
-    if (GetThreadId(thread) != GetCurrentThreadId() &&
-        WaitForSingleObject(thread, kStatusThreadPatience) != WAIT_OBJECT_0)
-        TerminateThread(thread, 0);
-    CloseHandle(thread);
+    if (thread && GetThreadId(thread.get()) != GetCurrentThreadId() &&
+        WaitForSingleObject(thread.get(), kStatusThreadPatience) != WAIT_OBJECT_0)
+        TerminateThread(thread.get(), 0);
 }
 
 void requestThreadsStop() noexcept
 {
     requestWatcherStop();
-    requestStatusStop();
+    statusThread.requestStop();
 }
 
 void resumeThreads() noexcept

@@ -14,7 +14,7 @@ enum class HostKind { refused, toolOnly, fileManager };
 HostKind hostKindOf(const wchar_t* executablePath) noexcept;
 
 void attachToFileManager(HINSTANCE instance, const wchar_t* hostPath);
-// `processEnds`: nothing is unloaded, so what the system takes back by itself may stay.
+// With `processEnds` nothing is unloaded, and only what needs no lock of the process is done.
 void detachFromFileManager(bool processEnds);
 
 // The status listener's thread.
@@ -24,8 +24,8 @@ void StopStatusThread() noexcept;
 
 // Asks both background threads to end, without waiting.
 void requestThreadsStop() noexcept;
-// Starts them again where they were asked to end and the module is used after all: the host may come back before it, or
-// the last of the threads, has let go of the mapping. Then nothing detaches and nothing attaches.
+// Withdraws the request, or starts again what has ended: the host may use the module after it was allowed to unload it,
+// and then neither detach nor attach happens.
 void resumeThreads() noexcept;
 
 } // namespace tavi

@@ -103,10 +103,10 @@ STDMETHODIMP ShellExt::Initialize(PCIDLIST_ABSOLUTE folder, IDataObject* data, H
     return S_OK;
 }
 
-STDMETHODIMP ShellExt::QueryContextMenu(HMENU menu, UINT indexMenu, UINT firstId, UINT lastId, UINT flags)
+STDMETHODIMP ShellExt::QueryContextMenu(HMENU menu, UINT indexMenu, UINT firstId, UINT, UINT flags)
 {
     return guarded("ShellExt::QueryContextMenu", MAKE_HRESULT(SEVERITY_SUCCESS, 0, 0), [&]() -> HRESULT {
-        return MAKE_HRESULT(SEVERITY_SUCCESS, 0, insertMenuItems(menu, indexMenu, firstId, lastId, flags, selection_));
+        return MAKE_HRESULT(SEVERITY_SUCCESS, 0, insertMenuItems(menu, indexMenu, firstId, flags, selection_));
     });
 }
 

@@ -102,12 +102,11 @@ void insertRestoreItem(HMENU menu, UINT position, UINT id, const wxString& label
 
 } // namespace
 
-UINT insertMenuItems(HMENU menu, UINT indexMenu, UINT idCmdFirst, UINT idCmdLast, UINT flags,
-                     const Selection& selection)
+UINT insertMenuItems(HMENU menu, UINT indexMenu, UINT idCmdFirst, UINT flags, const Selection& selection)
 {
-    // Starts the watcher. The reference is kept for good, as required: a manifest that a menu was built from is never
-    // freed.
-    static_cast<void>(GetCurrentManifest());
+    // Called for its effect: the watcher starts, and the manifest that the newest menu was built from outlives a reload
+    // for the command that the user may pick from that menu.
+    holdManifestForMenu();
     if (flags & (CMF_DEFAULTONLY | CMF_NOVERBS))
         return 0;
 
@@ -116,7 +115,7 @@ UINT insertMenuItems(HMENU menu, UINT indexMenu, UINT idCmdFirst, UINT idCmdLast
     UINT used = 0;
     for (const Command& command : kCommands) {
         const wxString label = command.label.text(selection);
-        if (!command.onMenu || selection.restoreMode == 0 || idCmdLast < idCmdFirst)
+        if (!command.onMenu || selection.restoreMode == 0)
             continue;
         insertRestoreItem(menu, indexMenu + 1, idCmdFirst, label);
         ++used;
@@ -154,8 +153,9 @@ HRESULT invokeCommand(const CMINVOKECOMMANDINFO& info, const Selection& selectio
     switch (reinterpret_cast<UINT_PTR>(info.lpVerb)) {
     case kRestore: {
         ManifestRef manifest(GetCurrentManifest());
+        // The object keeps its selection: the host may invoke the command again.
         if (manifest)
-            startVersionsDialog(selection, std::move(manifest), info.hwnd);
+            startVersionsDialog(Selection(selection), std::move(manifest), info.hwnd);
         return S_OK;
     }
     case kBackup:

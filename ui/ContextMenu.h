@@ -11,10 +11,8 @@
 // the boundary for exceptions.
 namespace tavi {
 
-// Adds the separator and, when there is something to restore and room for an id, the restore command. Returns the
-// number of ids used.
-UINT insertMenuItems(HMENU menu, UINT indexMenu, UINT idCmdFirst, UINT idCmdLast, UINT flags,
-                     const Selection& selection);
+// Inserts the separator and, if there is something to restore, the restore command. Returns the number of ids used.
+UINT insertMenuItems(HMENU menu, UINT indexMenu, UINT idCmdFirst, UINT flags, const Selection& selection);
 
 // The verb or help text of a command. `size` counts characters of the requested form.
 HRESULT commandString(UINT_PTR offset, UINT type, LPSTR buffer, UINT size, const Selection& selection);

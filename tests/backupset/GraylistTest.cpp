@@ -312,7 +312,10 @@ class AnHour : public WatcherServices {
         slept += milliseconds;
         if (slept == 600000)
             early = countNow();
-        state.stopFlag = slept >= 3600000;
+    }
+    bool isStopping() override
+    {
+        return slept >= 3600000;
     }
     void buildExclusions(bool firstLoad) override
     {

@@ -33,8 +33,11 @@ class ScriptedServices : public WatcherServices {
     void sleep(std::uint32_t milliseconds) override
     {
         slept += milliseconds;
-        if (--naps == 0)
-            state.stopFlag = 1;
+        --naps;
+    }
+    bool isStopping() override
+    {
+        return naps <= 0;
     }
     void buildExclusions(bool firstLoad) override
     {
@@ -64,10 +67,14 @@ TEST(ManifestWatcher, ReloadsForALaterTimeRebuildsEvery18thRoundAndStopsWithinAN
     EXPECT_EQ(current ? current->hash() : wxString("none"), L"2");
 
     ScriptedServices stopped;
-    stopped.state.stopFlag = 1;
     RunManifestWatcher(stopped.state, stopped);
     EXPECT_EQ(stopped.loads, 1); // the first load is not skipped
     EXPECT_EQ(stopped.slept, 0u);
+    // A second run finds the manifest of the first: it loads a changed one only. The third round's time is later.
+    for (const int loads : {1, 1, 2, 2}) {
+        RunManifestWatcher(stopped.state, stopped);
+        EXPECT_EQ(stopped.loads, loads) << stopped.rounds;
+    }
 }
 
 } // namespace

@@ -1,5 +1,7 @@
 #include "shell/Lifecycle.h"
 
+#include <stdexcept>
+
 #include <gtest/gtest.h>
 
 #include "core/Handles.h"
@@ -28,6 +30,23 @@ TEST(Lifecycle, TheGateComparesTheBeginningOfTheName)
     const std::wstring exe(path);
     EXPECT_EQ(LoadLibraryW((exe.substr(0, exe.rfind(L"\\tests\\")) + L"\\tavishell.dll").c_str()), nullptr);
     EXPECT_EQ(GetLastError(), DWORD{ERROR_DLL_INIT_FAILED});
+}
+
+TEST(Lifecycle, TheRuntimesShareOfAThreadOutlivesAnExceptionInFlight)
+{
+    std::string caught;
+    try {
+        try {
+            throw std::runtime_error("kept");
+        } catch (...) {
+            releaseThreadRuntime();
+            throw;
+        }
+    } catch (const std::runtime_error& error) {
+        caught = error.what();
+    }
+    EXPECT_EQ(caught, "kept");
+    releaseThreadRuntime();
 }
 
 } // namespace

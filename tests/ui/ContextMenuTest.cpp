@@ -4,6 +4,7 @@
 
 #include "backupset/CurrentManifest.h"
 #include "core/Handles.h"
+#include "core/InstallPaths.h"
 #include "tests/support/Dialogs.h"
 #include "ui/MenuBitmap.h"
 #include "ui/resource.h"
@@ -16,14 +17,13 @@ constexpr UINT kFirstId = 0x7001;
 struct ContextMenuTest : test::UiTest {
     ContextMenuTest()
     {
-        // A fresh manifest: earlier menus hold theirs.
-        StopManifestWatcher();
         test::waitUntil([&] { return (manifest = GetCurrentManifest()) != nullptr; });
     }
     ~ContextMenuTest() override
     {
         freeMenuBitmaps();
-        requestWatcherStop();
+        StopManifestWatcher();
+        EXPECT_TRUE(test::waitUntil([] { return !isWatcherActive(); }));
     }
 
     const Manifest* manifest = nullptr;
@@ -33,20 +33,19 @@ struct ContextMenuTest : test::UiTest {
 
 TEST_F(ContextMenuTest, InsertsTheCommandThatFits)
 {
-    const std::tuple<Selection, UINT, UINT, std::wstring> cases[] = {
-        {one, CMF_NORMAL, 0x7FFF, L"-|Restore Previous Version|Open|"},
-        {folder, CMF_EXPLORE, kFirstId, L"-|Restore Files in Folder|Open|"},
-        {files, CMF_NORMAL, 0x7FFF, L"-|Restore Previous Versions|Open|"},
-        {mixed, CMF_CANRENAME | 0x100, 0x7FFF, L"-|Restore Files|Open|"},
-        {none, CMF_NORMAL, 0x7FFF, L"-|Open|"},
-        {one, CMF_NORMAL, kFirstId - 1, L"-|Open|"},
-        {one, CMF_DEFAULTONLY, 0x7FFF, L"Open|"},
-        {one, CMF_NOVERBS | CMF_EXPLORE, 0x7FFF, L"Open|"},
+    const std::tuple<Selection, UINT, std::wstring> cases[] = {
+        {one, CMF_NORMAL, L"-|Restore Previous Version|Open|"},
+        {folder, CMF_EXPLORE, L"-|Restore Files in Folder|Open|"},
+        {files, CMF_NORMAL, L"-|Restore Previous Versions|Open|"},
+        {mixed, CMF_CANRENAME | 0x100, L"-|Restore Files|Open|"},
+        {none, CMF_NORMAL, L"-|Open|"},
+        {one, CMF_DEFAULTONLY, L"Open|"},
+        {one, CMF_NOVERBS | CMF_EXPLORE, L"Open|"},
     };
-    for (const auto& [selection, flags, lastId, expected] : cases) {
+    for (const auto& [selection, flags, expected] : cases) {
         const HMENU menu = CreatePopupMenu();
         AppendMenuW(menu, MF_STRING, 1, L"Open");
-        const UINT used = insertMenuItems(menu, 0, kFirstId, lastId, flags, selection);
+        const UINT used = insertMenuItems(menu, 0, kFirstId, flags, selection);
         std::wstring texts;
         for (UINT i = 0; static_cast<int>(i) < GetMenuItemCount(menu); ++i) {
             wchar_t text[200] = L"";
@@ -63,15 +62,32 @@ TEST_F(ContextMenuTest, InsertsTheCommandThatFits)
     }
 }
 
-TEST_F(ContextMenuTest, KeepsAReferenceToTheManifest)
+TEST_F(ContextMenuTest, KeepsTheManifestOfTheNewestMenu)
 {
-    // A well-meant release would free a manifest that a menu has seen.
-    insertMenuItems(nullptr, 0, kFirstId, 0x7FFF, CMF_DEFAULTONLY, none);
+    const auto showMenu = [&] { insertMenuItems(nullptr, 0, kFirstId, CMF_DEFAULTONLY, none); };
+    const auto isAllocated = [](const Manifest* object) {
+        return HeapValidate(reinterpret_cast<HANDLE>(_get_heap_handle()), 0, object) != FALSE;
+    };
+    showMenu();
+    showMenu();
+    // The watcher's own wait: five seconds until it sees the change.
+    wxRegKey settings(GetSettingsKeyName());
+    settings.Create();
+    settings.SetValue(L"options.manifestmtime", L"2037-01-02 03:04:05");
+    const Manifest* next = nullptr;
+    EXPECT_TRUE(test::waitUntil([&] {
+        next = GetCurrentManifest();
+        next->Release();
+        return next != manifest;
+    }));
+    settings.DeleteSelf();
+    // A well-meant release would free a manifest that a menu has seen; without any, manifests would pile up.
+    manifest->Release();
+    EXPECT_TRUE(isAllocated(manifest));
+    showMenu();
+    EXPECT_FALSE(isAllocated(manifest));
     StopManifestWatcher();
-    for (const BOOL allocated : {TRUE, FALSE}) {
-        manifest->Release();
-        EXPECT_EQ(HeapValidate(reinterpret_cast<HANDLE>(_get_heap_handle()), 0, manifest), allocated);
-    }
+    EXPECT_FALSE(isAllocated(next));
 }
 
 TEST_F(ContextMenuTest, AnswersVerbsAndHelp)
