@@ -2,11 +2,14 @@
 
 #include <new>
 
+#include <wx/log.h>
+
 #include "core/Boundary.h"
 #include "core/Module.h"
 #include "shell/ClassIds.h"
 #include "shell/ShellExt.h"
 #include "shell/StubFolder.h"
+#include "statedb/Database.h"
 
 namespace tavi {
 namespace {
@@ -92,6 +95,9 @@ class ClassFactory final : public IClassFactory {
                 return result;
             } catch (const std::bad_alloc&) {
                 return E_OUTOFMEMORY;
+            } catch (const DbException& error) {
+                wxLogError("Failed to open folder-state db (%d: %s)", error.code(), error.message());
+                return E_FAIL;
             }
         });
     }

@@ -37,7 +37,7 @@ STDMETHODIMP StubFolder::QueryInterface(REFIID interfaceId, void** object)
             IsEqualIID(interfaceId, IID_IPersistFolder) || IsEqualIID(interfaceId, IID_IPersistFolder2))
             *object = static_cast<IPersistFolder*>(this);
         else if (IsEqualIID(interfaceId, IID_IShellFolder))
-            *object = static_cast<IShellFolder*>(this);
+            *object = static_cast<IShellFolder*>(&folder_);
         else
             return E_NOINTERFACE;
         AddRef();
@@ -78,8 +78,31 @@ STDMETHODIMP StubFolder::Initialize(PCIDLIST_ABSOLUTE folder)
     });
 }
 
-STDMETHODIMP StubFolder::ParseDisplayName(HWND, IBindCtx*, LPWSTR, ULONG* eaten, PIDLIST_RELATIVE* items,
-                                          ULONG* attributes)
+StubFolder& StubFolder::Folder::owner() noexcept
+{
+    // A table pointer is all that this part has, directly behind the one of the whole object.
+    static_assert(sizeof(Folder) == sizeof(void*));
+    auto* const whole = reinterpret_cast<StubFolder*>(reinterpret_cast<void**>(this) - 1);
+    return *whole;
+}
+
+STDMETHODIMP StubFolder::Folder::QueryInterface(REFIID interfaceId, void** object)
+{
+    return guarded("StubFolder::QueryInterface", E_FAIL, [&] { return owner().QueryInterface(interfaceId, object); });
+}
+
+STDMETHODIMP_(ULONG) StubFolder::Folder::AddRef()
+{
+    return guarded("StubFolder::AddRef", ULONG{1}, [&] { return owner().AddRef(); });
+}
+
+STDMETHODIMP_(ULONG) StubFolder::Folder::Release()
+{
+    return guarded("StubFolder::Release", ULONG{0}, [&] { return owner().Release(); });
+}
+
+STDMETHODIMP StubFolder::Folder::ParseDisplayName(HWND, IBindCtx*, LPWSTR, ULONG* eaten, PIDLIST_RELATIVE* items,
+                                                  ULONG* attributes)
 {
     return guarded("StubFolder::ParseDisplayName", E_FAIL, [&]() -> HRESULT {
         if (!items)
@@ -99,47 +122,47 @@ STDMETHODIMP StubFolder::ParseDisplayName(HWND, IBindCtx*, LPWSTR, ULONG* eaten,
     });
 }
 
-STDMETHODIMP StubFolder::EnumObjects(HWND, SHCONTF, IEnumIDList**)
+STDMETHODIMP StubFolder::Folder::EnumObjects(HWND, SHCONTF, IEnumIDList**)
 {
     return refuse("StubFolder::EnumObjects");
 }
 
-STDMETHODIMP StubFolder::BindToObject(PCUIDLIST_RELATIVE, IBindCtx*, REFIID, void**)
+STDMETHODIMP StubFolder::Folder::BindToObject(PCUIDLIST_RELATIVE, IBindCtx*, REFIID, void**)
 {
     return refuse("StubFolder::BindToObject");
 }
 
-STDMETHODIMP StubFolder::BindToStorage(PCUIDLIST_RELATIVE, IBindCtx*, REFIID, void**)
+STDMETHODIMP StubFolder::Folder::BindToStorage(PCUIDLIST_RELATIVE, IBindCtx*, REFIID, void**)
 {
     return refuse("StubFolder::BindToStorage");
 }
 
-STDMETHODIMP StubFolder::CompareIDs(LPARAM, PCUIDLIST_RELATIVE, PCUIDLIST_RELATIVE)
+STDMETHODIMP StubFolder::Folder::CompareIDs(LPARAM, PCUIDLIST_RELATIVE, PCUIDLIST_RELATIVE)
 {
     return refuse("StubFolder::CompareIDs");
 }
 
-STDMETHODIMP StubFolder::CreateViewObject(HWND, REFIID, void**)
+STDMETHODIMP StubFolder::Folder::CreateViewObject(HWND, REFIID, void**)
 {
     return refuse("StubFolder::CreateViewObject");
 }
 
-STDMETHODIMP StubFolder::GetAttributesOf(UINT, PCUITEMID_CHILD_ARRAY, SFGAOF*)
+STDMETHODIMP StubFolder::Folder::GetAttributesOf(UINT, PCUITEMID_CHILD_ARRAY, SFGAOF*)
 {
     return refuse("StubFolder::GetAttributesOf");
 }
 
-STDMETHODIMP StubFolder::GetUIObjectOf(HWND, UINT, PCUITEMID_CHILD_ARRAY, REFIID, UINT*, void**)
+STDMETHODIMP StubFolder::Folder::GetUIObjectOf(HWND, UINT, PCUITEMID_CHILD_ARRAY, REFIID, UINT*, void**)
 {
     return refuse("StubFolder::GetUIObjectOf");
 }
 
-STDMETHODIMP StubFolder::GetDisplayNameOf(PCUITEMID_CHILD, SHGDNF, STRRET*)
+STDMETHODIMP StubFolder::Folder::GetDisplayNameOf(PCUITEMID_CHILD, SHGDNF, STRRET*)
 {
     return refuse("StubFolder::GetDisplayNameOf");
 }
 
-STDMETHODIMP StubFolder::SetNameOf(HWND, PCUITEMID_CHILD, LPCWSTR, SHGDNF, PITEMID_CHILD*)
+STDMETHODIMP StubFolder::Folder::SetNameOf(HWND, PCUITEMID_CHILD, LPCWSTR, SHGDNF, PITEMID_CHILD*)
 {
     return refuse("StubFolder::SetNameOf");
 }

@@ -17,13 +17,13 @@
 namespace tavi {
 namespace {
 
-// Lives from the page's making until the sheet releases the page, shown or not.
+// Owned by the page's description until the sheet releases the page, shown or not. The dialog, which is what the module
+// counts, may outlive it in the message loop of a box.
 struct Page {
     Page(const Selection& selection, ManifestRef manifest)
         : dialog(std::make_shared<VersionsDialog>(selection, std::move(manifest), false)), title(_("Tavi"))
     {
     }
-    ModuleLock lock;
     std::shared_ptr<VersionsDialog> dialog;
     const wxString title;
 };

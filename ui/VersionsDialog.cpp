@@ -147,7 +147,7 @@ void runDialog(void* argument)
     const std::unique_ptr<DialogStart> start(static_cast<DialogStart*>(argument));
     const OleScope ole;
     const ActivationScope activation;
-    const auto dialog = std::make_shared<VersionsDialog>(start->selection, std::move(start->manifest), true);
+    const auto dialog = std::make_shared<VersionsDialog>(std::move(start->selection), std::move(start->manifest), true);
     // No owner: one on another thread would tie the host's input to ours.
     const WindowHandle window(CreateDialogParamW(moduleInstance(), MAKEINTRESOURCEW(TAVI_DIALOG_VERSIONS), nullptr,
                                                  dialogProcedure, reinterpret_cast<LPARAM>(dialog.get())));
@@ -172,13 +172,15 @@ void runDialog(void* argument)
 
 } // namespace
 
-bool startVersionsDialog(const Selection& selection, ManifestRef manifest, HWND host)
+bool startVersionsDialog(Selection selection, ManifestRef manifest, HWND host)
 {
-    std::unique_ptr<DialogStart> start(new DialogStart{{}, selection, std::move(manifest), host});
-    const KernelHandle thread(startModuleThread(runDialog, start.get()));
-    if (thread)
-        static_cast<void>(start.release());
-    return static_cast<bool>(thread);
+    std::unique_ptr<DialogStart> start(new DialogStart{{}, std::move(selection), std::move(manifest), host});
+    if (!KernelHandle(startModuleThread(runDialog, start.get()))) {
+        wxLogError("Unable to start the versions dialog (%lu)", GetLastError());
+        return false;
+    }
+    static_cast<void>(start.release());
+    return true;
 }
 
 void setProgressWindowOpener(ProgressWindowOpener opener) noexcept
@@ -186,11 +188,19 @@ void setProgressWindowOpener(ProgressWindowOpener opener) noexcept
     progressWindowOpener = opener;
 }
 
-VersionsDialog::VersionsDialog(const Selection& selection, ManifestRef manifest, bool ownThread)
-    : paths_(selection.paths), coverage_(selection.restoreMode), manifest_(std::move(manifest)), ownThread_(ownThread)
+VersionsDialog::VersionsDialog(Selection selection, ManifestRef manifest, bool ownThread)
+    : paths_(std::move(selection.paths)), coverage_(selection.restoreMode), manifest_(std::move(manifest)),
+      ownThread_(ownThread)
 {
     if (paths_.size() == 1 && !selection.isFolder)
         singleFile_ = *paths_.begin();
+}
+
+VersionsDialog::~VersionsDialog()
+{
+    // The module lock, the first member, is released last: COM must not unmap the code that makes this call.
+    if (!ownThread_)
+        CoFreeUnusedLibraries();
 }
 
 INT_PTR VersionsDialog::handleMessage(HWND window, UINT message, WPARAM wParam, LPARAM lParam)
@@ -456,7 +466,11 @@ void VersionsDialog::request(const wxString& sourcePrefix, const wxString& desti
     if (!time)
         return;
     RestoreRequest request;
-    request.selectedPaths = paths_;
+    // A window of our own closes after the request; a page stays and may ask again.
+    if (ownThread_)
+        request.selectedPaths = std::move(paths_);
+    else
+        request.selectedPaths = paths_;
     request.cutoffTime = *time;
     request.sourcePrefix = sourcePrefix;
     request.destinationFolder = destination;

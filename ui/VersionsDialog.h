@@ -8,6 +8,7 @@
 #include <wx/string.h>
 
 #include "backupset/Manifest.h"
+#include "core/Module.h"
 #include "ui/Selection.h"
 
 namespace tavi {
@@ -15,8 +16,8 @@ namespace tavi {
 struct RestoreRequest;
 
 // Opens the "Restore Files" window for the selection on a thread of its own, on the monitor of the host's window (which
-// may be null). Any thread; any number of windows. False when the thread could not start.
-bool startVersionsDialog(const Selection& selection, ManifestRef manifest, HWND host);
+// may be null). Any thread; any number of windows. False, with a line in the log, if the thread could not start.
+bool startVersionsDialog(Selection selection, ManifestRef manifest, HWND host);
 
 // What makes sure that the progress window exists, called on the dialog's thread after a restore was requested. May be
 // null.
@@ -24,14 +25,16 @@ using ProgressWindowOpener = void (*)();
 void setProgressWindowOpener(ProgressWindowOpener opener) noexcept;
 
 // The behaviour of dialog 102, whoever hosts the window. Used by the window's thread only; held by a shared pointer,
-// because the boxes it opens run message loops in which the window and its host's hold on the object may go.
+// because the boxes it opens run message loops in which the window and its host's hold on the object may go. Counts as
+// an object of the module until the last frame that uses it has returned.
 class VersionsDialog : public std::enable_shared_from_this<VersionsDialog> {
   public:
     // With `ownThread` the end of the window ends the thread's message loop; without it the window is a page of a
-    // sheet.
-    VersionsDialog(const Selection& selection, ManifestRef manifest, bool ownThread);
+    // sheet, whose end lets COM free the libraries that nobody uses any more.
+    VersionsDialog(Selection selection, ManifestRef manifest, bool ownThread);
     VersionsDialog(const VersionsDialog&) = delete;
     VersionsDialog& operator=(const VersionsDialog&) = delete;
+    ~VersionsDialog();
 
     // Answers a message as a dialog procedure does. The first one must be WM_INITDIALOG.
     INT_PTR handleMessage(HWND window, UINT message, WPARAM wParam, LPARAM lParam);
@@ -57,6 +60,7 @@ class VersionsDialog : public std::enable_shared_from_this<VersionsDialog> {
     }
     HWND list() const;
 
+    ModuleLock lock_;
     HWND window_ = nullptr;
     PathSet paths_;
     wxString singleFile_;

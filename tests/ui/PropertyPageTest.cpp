@@ -98,5 +98,40 @@ TEST_F(PropertyPageTest, LivesAndGoesWithItsSheet)
     }
 }
 
+// The sheet, and when its page asks a question: only its own thread can destroy it.
+HWND questionedSheet;
+int countInside;
+
+void CALLBACK destroyDuringQuestion(HWND, UINT, UINT_PTR timer, DWORD)
+{
+    const HWND box = FindWindowW(L"#32770", L"Tavi Remote Backup");
+    if (!box)
+        return;
+    KillTimer(nullptr, timer);
+    DestroyWindow(questionedSheet);
+    countInside = moduleRefCount();
+    PostMessageW(box, WM_COMMAND, IDCANCEL, 0);
+}
+
+TEST_F(PropertyPageTest, CountsUntilItsLastFrameHasReturned)
+{
+    Pages pages;
+    offer(pages, {L"C:\\f"});
+    PROPSHEETHEADERW header{};
+    header.dwSize = sizeof(header);
+    header.dwFlags = PSH_MODELESS;
+    header.nPages = 1;
+    header.phpage = pages.handles.data();
+    questionedSheet = reinterpret_cast<HWND>(PropertySheetW(&header));
+    const auto page = reinterpret_cast<HWND>(SendMessageW(questionedSheet, PSM_GETCURRENTPAGEHWND, 0, 0));
+    countInside = -1;
+    SetTimer(nullptr, 0, 10, destroyDuringQuestion);
+    // Returns when the box has gone.
+    SendMessageW(page, WM_COMMAND, TAVI_VERSIONS_RESTORE, 0);
+    EXPECT_FALSE(IsWindow(questionedSheet));
+    EXPECT_EQ(countInside, 1) << "the frames of the question";
+    EXPECT_EQ(moduleRefCount(), 0);
+}
+
 } // namespace
 } // namespace tavi
