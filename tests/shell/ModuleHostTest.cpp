@@ -16,6 +16,7 @@
 #include <gtest/gtest.h>
 
 #include "core/Handles.h"
+#include "core/Module.h"
 #include "core/Text.h"
 #include "shell/ClassIds.h"
 #include "statedb/Database.h"
@@ -23,6 +24,7 @@
 #include "tests/support/Counts.h"
 #include "tests/support/Pipes.h"
 #include "tests/support/Registry.h"
+#include "ui/PropertyPage.h"
 
 namespace tavi {
 namespace {
@@ -241,6 +243,31 @@ TEST_F(ModuleHost, TwentyRoundsOfLoadAndUnloadLeaveNothingBehind)
     for (std::size_t i = 0; i < after.size(); ++i)
         EXPECT_TRUE(before[i] > 0 && after[i] <= before[i] + allowed[i])
             << i << ": " << before[i] << " to " << after[i];
+}
+
+BOOL CALLBACK takePage(HPROPSHEETPAGE offered, LPARAM taken)
+{
+    *reinterpret_cast<HPROPSHEETPAGE*>(taken) = offered;
+    return TRUE;
+}
+
+TEST_F(ModuleHost, TheEndOfAPageLetsComFreeWhatNobodyUses)
+{
+    wxRegKey approved(L"HKLM\\Software\\Microsoft\\Windows\\CurrentVersion\\Shell Extensions\\Approved");
+    approved.Create();
+    EXPECT_EQ(LoadedModule().registerServer(), S_OK);
+    ComPtr<IClassFactory> factory;
+    EXPECT_EQ(CoGetClassObject(kShellExtClassId, CLSCTX_INPROC_SERVER, nullptr, IID_IClassFactory, factory.outVoid()),
+              S_OK);
+    factory = {};
+    // The page is this program's own; the module is a library that COM has loaded for it.
+    setModuleInstance(GetModuleHandleW(nullptr));
+    HPROPSHEETPAGE page = nullptr;
+    addPropertyPage({{L"C:\\f"}, 0, 1, false, {}}, test::held(Manifest::Parse(L"FILES\nC:\\f\n1:1:1:1:0::0:0")),
+                    takePage, reinterpret_cast<LPARAM>(&page));
+    EXPECT_TRUE(GetModuleHandleW(L"tavishell.dll"));
+    DestroyPropertySheetPage(page);
+    EXPECT_TRUE(moduleGoesWithin(5000));
 }
 
 TEST_F(ModuleHost, RegistersAndLeavesTheRequiredKeysBehind)
