@@ -7,6 +7,8 @@ if(NOT TAVI_DEPS)
     message(FATAL_ERROR "TAVI_DEPS is not set: build with scripts/build")
 endif()
 
+include(cmake/hardening.cmake)
+
 add_library(tavi_platform INTERFACE)
 target_compile_definitions(tavi_platform INTERFACE UNICODE _UNICODE _WIN32_WINNT=0x0600 WINVER=0x0600 NOMINMAX
     WIN32_LEAN_AND_MEAN __WXMSW__ wxUSE_GUI=0 wxDEBUG_LEVEL=0)

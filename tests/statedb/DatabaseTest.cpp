@@ -63,6 +63,19 @@ TEST(Database, ReportsMisuseAndFailures)
         EXPECT_EQ(thrownBy(action), expected);
 }
 
+#ifdef _WIN32 // The native tests use the system's library.
+TEST(Database, TrustsNeitherSchemaNorPages)
+{
+    DbConnection connection = opened();
+    const std::pair<const char*, int> settings[] = {{"PRAGMA trusted_schema", 0}, {"PRAGMA cell_size_check", 1}};
+    for (const auto& [question, expected] : settings)
+        EXPECT_EQ(connection.execQuery(question).fieldInt(0, -1), expected) << question;
+    connection.execDML("PRAGMA writable_schema=1");
+    EXPECT_EQ(thrownBy([&] { connection.execDML("DELETE FROM sqlite_master"); }),
+              L"DB_ERROR[1]: table sqlite_master may not be modified");
+}
+#endif
+
 TEST(Database, WalksRowsAndKeepsBindings)
 {
     DbConnection connection = opened();
