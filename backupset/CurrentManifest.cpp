@@ -109,7 +109,8 @@ void StopManifestWatcher() noexcept
     // The wait is for a start in progress, not for the thread, and the mutex stays taken: nothing may start after this.
     if (isWatcherActive())
         WaitForSingleObject(manifestMutex.get(), INFINITE);
-    KernelHandle(watcherThread.releaseHandle());
+    if (const HANDLE thread = watcherThread.releaseHandle())
+        CloseHandle(thread);
     watcher.manifest.replace(nullptr);
     replaceMenuManifest(nullptr);
     DropGraylist();
