@@ -1,7 +1,5 @@
 #include "link/PipeIo.h"
 
-#include <wx/log.h>
-
 namespace tavi {
 namespace {
 
@@ -74,11 +72,7 @@ bool writeMessage(HANDLE pipe, std::unique_ptr<PipeMessage>& message)
     DWORD written = 0;
     if (!buffer->data() || !WriteFile(pipe, buffer->data(), buffer->length(), &written, nullptr))
         return false;
-    try {
-        message.reset();
-    } catch (...) {
-        wxLogError("Unhandled exception deleting pipe message.");
-    }
+    message.reset();
     return true;
 }
 

@@ -93,13 +93,18 @@ void listenToStatus(const StopCheck& stopCheck)
         }
         const DWORD start = GetTickCount();
         // One message too many for the memory there is must not silence the rest.
-        guarded("status connection", [&] { followConnection(pipe.get(), stopCheck); });
+        const bool survived = guarded("status connection", false, [&] {
+            followConnection(pipe.get(), stopCheck);
+            return true;
+        });
         pipe = FileHandle();
         if (stopCheck())
             return;
-        // The next attempt follows at once; but a peer that hangs up before the first pause of the reader must not make
-        // that a busy loop.
-        if (GetTickCount() == start)
+        // The next attempt follows at once, unless this one has logged an error: its cause is likely still there. A
+        // peer that hangs up before the first pause of the reader must not make that a busy loop.
+        if (!survived)
+            waitForRetry(stopCheck);
+        else if (GetTickCount() == start)
             Sleep(kHangUpMilliseconds);
     }
 }

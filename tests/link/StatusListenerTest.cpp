@@ -82,19 +82,24 @@ TEST(StatusListener, FollowsTheServiceThroughWhateverItSends)
     EXPECT_EQ(status.restoreTotal, 0);
 }
 
-TEST(StatusListener, WaitsForAServiceThatIsNotThere)
+TEST(StatusListener, WaitsForAServiceThatIsNotThereAndAfterAnException)
 {
-    const DWORD start = GetTickCount();
+    LogCapture log;
+    setMessageSink([](std::unique_ptr<PipeMessage>) { throw std::bad_alloc(); });
+    DWORD start = GetTickCount();
     {
         Listener listener;
         Sleep(200);
-        const PipeServer server(kStatus, PIPE_ACCESS_OUTBOUND);
-        EXPECT_TRUE(server.waitClient());
+        const PipeServer servers[] = {{kStatus, PIPE_ACCESS_OUTBOUND, 2}, {kStatus, PIPE_ACCESS_OUTBOUND, 2}};
+        EXPECT_TRUE(servers[0].waitClient());
         EXPECT_GT(GetTickCount() - start, 4500u);
-        server.hangUp();
-        EXPECT_TRUE(server.waitClient());
-        server.hangUp();
+        start = GetTickCount();
+        servers[0].write(frame(52, 0));
+        EXPECT_TRUE(servers[1].waitClient());
+        EXPECT_GT(GetTickCount() - start, 4500u);
     }
+    setMessageSink(nullptr);
+    EXPECT_EQ(log.take().size(), 1u);
     // The end is not kept waiting by the pause between two attempts.
     const DWORD stop = GetTickCount();
     {
@@ -111,13 +116,23 @@ TEST(CommandPipe, SendsOneFrameAndHangsUp)
     EXPECT_FALSE(CommandPipe::sendCommand(command));
     EXPECT_TRUE(command) << "left as it is when the pipe cannot be opened";
     EXPECT_EQ(log.take(), std::vector<std::string>{"1: Error: Unable to open command pipe: 2"});
-    const PipeServer server(kCommand, PIPE_ACCESS_INBOUND);
-    EXPECT_TRUE(CommandPipe::sendCommand(command));
+    {
+        const PipeServer server(kCommand, PIPE_ACCESS_INBOUND);
+        EXPECT_TRUE(CommandPipe::sendCommand(command));
+        EXPECT_FALSE(command);
+        command = CommandPipe::CancelRestore();
+        EXPECT_FALSE(CommandPipe::sendCommand(command));
+        EXPECT_EQ(log.take(), std::vector<std::string>{"1: Error: Unable to open command pipe: 231"});
+        EXPECT_EQ(hex(server.readAll()), "3400000014000000" + std::string(40, '0'));
+    }
+    // A write that fails: nobody reads, and then nobody is there.
+    const PipeServer deaf(kCommand, PIPE_ACCESS_INBOUND, 1, 0);
+    std::thread writer([&] { EXPECT_FALSE(CommandPipe::sendCommand(command)); });
+    EXPECT_TRUE(deaf.waitClient());
+    deaf.hangUp();
+    writer.join();
     EXPECT_FALSE(command);
-    command = CommandPipe::CancelRestore();
-    EXPECT_FALSE(CommandPipe::sendCommand(command));
-    EXPECT_EQ(log.take(), std::vector<std::string>{"1: Error: Unable to open command pipe: 231"});
-    EXPECT_EQ(hex(server.readAll()), "3400000014000000" + std::string(40, '0'));
+    EXPECT_TRUE(log.take().empty());
 }
 
 TEST(PipeIo, ReadsWithAndWithoutOverlap)
@@ -145,6 +160,9 @@ TEST(PipeIo, ReadsWithAndWithoutOverlap)
         EXPECT_FALSE(message);
         server.hangUp();
         EXPECT_FALSE(readMessage(pipe.get(), &message, nullptr, form));
+        message = std::make_unique<EventMessage>(1);
+        EXPECT_FALSE(writeMessage(pipe.get(), message));
+        EXPECT_TRUE(message) << "left to the caller";
     }
 }
 

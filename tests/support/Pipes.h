@@ -12,8 +12,9 @@ namespace tavi::test {
 // The service's end of a pipe: one of as many instances as there are in all.
 class PipeServer {
   public:
-    PipeServer(const wchar_t* name, DWORD access, DWORD instances = 1)
-        : pipe_(CreateNamedPipeW(name, access, PIPE_TYPE_BYTE | PIPE_NOWAIT, instances, 65536, 65536, 0, nullptr))
+    // Without a buffer a client's write ends only when it is read.
+    PipeServer(const wchar_t* name, DWORD access, DWORD instances = 1, DWORD buffer = 65536)
+        : pipe_(CreateNamedPipeW(name, access, PIPE_TYPE_BYTE | PIPE_NOWAIT, instances, buffer, buffer, 0, nullptr))
     {
         EXPECT_TRUE(pipe_);
     }
