@@ -5,9 +5,6 @@
 namespace tavi {
 namespace {
 
-// Up to here an announced length is believed before anything of it is there: the longest path has less.
-constexpr std::uint32_t kTrustedLength = 128 * 1024;
-
 std::uint32_t u32At(const unsigned char* bytes) noexcept
 {
     return bytes[0] | std::uint32_t{bytes[1]} << 8 | std::uint32_t{bytes[2]} << 16 | std::uint32_t{bytes[3]} << 24;
@@ -48,7 +45,8 @@ std::unique_ptr<PipeMessage> readFrame(ByteSource& source, const StopCheck& stop
         if (stopped() || !source.peek(available))
             return nullptr;
     }
-    buffer->ensure(std::min(length, std::max(available, kTrustedLength)));
+    // A text count may reach to the end of the buffer: room for bytes that are not there would become text.
+    buffer->ensure(std::min(length, available));
     if (!buffer->data() || !source.startRead(buffer->data(), std::min(length, buffer->capacity())) ||
         !source.finishRead())
         return nullptr;

@@ -84,7 +84,7 @@ TEST(MessageReader, ReadsWhatPeersSend)
         {"no payload", {head}, false, 1, 8},
         {"an announced length of 0", {bytes("34000000 00000000"), body}, false, 1, 8},
         {"an unknown type", {bytes("1e000000 14000000") + body}, false, 1, 20},
-        {"a length of 0xffffffff", {bytes("34000000 ffffffff") + body}, true, 1, 129 * 1024},
+        {"a length of 0xffffffff", {bytes("34000000 ffffffff") + body}, true, 1, 1024},
         {"a length that is there", {bytes("34000000 00002000") + std::string(0x200000, '\0')}, true, 1, 0x200000},
     };
     for (const auto& test : cases) {
