@@ -49,6 +49,10 @@ class PipeMessage {
 class EventMessage final : public PipeMessage {
   public:
     static constexpr std::uint32_t kSmallestPayload = 20;
+    // The types that a progress window acts on: a restore has begun, it has ended, its next item.
+    static constexpr std::uint32_t kRestoreStarted = 51;
+    static constexpr std::uint32_t kRestoreEnded = 52;
+    static constexpr std::uint32_t kItemText = 54;
 
     explicit EventMessage(std::uint32_t type);
     EventMessage(std::uint32_t type, std::uint32_t code, std::uint64_t value, std::uint32_t flag, MessageText text);

@@ -1,9 +1,7 @@
 #include "ui/RestoreProgressWindow.h"
 
-#include <algorithm>
 #include <mutex>
 #include <utility>
-#include <vector>
 
 #include <commctrl.h>
 #include <objbase.h>
@@ -30,58 +28,16 @@ constexpr UINT_PTR kTimer = 1;
 constexpr UINT kTimerMilliseconds = 250;
 constexpr DWORD kHiddenMilliseconds = 500;
 
-enum EventType : std::uint32_t { restoreStarted = 51, restoreEnded = 52, itemText = 54 };
-
 struct TheWindow {
     CriticalSection lock;
     std::shared_ptr<RestoreProgressWindow> window;
 };
 TheWindow theWindow;
 
-// The messages on their way to windows. A window takes only what was really sent to it, whoever else knows the message
-// number, and what it never came to take is freed with it.
-class MessageTray {
-  public:
-    PipeMessage* put(HWND window, std::unique_ptr<PipeMessage> message)
-    {
-        const std::lock_guard guard(lock_);
-        return sent_.emplace_back(window, std::move(message)).second.get();
-    }
-    std::unique_ptr<PipeMessage> take(const PipeMessage* message)
-    {
-        const std::lock_guard guard(lock_);
-        const auto found =
-            std::find_if(sent_.begin(), sent_.end(), [&](const Sent& sent) { return sent.second.get() == message; });
-        if (found == sent_.end())
-            return nullptr;
-        auto taken = std::move(found->second);
-        sent_.erase(found);
-        return taken;
-    }
-    void clear(HWND window)
-    {
-        const std::lock_guard guard(lock_);
-        sent_.erase(std::remove_if(sent_.begin(), sent_.end(), [&](const Sent& sent) { return sent.first == window; }),
-                    sent_.end());
-    }
-
-  private:
-    using Sent = std::pair<HWND, std::unique_ptr<PipeMessage>>;
-    CriticalSection lock_;
-    std::vector<Sent> sent_;
-};
-MessageTray messageTray;
-
-void deliver(std::unique_ptr<PipeMessage> message)
+void deliverToWindow(std::unique_ptr<PipeMessage> message)
 {
-    const auto window = RestoreProgressWindow::current();
-    const HWND dialog = window ? window->dialog() : nullptr;
-    if (!dialog)
-        return;
-    const PipeMessage* const sent = messageTray.put(dialog, std::move(message));
-    // Does not wait for the window.
-    if (!SendNotifyMessageW(dialog, kPipeMessage, 0, reinterpret_cast<LPARAM>(sent)))
-        messageTray.take(sent);
+    if (const auto window = RestoreProgressWindow::current())
+        window->deliver(std::move(message));
 }
 
 INT_PTR handleWithoutObject(HWND window, UINT message, LPARAM lParam)
@@ -92,7 +48,8 @@ INT_PTR handleWithoutObject(HWND window, UINT message, LPARAM lParam)
         PostQuitMessage(0);
         return TRUE;
     case kPipeMessage:
-        return messageTray.take(reinterpret_cast<const PipeMessage*>(lParam)) ? TRUE : FALSE;
+        // The message was destroyed with the object. The dialog manager's own message of that number has no lParam.
+        return lParam != 0 ? TRUE : FALSE;
     case kEndWindow:
     // Should the request not have come through.
     case WM_TIMER:
@@ -148,7 +105,6 @@ void runProgressWindow(void*)
     if (const auto object = RestoreProgressWindow::current(); !object || object->dialog() != window)
         DestroyWindow(window);
     runMessageLoop(window);
-    messageTray.clear(window);
     --moduleRefCount();
     CoFreeUnusedLibraries();
 }
@@ -160,7 +116,7 @@ void RestoreProgressWindow::getOrCreate()
     const std::lock_guard guard(theWindow.lock);
     if (!theWindow.window) {
         transferStatus();
-        setMessageSink(deliver);
+        setMessageSink(deliverToWindow);
         theWindow.window = std::make_shared<RestoreProgressWindow>();
         if (!KernelHandle(startModuleThread(runProgressWindow, nullptr))) {
             wxLogError("Unable to start the progress window (%lu)", GetLastError());
@@ -236,15 +192,17 @@ INT_PTR RestoreProgressWindow::handleMessage(HWND window, UINT message, WPARAM w
         return TRUE;
     case kPipeMessage:
         // The dialog manager has the same number for another message of its own, which carries none of ours.
-        if (const auto received = messageTray.take(reinterpret_cast<const PipeMessage*>(lParam))) {
-            handlePipeMessage(*received);
-            return TRUE;
-        }
-        return FALSE;
+        if (!acceptNotification(reinterpret_cast<const PipeMessage*>(lParam)))
+            return FALSE;
+        handlePending();
+        return TRUE;
     case WM_COMMAND:
+        // A failure to tell the service must not keep the window open.
         if (LOWORD(wParam) == TAVI_PROGRESS_CANCEL) {
-            auto command = CommandPipe::CancelRestore();
-            CommandPipe::sendCommand(command);
+            guarded("restore cancellation", [] {
+                auto command = CommandPipe::CancelRestore();
+                CommandPipe::sendCommand(command);
+            });
         }
         // Closing alone leaves the restore to go on at the service.
         if (LOWORD(wParam) == TAVI_PROGRESS_CANCEL || LOWORD(wParam) == TAVI_PROGRESS_CLOSE)
@@ -277,28 +235,68 @@ void RestoreProgressWindow::initialize(HWND window)
     placeWindow(window, nullptr);
 }
 
-void RestoreProgressWindow::handlePipeMessage(const PipeMessage& message)
+void RestoreProgressWindow::deliver(std::unique_ptr<PipeMessage> message)
 {
-    if (message.kind() == MessageKind::event) {
-        handleEvent(static_cast<const EventMessage&>(message));
-    } else if (message.kind() == MessageKind::snapshot) {
-        position_ = 0;
-        remainingLine_.clear();
-        statusLine_.clear();
-        refresh();
+    const HWND dialog = dialog_;
+    if (!dialog)
+        return;
+    const PipeMessage* notification = nullptr;
+    {
+        const std::lock_guard guard(pendingLock_);
+        notification = pending_.put(std::move(message));
+    }
+    // Does not wait for the window.
+    if (notification && !SendNotifyMessageW(dialog, kPipeMessage, 0, reinterpret_cast<LPARAM>(notification))) {
+        const std::lock_guard guard(pendingLock_);
+        pending_.clear();
     }
 }
 
-void RestoreProgressWindow::handleEvent(const EventMessage& event)
+bool RestoreProgressWindow::acceptNotification(const PipeMessage* notification)
 {
-    switch (event.type()) {
-    case restoreEnded:
+    const std::lock_guard guard(pendingLock_);
+    return pending_.accept(notification);
+}
+
+std::unique_ptr<PipeMessage> RestoreProgressWindow::takePending()
+{
+    const std::lock_guard guard(pendingLock_);
+    return pending_.take();
+}
+
+void RestoreProgressWindow::handlePending()
+{
+    // With no reference but the caller's the window is ending: the rest is destroyed with the object.
+    while (refs_ > 1) {
+        const auto message = takePending();
+        if (!message)
+            break;
+        handlePipeMessage(*message);
+    }
+    // The status is already past all of these messages.
+    refresh();
+}
+
+void RestoreProgressWindow::handlePipeMessage(const PipeMessage& message)
+{
+    if (message.kind() == MessageKind::event) {
+        handleEvent(message.type());
+    } else if (message.kind() == MessageKind::snapshot) {
+        beginAnew();
+    }
+}
+
+void RestoreProgressWindow::handleEvent(std::uint32_t type)
+{
+    switch (type) {
+    case EventMessage::kRestoreEnded:
         release();
         [[fallthrough]];
-    case restoreStarted:
+    case EventMessage::kRestoreStarted:
         beginAnew();
+        awaitingFirstItem_ = true;
         break;
-    case itemText:
+    case EventMessage::kItemText:
         // The speed counts from the first item and not from the search for it.
         if (std::exchange(awaitingFirstItem_, false))
             transferStatus().restoreRing.clearRing();
@@ -314,8 +312,6 @@ void RestoreProgressWindow::beginAnew()
     position_ = 0;
     remainingLine_.clear();
     statusLine_.clear();
-    awaitingFirstItem_ = true;
-    refresh();
 }
 
 void RestoreProgressWindow::showText(int control, wxString& shown, const wxString& text)

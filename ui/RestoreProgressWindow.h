@@ -8,12 +8,11 @@
 #include <windows.h>
 #include <wx/string.h>
 
+#include "core/CriticalSection.h"
 #include "core/Module.h"
+#include "link/PendingMessages.h"
 
 namespace tavi {
-
-class EventMessage;
-class PipeMessage;
 
 // The "Restoring..." window, at most one in the process, with a thread and a message loop of its own: the shell's
 // threads that ask for it must not be kept. It follows the transfer status and cancels the restore on request.
@@ -61,6 +60,9 @@ class RestoreProgressWindow {
     {
         return dialog_;
     }
+    // Adds a message for the window to handle and notifies it, without waiting. Destroys the message when there is no
+    // window. Messages that the window never handles are destroyed with this object. Any thread.
+    void deliver(std::unique_ptr<PipeMessage> message);
 
     // Below: the window's thread.
     bool adoptDialog(HWND dialog);
@@ -71,8 +73,11 @@ class RestoreProgressWindow {
     void destroy(HWND window);
     bool isRegistered() const;
     void initialize(HWND window);
+    bool acceptNotification(const PipeMessage* notification);
+    std::unique_ptr<PipeMessage> takePending();
+    void handlePending();
     void handlePipeMessage(const PipeMessage& message);
-    void handleEvent(const EventMessage& event);
+    void handleEvent(std::uint32_t type);
     void beginAnew();
     void refresh();
     void showText(int control, wxString& shown, const wxString& text);
@@ -85,6 +90,8 @@ class RestoreProgressWindow {
     wxString speedLine_;
     std::int32_t position_ = 0;
     bool awaitingFirstItem_ = false;
+    CriticalSection pendingLock_;
+    PendingMessages pending_;
     std::optional<ModuleLock> lock_{std::in_place};
 };
 
