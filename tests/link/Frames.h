@@ -3,6 +3,8 @@
 #include <cstdio>
 #include <string>
 
+#include "link/PipeMessage.h"
+
 // Frames as readable tables: two hexadecimal digits a byte, blanks anywhere.
 namespace tavi::test {
 
@@ -29,6 +31,18 @@ inline std::string hex(const std::string& text)
         out += pair;
     }
     return out;
+}
+
+inline MessageText text(const wxString& content)
+{
+    return std::make_shared<const wxString>(content);
+}
+
+inline std::string serialised(const PipeMessage& message)
+{
+    const HeldBuffer buffer;
+    message.serialise(*buffer);
+    return {reinterpret_cast<const char*>(buffer->data()), buffer->length()};
 }
 
 } // namespace tavi::test

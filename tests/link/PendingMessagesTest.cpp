@@ -5,6 +5,8 @@
 
 #include <gtest/gtest.h>
 
+#include "tests/link/Frames.h"
+
 namespace tavi {
 namespace {
 
@@ -12,7 +14,7 @@ constexpr std::size_t kMax = PendingMessages::kMaxCount;
 
 std::unique_ptr<PipeMessage> event(std::uint32_t type, std::uint64_t value = 0, const wxString& text = wxString())
 {
-    return std::make_unique<EventMessage>(type, 0, value, 0, std::make_shared<const wxString>(text));
+    return std::make_unique<EventMessage>(type, 0, value, 0, test::text(text));
 }
 
 TEST(PendingMessages, LoseTheOldestTextsAndAmountsOnly)

@@ -1,6 +1,7 @@
 #include "link/PipeMessage.h"
 
 #include <cstring>
+#include <map>
 
 #include <gtest/gtest.h>
 
@@ -9,20 +10,7 @@
 namespace tavi {
 namespace {
 
-using test::bytes;
-using test::hex;
-
-MessageText text(const wxString& content)
-{
-    return std::make_shared<const wxString>(content);
-}
-
-std::string serialised(const PipeMessage& message)
-{
-    const HeldBuffer buffer;
-    message.serialise(*buffer);
-    return {reinterpret_cast<const char*>(buffer->data()), buffer->length()};
-}
+using namespace test;
 
 // A payload as a reader leaves it in the buffer.
 std::unique_ptr<PipeMessage> created(std::uint32_t type, const std::string& payload, std::uint32_t length)
@@ -67,17 +55,13 @@ TEST(PipeMessage, EveryKindKeepsItsLayoutInBothDirections)
 TEST(PipeMessage, TypesAndShortestPayloadsDecideWhatIsMade)
 {
     const std::string zeros(64, '\0');
+    // Kind and shortest payload; 0 to 57 are events but for these and the unused ones.
+    const std::map<std::uint32_t, std::pair<std::uint32_t, std::uint32_t>> special = {
+        {20, {1, 36}}, {21, {2, 16}}, {22, {3, 12}}, {23, {4, 24}}};
     for (std::uint32_t type = 0; type <= 60; ++type) {
         const bool unused =
             (type >= 26 && type <= 31) || type == 37 || type == 38 || (type >= 41 && type <= 50) || type > 57;
-        const struct {
-            std::uint32_t type, kind, least;
-        } special[] = {{20, 1, 36}, {21, 2, 16}, {22, 3, 12}, {23, 4, 24}};
-        std::uint32_t kind = 0, least = 20;
-        for (const auto& row : special) {
-            if (row.type == type)
-                kind = row.kind, least = row.least;
-        }
+        const auto [kind, least] = special.count(type) ? special.at(type) : std::pair(0u, 20u);
         EXPECT_FALSE(created(type, zeros, least - 1)) << type;
         for (const std::uint32_t length : {least, least + 4}) {
             const auto message = created(type, zeros, length);

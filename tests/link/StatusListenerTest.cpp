@@ -20,9 +20,7 @@ constexpr const wchar_t* kCommand = L"\\\\.\\pipe\\tavibackup";
 
 std::string frame(std::uint32_t type, std::uint64_t value)
 {
-    const HeldBuffer buffer;
-    EventMessage(type, 0, value, 0, std::make_shared<const wxString>()).serialise(*buffer);
-    return {reinterpret_cast<const char*>(buffer->data()), buffer->length()};
+    return serialised(EventMessage(type, 0, value, 0, text(L"")));
 }
 
 class Listener {

@@ -32,7 +32,7 @@ struct Watch {
     static LRESULT CALLBACK handle(HWND window, UINT message, WPARAM wParam, LPARAM lParam)
     {
         shown += message == WM_SHOWWINDOW && wParam ? 1 : 0;
-        notified += message == WM_USER + 1 ? 1 : 0;
+        notified += message == WM_USER + 1 && lParam ? 1 : 0;
         if (message == kWait)
             waits = true, waitUntil([] { return !waits; });
         return CallWindowProcW(procedure, window, message, wParam, lParam);
@@ -44,12 +44,14 @@ struct RestoreProgressWindowTest : UiTest {
     {
         dispatch(std::make_unique<EventMessage>(52));
     }
-    static void tell(std::uint32_t type, std::uint64_t value = 0, const wxString& text = wxString())
+    static void tell(std::uint32_t type, std::uint64_t value = 0, const MessageText& item = text(L""))
     {
-        dispatch(std::make_unique<EventMessage>(type, 0, value, 0, std::make_shared<const wxString>(text)));
+        dispatch(std::make_unique<EventMessage>(type, 0, value, 0, item));
     }
-    static HWND hiddenDialog()
+    // Asks for the window and returns it still hidden.
+    static HWND opened()
     {
+        RestoreProgressWindow::getOrCreate();
         HWND dialog = nullptr;
         waitUntil([&] {
             const auto window = RestoreProgressWindow::current();
@@ -58,11 +60,10 @@ struct RestoreProgressWindowTest : UiTest {
         });
         return dialog;
     }
-    static bool shows(HWND dialog, int control, const std::wstring& text)
+    static void shows(HWND dialog, int control, const std::wstring& content)
     {
-        const bool found = waitUntil([&] { return controlText(dialog, control) == text; });
-        EXPECT_EQ(controlText(dialog, control), text);
-        return found;
+        waitUntil([&] { return controlText(dialog, control) == content; });
+        EXPECT_EQ(controlText(dialog, control), content);
     }
     static LRESULT position(HWND dialog)
     {
@@ -77,8 +78,7 @@ struct RestoreProgressWindowTest : UiTest {
 TEST_F(RestoreProgressWindowTest, FollowsARestoreToItsEnd)
 {
     const DWORD start = GetTickCount();
-    RestoreProgressWindow::getOrCreate();
-    const HWND dialog = hiddenDialog();
+    const HWND dialog = opened();
     const Watch watch(dialog);
     EXPECT_FALSE(IsWindowVisible(dialog));
     EXPECT_EQ(moduleRefCount(), 2);
@@ -93,12 +93,12 @@ TEST_F(RestoreProgressWindowTest, FollowsARestoreToItsEnd)
     shows(dialog, TAVI_PROGRESS_STATUS, L"Finding file on server...");
     tell(56, 1 << 30); // found before the first item: not part of its speed
     tell(53, 1000);
-    tell(54, 0, L"C:\\d\\A & B.txt");
+    tell(54, 0, text(L"C:\\d\\A & B.txt"));
     shows(dialog, TAVI_PROGRESS_STATUS, L"C:\\d\\A & B.txt");
     EXPECT_EQ(transferStatus().restoreRing.rateOver(60000), 0);
     tell(56, 500);
     EXPECT_TRUE(waitUntil([&] { return position(dialog) == 125; }));
-    tell(54, 0, L"C:\\d\\B.txt");
+    tell(54, 0, text(L"C:\\d\\B.txt"));
     shows(dialog, TAVI_PROGRESS_STATUS, L"C:\\d\\B.txt");
     EXPECT_TRUE(waitUntil([&] { return transferStatus().restoreSpeed() > 0; })) << "only the first item clears it";
     transferStatus().restoreRateLong = 1000;
@@ -109,7 +109,7 @@ TEST_F(RestoreProgressWindowTest, FollowsARestoreToItsEnd)
 
     // A second restore joins; its start leaves the bar where it is until an amount moves it.
     RestoreProgressWindow::getOrCreate();
-    tell(54, 0, L"last");
+    tell(54, 0, text(L"last"));
     shows(dialog, TAVI_PROGRESS_STATUS, L"last");
     tell(52);
     tell(51);
@@ -127,16 +127,16 @@ TEST_F(RestoreProgressWindowTest, FollowsARestoreToItsEnd)
 
 TEST_F(RestoreProgressWindowTest, EndsUnseenWhenTheRestoreIsQuick)
 {
-    RestoreProgressWindow::getOrCreate();
-    const HWND dialog = hiddenDialog();
+    const DWORD start = GetTickCount();
+    const HWND dialog = opened();
     const Watch watch(dialog);
-    EXPECT_FALSE(IsWindowVisible(dialog));
+    const bool hidden = !IsWindowVisible(dialog);
     tell(51);
     Sleep(300); // a tick of its timer
     tell(52);
     EXPECT_TRUE(gone(dialog));
-    EXPECT_EQ(watch.shown, 0);
-    EXPECT_EQ(transferStatus().restoreStarted, false);
+    EXPECT_TRUE((hidden && watch.shown == 0) || GetTickCount() - start >= 500) << "a busy machine may be slower";
+    EXPECT_FALSE(transferStatus().restoreStarted);
 }
 
 // Without a dialog nothing handles messages; the object stays for the restores that hold it.
@@ -148,8 +148,8 @@ TEST_F(RestoreProgressWindowTest, StaysRegisteredThoughItsDialogCannotBeMade)
     RestoreProgressWindow::getOrCreate();
     EXPECT_TRUE(waitUntil([&] { return threads() == before; }));
     EXPECT_EQ(log.take().size(), 1u);
-    const auto item = std::make_shared<const wxString>(L"item");
-    dispatch(std::make_unique<EventMessage>(54, 0, 0, 0, item));
+    const auto item = text(L"item");
+    tell(54, 0, item);
     EXPECT_EQ(item.use_count(), 1);
     EXPECT_EQ(moduleRefCount(), 2);
     RestoreProgressWindow::current()->handleMessage(nullptr, WM_DESTROY, 0, 0);
@@ -161,13 +161,12 @@ TEST_F(RestoreProgressWindowTest, HoldsFewMessagesWhileNobodyReadsItsCancel)
 {
     for (const bool reads : {true, false}) {
         const PipeServer server(kCommand, PIPE_ACCESS_INBOUND, 1, 0);
-        RestoreProgressWindow::getOrCreate();
-        const HWND dialog = hiddenDialog();
+        const HWND dialog = opened();
         PostMessageW(dialog, WM_COMMAND, TAVI_PROGRESS_CANCEL, 0);
         ASSERT_TRUE(server.waitClient());
-        const auto item = std::make_shared<const wxString>(L"item");
+        const auto item = text(L"item");
         for (int round = 0; round < 50000; ++round)
-            dispatch(std::make_unique<EventMessage>(round % 100 == 0 ? 51 : 54, 0, 0, 0, item));
+            tell(round % 100 == 0 ? 51 : 54, 0, item);
         EXPECT_GT(item.use_count(), 1) << "it is stuck in its write";
         EXPECT_LE(item.use_count(), 1001);
         reads ? static_cast<void>(server.readAll()) : server.hangUp();
@@ -181,8 +180,7 @@ TEST_F(RestoreProgressWindowTest, CatchesUpInOneGoAfterItWasBusy)
 {
     translate("Finding file on server...", "Sucht die Datei...");
     RestoreProgressWindow::getOrCreate();
-    RestoreProgressWindow::getOrCreate();
-    const HWND dialog = hiddenDialog();
+    const HWND dialog = opened();
     const Watch watch(dialog);
     SendNotifyMessageW(dialog, Watch::kWait, 0, 0);
     ASSERT_TRUE(waitUntil([] { return Watch::waits.load(); }));
@@ -227,8 +225,7 @@ TEST_F(RestoreProgressWindowTest, ButtonsCloseItAtOnceAndOnlyCancelCancels)
         if (test.serviceRuns)
             server.emplace(kCommand, DWORD{PIPE_ACCESS_INBOUND});
         RestoreProgressWindow::getOrCreate();
-        RestoreProgressWindow::getOrCreate();
-        const HWND dialog = hiddenDialog();
+        const HWND dialog = opened();
         tell(51);
         wxLog* const before = wxLog::SetActiveTarget(&failing);
         PostMessageW(dialog, test.message, test.command, 0);
@@ -236,7 +233,7 @@ TEST_F(RestoreProgressWindowTest, ButtonsCloseItAtOnceAndOnlyCancelCancels)
         wxLog::SetActiveTarget(before);
         EXPECT_EQ(failing.lines, test.serviceRuns ? 0 : 2);
         EXPECT_TRUE(transferStatus().restoreStarted);
-        tell(54, 0, L"later"); // nobody is there to take it
+        tell(54, 0, text(L"later")); // nobody is there to take it
         if (test.received) {
             EXPECT_EQ(hex(server->readAll()), test.received + std::string(40, '0'));
         } else if (server) {
