@@ -30,38 +30,33 @@ void event(TransferStatus& status, std::uint32_t type, std::uint64_t value = 0, 
 // Whatever is set, by name.
 using Picture = std::map<std::string, std::string>;
 
-Picture pictureOf(const TransferStatus& status)
+Picture pictureOf(const TransferStatus& s)
 {
     const auto bytes = [](const RateRing& ring) { return ring.rateOver(100000) * 1000; };
-    const auto flag = [](bool on) { return on ? 1.0 : 0.0; };
-    const auto amount = [](std::int64_t value) { return static_cast<double>(value); };
-    const auto& s = status;
-    const struct {
-        const char* names;
-        std::vector<double> values;
-    } groups[] = {{"ringA ringB ring short long rates",
-                   {bytes(s.ringA), bytes(s.ringB), bytes(s.restoreRing), s.restoreRateShort, s.restoreRateLong,
-                    s.rate0 + s.rate1 + s.rate2}},
-                  {"ended started ended3 34 32 39 24 mark",
-                   {flag(s.ended), flag(s.restoreStarted), flag(s.ended3), flag(s.switch34), flag(s.switch32),
-                    flag(s.switch39), flag(s.switch24), flag(s.mark10)}},
-                  {"ended10 ended4 ended6 ended8 ended5 ended9",
-                   {flag(s.ended10), flag(s.ended4), flag(s.ended6), flag(s.ended8), flag(s.ended5), flag(s.ended9)}},
-                  {"totalA totalB total doneA doneB done",
-                   {amount(s.totalA), amount(s.totalB), amount(s.restoreTotal), amount(s.doneA), amount(s.doneB),
-                    amount(s.restoreDone)}}};
+    const auto n = [](const auto& field) { return static_cast<double>(field.load()); };
+    std::istringstream names("ringA ringB ring short long rates ended started ended3 34 32 39 24 mark ended10 ended4 "
+                             "ended6 ended8 ended5 ended9 totalA totalB total doneA doneB done");
     Picture picture;
-    for (const auto& group : groups) {
-        std::istringstream names(group.names);
-        for (const double value : group.values) {
-            std::string name;
-            names >> name;
-            if (value != 0)
-                picture[name] = std::to_string(static_cast<int>(value));
-        }
+    for (const double value : {bytes(s.ringA),       bytes(s.ringB),
+                               bytes(s.restoreRing), n(s.restoreRateShort),
+                               n(s.restoreRateLong), n(s.rate0) + n(s.rate1) + n(s.rate2),
+                               n(s.ended),           n(s.restoreStarted),
+                               n(s.ended3),          n(s.switch34),
+                               n(s.switch32),        n(s.switch39),
+                               n(s.switch24),        n(s.mark10),
+                               n(s.ended10),         n(s.ended4),
+                               n(s.ended6),          n(s.ended8),
+                               n(s.ended5),          n(s.ended9),
+                               n(s.totalA),          n(s.totalB),
+                               n(s.restoreTotal),    n(s.doneA),
+                               n(s.doneB),           n(s.restoreDone)}) {
+        std::string name;
+        names >> name;
+        if (value != 0)
+            picture[name] = std::to_string(static_cast<int>(value));
     }
     for (const auto& [name, content] :
-         {std::pair("A", &status.statusTextA), {"B", &status.statusTextB}, {"text", &status.restoreText}}) {
+         {std::pair("A", &s.statusTextA), {"B", &s.statusTextB}, {"text", &s.restoreText}}) {
         if (!content->get().empty())
             picture[name] = content->get().utf8_string();
     }
