@@ -87,6 +87,18 @@ std::wstring dateText(const FILETIME& time)
     return std::wstring(date) + L" " + clock;
 }
 
+void runAction(std::function<void()>* action, bool owned)
+{
+    const std::unique_ptr<std::function<void()>> handedOver(owned ? action : nullptr);
+    (*action)();
+}
+
+BOOL CALLBACK keepPage(HPROPSHEETPAGE page, LPARAM kept)
+{
+    *reinterpret_cast<HPROPSHEETPAGE*>(kept) = page;
+    return TRUE;
+}
+
 } // namespace
 
 FolderWindow::~FolderWindow()
@@ -187,7 +199,7 @@ LRESULT FolderWindow::respond(UINT message, WPARAM wParam, LPARAM lParam)
         CoFreeUnusedLibraries();
         return 0;
     case kRunMessage:
-        (*reinterpret_cast<std::function<void()>*>(lParam))();
+        runAction(reinterpret_cast<std::function<void()>*>(lParam), wParam == TRUE);
         return 0;
     case WM_DESTROY:
         PostQuitMessage(0);
@@ -539,21 +551,28 @@ int FolderWindow::chosenItem() const
     return focused >= 0 ? focused : nextSelected(-1);
 }
 
-std::unique_ptr<ShellMenu> FolderWindow::makeMenu(bool background)
+// The item that chooses the handlers comes first.
+std::vector<LPCITEMIDLIST> FolderWindow::selectedItems() const
 {
     std::vector<LPCITEMIDLIST> selected;
-    MenuTarget target = MenuTarget::background;
     const int chooser = chosenItem();
-    if (!background && chooser >= 0) {
-        target = folder_.path.empty()                                 ? MenuTarget::drive
-                 : items_[static_cast<std::size_t>(chooser)].isFolder ? MenuTarget::folder
-                                                                      : MenuTarget::file;
+    if (chooser >= 0)
         selected.push_back(items_[static_cast<std::size_t>(chooser)].idList.get());
-        for (int index = nextSelected(-1); index >= 0; index = nextSelected(index)) {
-            if (index != chooser)
-                selected.push_back(items_[static_cast<std::size_t>(index)].idList.get());
-        }
+    for (int index = nextSelected(-1); index >= 0; index = nextSelected(index)) {
+        if (index != chooser)
+            selected.push_back(items_[static_cast<std::size_t>(index)].idList.get());
     }
+    return selected;
+}
+
+std::unique_ptr<ShellMenu> FolderWindow::makeMenu(bool background)
+{
+    const std::vector<LPCITEMIDLIST> selected = background ? std::vector<LPCITEMIDLIST>() : selectedItems();
+    MenuTarget target = MenuTarget::background;
+    if (!selected.empty())
+        target = folder_.path.empty()                                      ? MenuTarget::drive
+                 : items_[static_cast<std::size_t>(chosenItem())].isFolder ? MenuTarget::folder
+                                                                           : MenuTarget::file;
     auto menu = std::make_unique<ShellMenu>(window_, folder_, target, selected, output_);
     output_.line(target == MenuTarget::background ? L"menu of the background"
                                                   : L"menu of " + std::to_wstring(selected.size()) + L" selected");
@@ -581,6 +600,42 @@ void FolderWindow::invoke(bool background, const std::wstring& text)
     if (!chosen)
         throw Failure{L"the menu has no item " + text};
     perform(*menu, chosen);
+}
+
+HPROPSHEETPAGE FolderWindow::makePage(const std::wstring& classId)
+{
+    CLSID id = {};
+    check(CLSIDFromString(classId.c_str(), &id), L"no class " + classId);
+    ComPtr<IShellExtInit> handler;
+    check(CoCreateInstance(id, nullptr, CLSCTX_INPROC_SERVER, IID_IShellExtInit,
+                           reinterpret_cast<void**>(handler.GetAddressOf())),
+          L"no object of " + classId);
+    check(handler->Initialize(nullptr, dataObject(window_, folder_, selectedItems()).Get(), nullptr),
+          L"the handler refuses the selection");
+    ComPtr<IUnknown> primary;
+    check(handler.CopyTo(IID_IUnknown, reinterpret_cast<void**>(primary.GetAddressOf())), L"no primary table");
+    HPROPSHEETPAGE page = nullptr;
+    reinterpret_cast<IShellPropSheetExt*>(primary.Get())->AddPages(keepPage, reinterpret_cast<LPARAM>(&page));
+    if (!page)
+        throw Failure{L"no page for this selection"};
+    return page;
+}
+
+void FolderWindow::showPage(HPROPSHEETPAGE page)
+{
+    PROPSHEETHEADERW sheet = {};
+    sheet.dwSize = sizeof sheet;
+    sheet.dwFlags = PSH_NOAPPLYNOW;
+    sheet.hwndParent = window_;
+    sheet.pszCaption = L"Page";
+    sheet.nPages = 1;
+    sheet.phpage = &page;
+    PropertySheetW(&sheet);
+}
+
+void FolderWindow::stopFreeing()
+{
+    KillTimer(window_, kIdleTimer);
 }
 
 void FolderWindow::perform(const ShellMenu& menu, UINT chosen)

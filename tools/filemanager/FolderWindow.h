@@ -18,7 +18,7 @@ enum ControlId : int { listControl = 1000, statusControl, addressControl, upCont
 // thread may use.
 class FolderWindow {
   public:
-    // Runs a std::function<void()> that LPARAM points to.
+    // Runs a std::function<void()> that LPARAM points to; WPARAM TRUE hands it over.
     static constexpr UINT kRunMessage = WM_APP + 1;
 
     explicit FolderWindow(Output& output) : output_(output) {}
@@ -44,6 +44,13 @@ class FolderWindow {
     // Prints the menu, too.
     std::unique_ptr<ShellMenu> makeMenu(bool background);
     void invoke(bool background, const std::wstring& text);
+    // Makes the page that a handler's class has for the selection. No identifier leads to that table, which is the
+    // first of the object.
+    HPROPSHEETPAGE makePage(const std::wstring& classId);
+    // Returns when the sheet is closed, which owns the page.
+    void showPage(HPROPSHEETPAGE page);
+    // Stops the timer that has COM free unused servers.
+    void stopFreeing();
 
   private:
     struct Item {
@@ -72,6 +79,7 @@ class FolderWindow {
     std::size_t indexOf(const std::wstring& name) const;
     int nextSelected(int after) const;
     int chosenItem() const;
+    std::vector<LPCITEMIDLIST> selectedItems() const;
     void setSelected(int index, UINT state);
     void showMenu(POINT at);
     void perform(const ShellMenu& menu, UINT command);

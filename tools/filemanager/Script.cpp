@@ -6,6 +6,7 @@
 #include <winternl.h>
 
 #include <algorithm>
+#include <atomic>
 #include <cstdint>
 #include <cwchar>
 
@@ -13,7 +14,6 @@ namespace filemanager {
 namespace {
 
 constexpr DWORD kAnswerLimit = 60000;
-constexpr DWORD kMenuLimit = 5000;
 constexpr DWORD kPollMilliseconds = 10;
 
 std::wstring trimmed(const std::wstring& text)
@@ -135,13 +135,6 @@ void clickButton(HWND button)
     PostMessageW(button, BM_CLICK, 0, 0);
 }
 
-void setText(HWND control, const std::wstring& text)
-{
-    for (const HWND child : children(control))
-        control = classOf(child) == L"Edit" ? child : control;
-    ask(control, WM_SETTEXT, 0, text.data());
-}
-
 void selectRow(HWND list, int row)
 {
     const auto rows = static_cast<int>(ask(list, LVM_GETITEMCOUNT));
@@ -248,6 +241,22 @@ DWORD handleCount()
     return count;
 }
 
+std::wstring watchedLibrary;
+std::atomic<int> timesUnmapped{0};
+
+struct LibraryNotice {
+    ULONG flags;
+    const UNICODE_STRING* path;
+    const UNICODE_STRING* name;
+};
+
+// Called by the loader, under its lock.
+void CALLBACK noteLibrary(ULONG reason, const LibraryNotice* notice, void*)
+{
+    constexpr ULONG kUnmapped = 2;
+    timesUnmapped += reason == kUnmapped && lstrcmpiW(notice->name->Buffer, watchedLibrary.c_str()) == 0;
+}
+
 std::wstring objectCounts()
 {
     const std::size_t gdi = GetGuiResources(GetCurrentProcess(), GR_GDIOBJECTS);
@@ -263,17 +272,8 @@ std::wstring objectCounts()
     GetProcessMemoryInfo(GetCurrentProcess(), &memory, sizeof memory);
     return L"handles " + std::to_wstring(handles) + L", gdi " + std::to_wstring(gdi ? gdi : wineGdiObjects()) +
            L", threads " + std::to_wstring(threads) + L", memory " + std::to_wstring(memory.PagefileUsage / 1024) +
-           L" KB";
+           L" KB, unloads " + std::to_wstring(timesUnmapped.load());
 }
-
-struct KeyName {
-    const wchar_t* name;
-    WORD key;
-};
-constexpr KeyName kKeys[] = {
-    {L"ENTER", VK_RETURN}, {L"ESC", VK_ESCAPE}, {L"TAB", VK_TAB}, {L"BACK", VK_BACK}, {L"UP", VK_UP},
-    {L"DOWN", VK_DOWN},    {L"HOME", VK_HOME},  {L"END", VK_END}, {L"F5", VK_F5},     {L"MENU", VK_APPS},
-};
 
 } // namespace
 
@@ -284,29 +284,18 @@ const std::vector<Script::Command>& Script::commands()
     static const std::vector<Command> table = {
         {L"go", L"PATH", L"opens a folder; without PATH the list of drives", 0, 1,
          [](S& s, const A& a) { s.onWindow([&] { s.folder_.navigate(a.empty() ? L"" : a[0]); }); }},
-        {L"open", L"NAME", L"opens a folder of the list", 1, 1,
-         [](S& s, const A& a) { s.onWindow([&] { s.folder_.openItem(a[0]); }); }},
-        {L"up", L"", L"opens the parent folder", 0, 0, [](S& s, const A&) { s.onWindow([&] { s.folder_.up(); }); }},
-        {L"refresh", L"", L"reads the folder again", 0, 0,
-         [](S& s, const A&) { s.onWindow([&] { s.folder_.refresh(); }); }},
         {L"select", L"NAME | ...", L"selects these items and no other", 1, SIZE_MAX,
          [](S& s, const A& a) { s.onWindow([&] { s.folder_.select(a); }); }},
         {L"select-all", L"", L"selects every item", 0, 0,
          [](S& s, const A&) { s.onWindow([&] { s.folder_.selectAll(true); }); }},
         {L"select-none", L"", L"selects nothing", 0, 0,
          [](S& s, const A&) { s.onWindow([&] { s.folder_.selectAll(false); }); }},
-        {L"menu", L"", L"prints the menu of the selection, or of the background if nothing is selected", 0, 0,
-         [](S& s, const A&) { s.onWindow([&] { s.folder_.makeMenu(false); }); }},
+        {L"menu", L"", L"prints the menu of the selection, or of the background, and how long the handlers took", 0, 0,
+         [](S& s, const A&) { s.menu(); }},
         {L"menu-background", L"", L"prints the menu of the folder's background", 0, 0,
          [](S& s, const A&) { s.onWindow([&] { s.folder_.makeMenu(true); }); }},
-        {L"show-menu", L"", L"opens the menu on screen and goes on; press ESC closes it", 0, 0,
-         [](S& s, const A&) { s.showMenu(); }},
         {L"invoke", L"TEXT", L"invokes the item with this text of the menu of the selection", 1, 1,
          [](S& s, const A& a) { s.onWindow([&] { s.folder_.invoke(false, a[0]); }); }},
-        {L"invoke-background", L"TEXT", L"the same of the background's menu", 1, 1,
-         [](S& s, const A& a) { s.onWindow([&] { s.folder_.invoke(true, a[0]); }); }},
-        {L"press", L"KEY", L"ENTER ESC TAB BACK UP DOWN HOME END F5 MENU: to the open menu or to the focus", 1, 1,
-         [](S& s, const A& a) { s.press(a[0]); }},
         {L"wait", L"MS", L"waits", 1, 1, [](S& s, const A& a) { s.pause(milliseconds(a[0])); }},
         {L"wait-window", L"TITLE | MS", L"waits until a window with this title can be used", 2, 2,
          [](S& s, const A& a) {
@@ -327,10 +316,6 @@ const std::vector<Script::Command>& Script::commands()
          [](S& s, const A& a) { clickButton(s.control(a[0], a[1])); }},
         {L"select-row", L"TITLE | ID | ROW", L"selects a row of a list, from 0; -1 is the last", 3, 3,
          [](S& s, const A& a) { selectRow(s.control(a[0], a[1]), number(a[2])); }},
-        {L"set-text", L"TITLE | ID | TEXT", L"writes into an edit control, also one inside the named control", 3, 3,
-         [](S& s, const A& a) { setText(s.control(a[0], a[1]), a[2]); }},
-        {L"browse", L"TITLE | PATH", L"selects a folder in the system's folder browser", 2, 2,
-         [](S& s, const A& a) { ask(s.window(a[0]), BFFM_SETSELECTIONW, TRUE, a[1].data()); }},
         {L"close-window", L"TITLE", L"closes a window", 1, 1,
          [](S& s, const A& a) { PostMessageW(s.window(a[0]), WM_CLOSE, 0, 0); }},
         {L"text", L"TITLE | ID", L"prints a control's text", 2, 2,
@@ -349,17 +334,16 @@ const std::vector<Script::Command>& Script::commands()
              for (const HWND target : openWindows())
                  s.output_.line(titleOf(target) + (IsWindowEnabled(target) ? L"" : L" [disabled]"));
          }},
-        {L"unload", L"DLL", L"has COM free unused servers and tells whether DLL is still mapped", 1, 1,
-         [](S& s, const A& a) {
-             s.onWindow([] {
-                 CoFreeUnusedLibrariesEx(0, 0);
-                 CoFreeUnusedLibrariesEx(0, 0);
-             });
-             s.output_.line(a[0] + (GetModuleHandleW(a[0].c_str()) ? L" is still mapped" : L" is not mapped"));
-         }},
+        {L"page", L"CLSID", L"opens the property page that this class has for the selection, in a sheet named Page", 1,
+         1, [](S& s, const A& a) { s.openPage(a[0]); }},
+        {L"watch", L"DLL", L"has counts print how often DLL was unmapped; from then on nothing but unload frees it", 1,
+         1, [](S& s, const A& a) { s.watch(a[0]); }},
+        {L"unload", L"DLL [| MS]",
+         L"has COM free unused servers and prints whether DLL is still mapped; with MS tries until it is not", 1, 2,
+         [](S& s, const A& a) { s.unload(a); }},
         {L"hold", L"CLSID", L"keeps a COM class at work until the end", 1, 1,
          [](S& s, const A& a) { s.onWindow([&] { s.hold(a[0]); }); }},
-        {L"counts", L"", L"prints this process's handles, GDI objects, threads and private memory", 0, 0,
+        {L"counts", L"", L"prints this process's handles, GDI objects, threads, private memory and unloads", 0, 0,
          [](S& s, const A&) { s.output_.line(objectCounts()); }},
         {L"expect", L"TEXT | ...", L"fails unless the command before printed each TEXT", 1, SIZE_MAX,
          [](S& s, const A& a) { s.expect(a, true); }},
@@ -367,9 +351,16 @@ const std::vector<Script::Command>& Script::commands()
          [](S& s, const A& a) { s.expect(a, false); }},
         {L"repeat", L"N | COMMAND", L"runs a command N times; only the last prints", 2, SIZE_MAX,
          [](S& s, const A& a) { s.repeat(a); }},
+        {L"retry", L"MS | COMMAND", L"runs a command until it does not fail", 2, SIZE_MAX,
+         [](S& s, const A& a) { s.retry(a); }},
         {L"try", L"COMMAND", L"runs a command that may fail, and prints why it did", 1, SIZE_MAX,
          [](S& s, const A& a) { s.tryLine(joined(a, 0)); }},
-        {L"exit", L"", L"closes the file manager", 0, 0, [](S& s, const A&) { s.ended_ = true; }},
+        {L"exit", L"[CODE]", L"closes the file manager; with CODE ends the process at once", 0, 1,
+         [](S& s, const A& a) {
+             if (!a.empty())
+                 ExitProcess(static_cast<UINT>(number(a[0])));
+             s.ended_ = true;
+         }},
     };
     return table;
 }
@@ -535,34 +526,6 @@ HWND Script::control(const std::wstring& title, const std::wstring& id) const
     throw Failure{L"no control " + id + L" in " + title};
 }
 
-GUITHREADINFO Script::inputState() const
-{
-    GUITHREADINFO info = {};
-    info.cbSize = sizeof info;
-    GetGUIThreadInfo(GetWindowThreadProcessId(owner_, nullptr), &info);
-    return info;
-}
-
-void Script::showMenu()
-{
-    PostMessageW(owner_, WM_CONTEXTMENU, reinterpret_cast<WPARAM>(GetDlgItem(owner_, listControl)), -1);
-    waitUntil([this] { return (inputState().flags & GUI_INMENUMODE) != 0; }, kMenuLimit, L"the menu does not open");
-}
-
-void Script::press(const std::wstring& name)
-{
-    const auto known =
-        std::find_if(std::begin(kKeys), std::end(kKeys), [&](const KeyName& key) { return name == key.name; });
-    if (known == std::end(kKeys))
-        throw Failure{L"unknown key " + name};
-    const GUITHREADINFO state = inputState();
-    const HWND target = state.hwndMenuOwner ? state.hwndMenuOwner
-                        : state.hwndFocus   ? state.hwndFocus
-                                            : GetDlgItem(owner_, listControl);
-    PostMessageW(target, WM_KEYDOWN, known->key, 1);
-    PostMessageW(target, WM_KEYUP, known->key, static_cast<LPARAM>(0xC0000001));
-}
-
 void Script::repeat(const Arguments& arguments)
 {
     const std::wstring line = joined(arguments, 1);
@@ -570,6 +533,51 @@ void Script::repeat(const Arguments& arguments)
         output_.mute(count > 1);
         runLine(line);
     }
+}
+
+// Times the handlers alone, without the printing.
+void Script::menu()
+{
+    onWindow([this] {
+        const auto menu = folder_.makeMenu(false);
+        output_.line(L"handlers took " + std::to_wstring(menu->handlerMicroseconds()) + L" us");
+    });
+}
+
+// The sheet runs a loop of its own: only the page is made while the script waits.
+void Script::openPage(const std::wstring& classId)
+{
+    HPROPSHEETPAGE page = nullptr;
+    onWindow([&] { page = folder_.makePage(classId); });
+    auto* const action = new std::function<void()>([this, page] { folder_.showPage(page); });
+    PostMessageW(owner_, FolderWindow::kRunMessage, TRUE, reinterpret_cast<LPARAM>(action));
+}
+
+void Script::watch(const std::wstring& library)
+{
+    using Register = LONG(NTAPI*)(ULONG, decltype(&noteLibrary), void*, void**);
+    const auto address =
+        reinterpret_cast<void*>(GetProcAddress(GetModuleHandleW(L"ntdll.dll"), "LdrRegisterDllNotification"));
+    void* cookie = nullptr;
+    watchedLibrary = library;
+    if (!address || reinterpret_cast<Register>(address)(0, noteLibrary, nullptr, &cookie) != 0)
+        throw Failure{L"the loader does not report libraries"};
+    onWindow([this] { folder_.stopFreeing(); });
+}
+
+void Script::unload(const Arguments& arguments)
+{
+    const std::wstring& library = arguments[0];
+    const auto isGone = [&] {
+        onWindow([] {
+            CoFreeUnusedLibrariesEx(0, 0);
+            CoFreeUnusedLibrariesEx(0, 0);
+        });
+        return GetModuleHandleW(library.c_str()) == nullptr;
+    };
+    if (arguments.size() > 1)
+        waitUntil(isGone, milliseconds(arguments[1]), library + L" is still mapped");
+    output_.line(library + (isGone() ? L" is not mapped" : L" is still mapped"));
 }
 
 void Script::hold(const std::wstring& classId)
@@ -582,6 +590,23 @@ void Script::hold(const std::wstring& classId)
     if (FAILED(result))
         throw Failure{L"no class " + classId + L": " + hexCode(result)};
     held_.push_back(factory);
+}
+
+void Script::retry(const Arguments& arguments)
+{
+    std::wstring failure;
+    const auto succeeds = [&] {
+        try {
+            output_.mute(!failure.empty());
+            runLine(joined(arguments, 1));
+            failure.clear();
+        } catch (const Failure& caught) {
+            failure = caught.text;
+        }
+        output_.mute(false);
+        return failure.empty();
+    };
+    waitUntil(succeeds, milliseconds(arguments[0]), L"still failing: " + joined(arguments, 1));
 }
 
 void Script::tryLine(const std::wstring& line)

@@ -46,11 +46,13 @@ class Script {
     void waitUntil(const std::function<bool()>& met, DWORD limit, const std::wstring& otherwise);
     HWND window(const std::wstring& title) const;
     HWND control(const std::wstring& title, const std::wstring& id) const;
-    GUITHREADINFO inputState() const;
-    void showMenu();
-    void press(const std::wstring& name);
+    void menu();
+    void openPage(const std::wstring& classId);
+    void watch(const std::wstring& library);
+    void unload(const Arguments& arguments);
     void repeat(const Arguments& arguments);
     void hold(const std::wstring& classId);
+    void retry(const Arguments& arguments);
     void tryLine(const std::wstring& line);
     void expect(const Arguments& texts, bool present);
 

@@ -1,6 +1,7 @@
 #include "ShellMenu.h"
 
 #include <algorithm>
+#include <chrono>
 
 namespace filemanager {
 namespace {
@@ -94,28 +95,35 @@ std::wstring withoutMnemonic(const wchar_t* text)
 
 } // namespace
 
+ComPtr<IDataObject> dataObject(HWND owner, const Folder& folder, std::vector<LPCITEMIDLIST> items)
+{
+    ComPtr<IDataObject> data;
+    const HRESULT result =
+        folder.object->GetUIObjectOf(owner, static_cast<UINT>(items.size()), items.data(), IID_IDataObject, nullptr,
+                                     reinterpret_cast<void**>(data.GetAddressOf()));
+    if (FAILED(result))
+        throw Failure{L"no data object for the selection: " + hexCode(result)};
+    return data;
+}
+
 ShellMenu::ShellMenu(HWND owner, const Folder& folder, MenuTarget target, const std::vector<LPCITEMIDLIST>& items,
                      Output& output)
-    : popup_(CreatePopupMenu()), output_(output)
+    : popup_(nullptr), output_(output)
 {
     const bool onBackground = target == MenuTarget::background;
     ComPtr<IDataObject> data;
+    if (!onBackground)
+        data = dataObject(owner, folder, items);
+    popup_ = CreatePopupMenu();
     if (onBackground) {
         append(refreshCommand);
         append(selectAllCommand);
     } else {
         append(openCommand);
         SetMenuDefaultItem(popup_, openCommand, FALSE);
-        auto children = items;
-        const HRESULT result =
-            folder.object->GetUIObjectOf(owner, static_cast<UINT>(children.size()), children.data(), IID_IDataObject,
-                                         nullptr, reinterpret_cast<void**>(data.GetAddressOf()));
-        if (FAILED(result)) {
-            DestroyMenu(popup_);
-            throw Failure{L"no data object for the selection: " + hexCode(result)};
-        }
     }
 
+    const auto start = std::chrono::steady_clock::now();
     std::vector<CLSID> seen;
     for (const wchar_t* const className : classesOf(target, folder)) {
         const Key classKey = openKey(HKEY_CLASSES_ROOT, className);
@@ -129,6 +137,8 @@ ShellMenu::ShellMenu(HWND owner, const Folder& folder, MenuTarget target, const 
             addHandler(clsid, classKey.get(), onBackground ? &folder : nullptr, data.Get());
         }
     }
+    handlerMicroseconds_ =
+        std::chrono::duration_cast<std::chrono::microseconds>(std::chrono::steady_clock::now() - start).count();
 
     AppendMenuW(popup_, MF_SEPARATOR, 0, nullptr);
     append(propertiesCommand);

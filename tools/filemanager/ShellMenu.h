@@ -39,6 +39,8 @@ enum OwnCommand : UINT {
     firstHandlerCommand = 0x100
 };
 
+ComPtr<IDataObject> dataObject(HWND owner, const Folder& folder, std::vector<LPCITEMIDLIST> items);
+
 // One context menu: a few items of our own and what the handlers registered for the target put into it. It lives as
 // long as the menu is on screen; the handlers are released with it.
 class ShellMenu {
@@ -58,6 +60,11 @@ class ShellMenu {
     // The command of the item with that text (accelerator marks left out), 0 if there is none.
     UINT findText(const std::wstring& text) const;
     std::wstring helpText(UINT command) const;
+    // What the handlers took to make their part of the menu.
+    long long handlerMicroseconds() const noexcept
+    {
+        return handlerMicroseconds_;
+    }
     // Hands a command of a handler to it.
     HRESULT invoke(UINT command, HWND owner) const;
 
@@ -78,6 +85,7 @@ class ShellMenu {
     Output& output_;
     std::vector<Handler> handlers_;
     UINT nextCommand_ = firstHandlerCommand;
+    long long handlerMicroseconds_ = 0;
 };
 
 } // namespace filemanager
