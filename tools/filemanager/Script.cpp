@@ -562,6 +562,8 @@ void Script::watch(const std::wstring& library)
     watchedLibrary = library;
     if (!address || reinterpret_cast<Register>(address)(0, noteLibrary, nullptr, &cookie) != 0)
         throw Failure{L"the loader does not report libraries"};
+    // Wine's printing library, which the common dialogs bring, leaves a mutex behind at each of its own unloads.
+    LoadLibraryW(L"comdlg32.dll");
     onWindow([this] { folder_.stopFreeing(); });
 }
 
