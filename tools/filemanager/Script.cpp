@@ -316,8 +316,14 @@ const std::vector<Script::Command>& Script::commands()
          [](S& s, const A& a) { clickButton(s.control(a[0], a[1])); }},
         {L"select-row", L"TITLE | ID | ROW", L"selects a row of a list, from 0; -1 is the last", 3, 3,
          [](S& s, const A& a) { selectRow(s.control(a[0], a[1]), number(a[2])); }},
-        {L"close-window", L"TITLE", L"closes a window", 1, 1,
-         [](S& s, const A& a) { PostMessageW(s.window(a[0]), WM_CLOSE, 0, 0); }},
+        {L"close", L"TITLE | MS", L"closes every window with this title", 2, 2,
+         [](S& s, const A& a) {
+             const auto allClosed = [&] {
+                 PostMessageW(findWindow(a[0], true), WM_CLOSE, 0, 0);
+                 return findWindow(a[0], false) == nullptr;
+             };
+             s.waitUntil(allClosed, milliseconds(a[1]), L"still a window " + a[0]);
+         }},
         {L"text", L"TITLE | ID", L"prints a control's text", 2, 2,
          [](S& s, const A& a) { s.output_.line(textOf(s.control(a[0], a[1]))); }},
         {L"dump-list", L"TITLE | ID", L"prints the rows of a list, cells parted by tabs, selected ones marked *", 2, 2,
