@@ -316,14 +316,8 @@ const std::vector<Script::Command>& Script::commands()
          [](S& s, const A& a) { clickButton(s.control(a[0], a[1])); }},
         {L"select-row", L"TITLE | ID | ROW", L"selects a row of a list, from 0; -1 is the last", 3, 3,
          [](S& s, const A& a) { selectRow(s.control(a[0], a[1]), number(a[2])); }},
-        {L"close", L"TITLE | MS", L"closes every window with this title", 2, 2,
-         [](S& s, const A& a) {
-             const auto allClosed = [&] {
-                 PostMessageW(findWindow(a[0], true), WM_CLOSE, 0, 0);
-                 return findWindow(a[0], false) == nullptr;
-             };
-             s.waitUntil(allClosed, milliseconds(a[1]), L"still a window " + a[0]);
-         }},
+        {L"close-window", L"TITLE", L"closes a window", 1, 1,
+         [](S& s, const A& a) { PostMessageW(s.window(a[0]), WM_CLOSE, 0, 0); }},
         {L"text", L"TITLE | ID", L"prints a control's text", 2, 2,
          [](S& s, const A& a) { s.output_.line(textOf(s.control(a[0], a[1]))); }},
         {L"dump-list", L"TITLE | ID", L"prints the rows of a list, cells parted by tabs, selected ones marked *", 2, 2,
@@ -344,9 +338,11 @@ const std::vector<Script::Command>& Script::commands()
          1, [](S& s, const A& a) { s.openPage(a[0]); }},
         {L"watch", L"DLL", L"has counts print how often DLL was unmapped; from then on nothing but unload frees it", 1,
          1, [](S& s, const A& a) { s.watch(a[0]); }},
-        {L"unload", L"DLL [| MS]",
-         L"has COM free unused servers and prints whether DLL is still mapped; with MS tries until it is not", 1, 2,
-         [](S& s, const A& a) { s.unload(a); }},
+        {L"unload", L"DLL [| MS [| TITLE ...]]",
+         L"has COM free unused servers and prints whether DLL is still mapped; with MS tries until it is not, and "
+         L"closes "
+         L"windows with these titles meanwhile",
+         1, SIZE_MAX, [](S& s, const A& a) { s.unload(a); }},
         {L"hold", L"CLSID", L"keeps a COM class at work until the end", 1, 1,
          [](S& s, const A& a) { s.onWindow([&] { s.hold(a[0]); }); }},
         {L"counts", L"", L"prints this process's handles, GDI objects, threads, private memory and unloads", 0, 0,
@@ -577,6 +573,10 @@ void Script::unload(const Arguments& arguments)
 {
     const std::wstring& library = arguments[0];
     const auto isGone = [&] {
+        for (std::size_t at = 2; at < arguments.size(); ++at) {
+            if (const HWND late = findWindow(arguments[at], true))
+                PostMessageW(late, WM_CLOSE, 0, 0);
+        }
         onWindow([] {
             CoFreeUnusedLibrariesEx(0, 0);
             CoFreeUnusedLibrariesEx(0, 0);
