@@ -10,6 +10,11 @@
 #include "core/Boundary.h"
 #include "core/Handles.h"
 
+// Of the C++ runtime, which declares it in no header.
+namespace __gnu_cxx { // NOLINT(bugprone-reserved-identifier)
+void __freeres();     // NOLINT(bugprone-reserved-identifier)
+} // namespace __gnu_cxx
+
 namespace tavi {
 namespace {
 
@@ -41,12 +46,14 @@ DWORD WINAPI runModuleThread(void* parameter)
     FreeLibraryAndExitThread(start.mapping, 0);
 }
 
-// Made before every other object and so destroyed after them all: they may use the runtime on the thread that unloads
-// the module, which nobody asks for its part any more.
+// Created before every other object and so destroyed after them all, when the module is unmapped. The loader no longer
+// runs the runtime's clean-up for the thread that unloads the module, and the runtime never frees its reserve for
+// exceptions when memory has run out.
 struct LastRelease {
     ~LastRelease()
     {
         releaseThreadRuntime();
+        __gnu_cxx::__freeres();
     }
 };
 [[gnu::init_priority(101)]] const LastRelease lastRelease;
