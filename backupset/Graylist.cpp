@@ -28,6 +28,8 @@ struct PublishedTree {
 };
 PublishedTree graylist;
 PublishedTree userData;
+// Held for a whole build, so that one builder's hives are not unloaded under the other. Locked inside a build lock.
+CriticalSection hivesLock;
 std::atomic<std::uint32_t> lastListings{0};
 
 using TreeReference = Reference<const PathTree>;
@@ -75,8 +77,7 @@ class Listings {
         const TreeReference users(userData.current.acquire());
         const bool consults = left && !(users && isOn(users->Lookup(view(path))));
         WIN32_FIND_DATAW entry{};
-        const SearchHandle search(
-            FindFirstFileExW((prefix + L"*").wc_str(), FindExInfoBasic, &entry, FindExSearchNameMatch, nullptr, 0));
+        const SearchHandle search(FindFirstFileW((prefix + L"*").wc_str(), &entry));
         if (!search)
             return;
         do {
@@ -173,7 +174,7 @@ class SystemSources final : public ExclusionSources {
 
 class UserHives {
   public:
-    UserHives()
+    UserHives() : guard_(hivesLock)
     {
         LoadUserHives();
     }
@@ -183,11 +184,15 @@ class UserHives {
     }
     UserHives(const UserHives&) = delete;
     UserHives& operator=(const UserHives&) = delete;
+
+  private:
+    const std::lock_guard<CriticalSection> guard_;
 };
 
 using AddRules = void (*)(ExclusionSources& sources, const RuleSink& add);
 
-TreeReference build(AddRules addRules)
+// Returns the new tree with a reference for the caller; readers get it before the hives are unloaded.
+TreeReference buildAndPublish(PublishedTree& published, AddRules addRules)
 {
     const UserHives hives;
     const auto listings = std::make_shared<Listings>();
@@ -202,6 +207,8 @@ TreeReference build(AddRules addRules)
     addRules(sources, [&](const wxString& path, PathState state) { tree->Insert(view(path), state); });
     tree->finish();
     lastListings = listings->made();
+    built->AddRef();
+    published.current.replace(built.get());
     return built;
 }
 
@@ -220,10 +227,7 @@ TreeReference obtain(PublishedTree& published, AddRules addRules, bool refresh, 
         waited = true;
         return current;
     }
-    TreeReference built = build(addRules);
-    built->AddRef();
-    published.current.replace(built.get());
-    return built;
+    return buildAndPublish(published, addRules);
 }
 
 PathState stateOf(PublishedTree& published, AddRules addRules, const wxString& path)

@@ -1,10 +1,14 @@
 #include "backupset/UserProfiles.h"
 
 #include <map>
+#include <memory>
+#include <new>
+#include <string>
 
 #include <sddl.h>
 #include <wx/log.h>
 
+#include "core/Boundary.h"
 #include "core/Handles.h"
 #include "core/RegistryText.h"
 
@@ -25,7 +29,7 @@ std::map<wxString, wxString> hiveOwners;
 // Both privileges on for as long as it lives, then as they were found.
 class HivePrivileges {
   public:
-    HivePrivileges()
+    HivePrivileges() noexcept
     {
         if (!OpenProcessToken(GetCurrentProcess(), TOKEN_ADJUST_PRIVILEGES | TOKEN_QUERY, token_.out()))
             return;
@@ -102,12 +106,16 @@ void loadHive(const wxString& profile)
     const wxString file = *image + L"\\ntuser.dat";
     if (GetFileAttributesW(file.wc_str()) == INVALID_FILE_ATTRIBUTES)
         return;
-    const wxString name = wxString::Format("tavi%d", hiveCounter);
-    // It fails, as it should, for a user who is logged on.
-    if (RegLoadKeyW(HKEY_USERS, name.wc_str(), file.wc_str()) != ERROR_SUCCESS)
-        return;
-    ++hiveCounter;
+    // Not by Format(), which ends the process where memory runs out.
+    const wxString name(L"tavi" + std::to_wstring(hiveCounter));
+    // Recorded first: a loaded hive that is not in the list would never be unloaded.
     loadedHives.push_back(name);
+    // Fails for a user who is logged on, whose hive the system has loaded.
+    if (RegLoadKeyW(HKEY_USERS, name.wc_str(), file.wc_str()) != ERROR_SUCCESS) {
+        loadedHives.pop_back();
+        return;
+    }
+    ++hiveCounter;
     hiveOwners[L"HKEY_USERS\\" + name] = owner;
 }
 
@@ -117,14 +125,19 @@ void LoadUserHives()
 {
     if (++loadNesting != 1)
         return;
-    const HivePrivileges privileges;
-    if (!privileges.held())
-        return;
-    for (const wxString& profile : subKeys(HKEY_LOCAL_MACHINE, kProfileList))
-        loadHive(wxString(kProfileList) + L"\\" + profile);
+    try {
+        const HivePrivileges privileges;
+        if (!privileges.held())
+            return;
+        for (const wxString& profile : subKeys(HKEY_LOCAL_MACHINE, kProfileList))
+            loadHive(wxString(kProfileList) + L"\\" + profile);
+    } catch (...) {
+        UnloadUserHives();
+        throw;
+    }
 }
 
-void UnloadUserHives()
+void UnloadUserHives() noexcept
 {
     if (--loadNesting != 0)
         return;
@@ -134,7 +147,8 @@ void UnloadUserHives()
         return;
     for (const wxString& name : loadedHives) {
         if (const LONG code = RegUnLoadKeyW(HKEY_USERS, name.wc_str()); code != ERROR_SUCCESS)
-            wxLogError("Unable to unload temp reg hive %s: %d", name, static_cast<int>(code));
+            guarded("hive unload",
+                    [&] { wxLogError("Unable to unload temp reg hive %s: %d", name, static_cast<int>(code)); });
     }
     loadedHives.clear();
     hiveOwners.clear();
@@ -165,17 +179,17 @@ wxString LongPath(const wxString& path)
     return wxString(buffer.data(), length);
 }
 
-bool IsPrivilegeEnabled(HANDLE token, const wchar_t* privilege)
+bool IsPrivilegeEnabled(HANDLE token, const wchar_t* privilege) noexcept
 {
     LUID id{};
     DWORD size = 0;
     if (!LookupPrivilegeValueW(nullptr, privilege, &id) ||
         GetTokenInformation(token, TokenPrivileges, nullptr, 0, &size) || GetLastError() != ERROR_INSUFFICIENT_BUFFER)
         return false;
-    std::vector<BYTE> bytes(size);
-    if (!GetTokenInformation(token, TokenPrivileges, bytes.data(), size, &size))
+    const std::unique_ptr<BYTE[]> bytes(new (std::nothrow) BYTE[size]);
+    if (!bytes || !GetTokenInformation(token, TokenPrivileges, bytes.get(), size, &size))
         return false;
-    const auto& list = *reinterpret_cast<const TOKEN_PRIVILEGES*>(bytes.data());
+    const auto& list = *reinterpret_cast<const TOKEN_PRIVILEGES*>(bytes.get());
     for (DWORD i = 0; i < list.PrivilegeCount; ++i) {
         const LUID_AND_ATTRIBUTES& entry = list.Privileges[i];
         if (entry.Luid.LowPart == id.LowPart && entry.Luid.HighPart == id.HighPart)
@@ -184,7 +198,7 @@ bool IsPrivilegeEnabled(HANDLE token, const wchar_t* privilege)
     return false;
 }
 
-bool SetPrivilege(HANDLE token, const wchar_t* privilege, bool enable)
+bool SetPrivilege(HANDLE token, const wchar_t* privilege, bool enable) noexcept
 {
     TOKEN_PRIVILEGES change{};
     change.PrivilegeCount = 1;

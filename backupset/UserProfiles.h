@@ -11,9 +11,10 @@ namespace tavi {
 
 // Makes every profile's hive reachable below HKEY_USERS, those of users who are not logged on under temporary names.
 // Nests: only the outermost pair works. What cannot be loaded is left out in silence; without the backup and restore
-// privileges that is every hive that the system has not loaded itself.
+// privileges that is every hive that the system has not loaded itself. Throws std::bad_alloc, with every hive unloaded
+// and the nesting as before.
 void LoadUserHives();
-void UnloadUserHives();
+void UnloadUserHives() noexcept;
 
 // The named value of every user's "Shell Folders" key, in long form and in the order of the hives; without those that
 // do not exist. A user whose hive can be reached twice contributes twice.
@@ -23,7 +24,7 @@ std::vector<wxString> ShellFolderPaths(const wxString& valueName);
 wxString LongPath(const wxString& path);
 
 // Any failure answers false. Any thread.
-bool IsPrivilegeEnabled(HANDLE token, const wchar_t* privilege);
-bool SetPrivilege(HANDLE token, const wchar_t* privilege, bool enable);
+bool IsPrivilegeEnabled(HANDLE token, const wchar_t* privilege) noexcept;
+bool SetPrivilege(HANDLE token, const wchar_t* privilege, bool enable) noexcept;
 
 } // namespace tavi

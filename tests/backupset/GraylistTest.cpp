@@ -2,6 +2,9 @@
 
 #include <algorithm>
 #include <cwchar>
+#include <filesystem>
+#include <future>
+#include <new>
 
 #include <windows.h>
 #include <sddl.h>
@@ -13,20 +16,53 @@
 #include "backupset/Volumes.h"
 #include "core/Handles.h"
 #include "core/Options.h"
+#include "tests/support/Allocations.h"
 #include "tests/support/Counts.h"
 #include "tests/support/LogCapture.h"
 #include "tests/support/Registry.h"
+
+void* operator new(std::size_t size)
+{
+    using tavi::test::FailingAllocations;
+    const bool fails = FailingAllocations::thread == GetCurrentThreadId() && FailingAllocations::left-- <= 0;
+    if (void* const block = fails ? nullptr : std::malloc(size))
+        return block;
+    throw std::bad_alloc();
+}
+void operator delete(void* block) noexcept
+{
+    const void* freed = block;
+    tavi::test::FailingAllocations::watched.compare_exchange_strong(freed, nullptr);
+    std::free(block);
+}
+void operator delete(void* block, std::size_t) noexcept
+{
+    operator delete(block);
+}
 
 namespace tavi {
 namespace {
 
 using namespace test;
 
-bool privilegeIsOn(const wchar_t* name)
+KernelHandle processToken()
 {
     KernelHandle token;
-    OpenProcessToken(GetCurrentProcess(), TOKEN_QUERY, token.out());
-    return IsPrivilegeEnabled(token.get(), name);
+    OpenProcessToken(GetCurrentProcess(), TOKEN_ADJUST_PRIVILEGES | TOKEN_QUERY, token.out());
+    return token;
+}
+
+bool privilegeIsOn(const wchar_t* name)
+{
+    return IsPrivilegeEnabled(processToken().get(), name);
+}
+
+LONG unloadByHand(const std::wstring& hive)
+{
+    SetPrivilege(processToken().get(), L"SeRestorePrivilege", true);
+    const LONG code = RegUnLoadKeyW(HKEY_USERS, hive.c_str());
+    SetPrivilege(processToken().get(), L"SeRestorePrivilege", false);
+    return code;
 }
 
 // A user who is not logged on: a profile with a hive that names its shell folders.
@@ -39,8 +75,7 @@ class AbsentUser {
         wxRegKey(source, L"Software\\Microsoft\\Windows\\CurrentVersion\\Explorer\\Shell Folders").Create();
         wxRegKey folders(source, L"Software\\Microsoft\\Windows\\CurrentVersion\\Explorer\\Shell Folders");
         folders.SetValue(shellFolder, wxString(path));
-        KernelHandle token;
-        OpenProcessToken(GetCurrentProcess(), TOKEN_ADJUST_PRIVILEGES | TOKEN_QUERY, token.out());
+        const KernelHandle token = processToken();
         SetPrivilege(token.get(), L"SeBackupPrivilege", true);
         RegistryKey hive;
         RegOpenKeyExW(HKEY_CURRENT_USER, L"Software\\TaviTestHive", 0, KEY_READ, hive.out());
@@ -109,13 +144,11 @@ TEST(UserProfiles, LoadsTheHivesOfAbsentUsersAndUnloadsThemAgain)
         EXPECT_EQ(count(), 2);
         EXPECT_FALSE(privilegeIsOn(L"SeBackupPrivilege") || privilegeIsOn(L"SeRestorePrivilege"));
         if (round == 1) {
-            KernelHandle token;
-            OpenProcessToken(GetCurrentProcess(), TOKEN_ADJUST_PRIVILEGES | TOKEN_QUERY, token.out());
-            SetPrivilege(token.get(), L"SeRestorePrivilege", true);
-            EXPECT_EQ(RegUnLoadKeyW(HKEY_USERS, loaded[0].c_str()), ERROR_SUCCESS);
+            EXPECT_EQ(unloadByHand(loaded[0]), ERROR_SUCCESS);
+            SetPrivilege(processToken().get(), L"SeRestorePrivilege", true);
             UnloadUserHives();
             EXPECT_TRUE(privilegeIsOn(L"SeRestorePrivilege")) << "left as it was found";
-            SetPrivilege(token.get(), L"SeRestorePrivilege", false);
+            SetPrivilege(processToken().get(), L"SeRestorePrivilege", false);
             EXPECT_EQ(log.take(), std::vector<std::string>{"1: Error: Unable to unload temp reg hive " +
                                                            wxString(loaded[0]).utf8_string() + ": 2"});
         } else {
@@ -125,6 +158,21 @@ TEST(UserProfiles, LoadsTheHivesOfAbsentUsersAndUnloadsThemAgain)
         EXPECT_TRUE(temporaryHives().empty());
     }
 
+    // Without memory at each point in turn no hive stays loaded and the nesting is as before.
+    for (int succeeding = 0; temporaryHives().empty() && succeeding < 1000; ++succeeding) {
+        const FailingAllocations failing(succeeding);
+        try {
+            LoadUserHives();
+        } catch (const std::bad_alloc&) {
+        }
+    }
+    EXPECT_EQ(temporaryHives().size(), 2u);
+    {
+        const FailingAllocations failing(0);
+        UnloadUserHives();
+    }
+    EXPECT_TRUE(temporaryHives().empty());
+
     wchar_t shortPath[MAX_PATH];
     GetShortPathNameW(cookies.path().c_str(), shortPath, MAX_PATH);
     shortPath[0] = L'c';
@@ -133,18 +181,45 @@ TEST(UserProfiles, LoadsTheHivesOfAbsentUsersAndUnloadsThemAgain)
     EXPECT_EQ(LongPath(cookies.path() + L"\\missing"), L"");
 }
 
+TEST(UserProfiles, WithoutThePrivilegesNothingIsLoadedOrLogged)
+{
+    const auto hivesAndLines = [] {
+        LogCapture log;
+        const AbsentUser user(L"S-1-5-21-1-2-3-4001", L"Cookies", L"C:\\");
+        for (const wchar_t* const name : {L"SeBackupPrivilege", L"SeRestorePrivilege"}) {
+            TOKEN_PRIVILEGES removal{1, {{{}, SE_PRIVILEGE_REMOVED}}};
+            LookupPrivilegeValueW(nullptr, name, &removal.Privileges[0].Luid);
+            AdjustTokenPrivileges(processToken().get(), FALSE, &removal, 0, nullptr, nullptr);
+        }
+        LoadUserHives();
+        const std::size_t hives = temporaryHives().size();
+        UnloadUserHives();
+        return static_cast<int>(hives + log.take().size());
+    };
+    // In a process of its own: a removed privilege does not come back.
+    EXPECT_EXIT(std::exit(hivesAndLines()), testing::ExitedWithCode(0), "");
+}
+
 // The system under Wine calls every volume's drive type unknown, has no folder mounts and no links between devices:
 // each of these stands here as the system's documentation has it.
 namespace fake {
 
 int volume;
 DWORD failing;
+bool secondFails;
+// Of searches and of links.
+int openHandles;
 
 HANDLE WINAPI findFirst(LPWSTR name, DWORD)
 {
     std::wcscpy(name, L"\\\\?\\Volume{0}\\");
     volume = 0;
+    ++openHandles;
     return GetProcessHeap();
+}
+HANDLE WINAPI findNothing(LPWSTR, DWORD)
+{
+    return INVALID_HANDLE_VALUE;
 }
 BOOL WINAPI findNext(HANDLE, LPWSTR name, DWORD)
 {
@@ -153,6 +228,7 @@ BOOL WINAPI findNext(HANDLE, LPWSTR name, DWORD)
 }
 BOOL WINAPI findClose(HANDLE)
 {
+    --openHandles;
     return TRUE;
 }
 DWORD WINAPI queryDevice(LPCWSTR name, LPWSTR target, DWORD)
@@ -169,12 +245,13 @@ UINT WINAPI alwaysFixed(LPCWSTR)
 }
 BOOL WINAPI pathNames(LPCWSTR, LPWSTR paths, DWORD size, PDWORD length)
 {
-    // Volume 1 is mounted twice, volume 3 cannot tell.
+    // Volume 1 is mounted twice, volume 3 fails at the first or second question.
     const std::wstring all = volume == 1 ? std::wstring(L"D:\\\0C:\\mount\\\0", 14) : std::wstring(L"C:\\\0", 5);
     *length = static_cast<DWORD>(all.size());
-    if (volume == 3 || size < all.size()) {
-        SetLastError(volume == 3 ? failing : DWORD{ERROR_MORE_DATA});
-        return volume == 3 && failing == 0;
+    const bool fails = volume == 3 && secondFails == (size > 0);
+    if (fails || size < all.size()) {
+        SetLastError(fails ? failing : DWORD{ERROR_MORE_DATA});
+        return fails && failing == 0;
     }
     std::copy(all.begin(), all.end(), paths);
     return TRUE;
@@ -185,7 +262,10 @@ NTSTATUS NTAPI openLink(HANDLE* link, ACCESS_MASK access, OBJECT_ATTRIBUTES* att
     EXPECT_EQ(attributes->Attributes, 0x40u);
     *link = GetProcessHeap();
     const std::wstring name(attributes->ObjectName->Buffer, attributes->ObjectName->Length / sizeof(wchar_t));
-    return name == L"\\Device\\Volume{1}" ? 0 : static_cast<NTSTATUS>(0xC0000024);
+    if (name != L"\\Device\\Volume{1}")
+        return static_cast<NTSTATUS>(0xC0000024);
+    ++openHandles;
+    return 0;
 }
 NTSTATUS NTAPI queryLink(HANDLE, UNICODE_STRING* target, ULONG* bytes)
 {
@@ -199,6 +279,7 @@ NTSTATUS NTAPI queryLink(HANDLE, UNICODE_STRING* target, ULONG* bytes)
 }
 NTSTATUS NTAPI closeLink(HANDLE)
 {
+    --openHandles;
     return 0;
 }
 
@@ -214,22 +295,33 @@ TEST(Volumes, AreTheMountPointsOfFixedVolumes)
     functions.queryDevice = fake::queryDevice;
     functions.driveType = fake::driveType;
     functions.pathNames = fake::pathNames;
-    for (const bool links : {false, true}) {
+    const struct {
+        bool links, secondFails;
+        DWORD code;
+        const char* logged;
+    } cases[] = {{false, false, 0, "00000000"}, {true, false, 5, "00000005"}, {true, true, 234, "000000ea"}};
+    for (const auto& [links, secondFails, code, logged] : cases) {
         functions.openLink = links ? fake::openLink : nullptr;
         functions.queryLink = fake::queryLink;
         functions.closeLink = fake::closeLink;
-        fake::failing = links ? ERROR_ACCESS_DENIED : 0;
+        fake::failing = code;
+        fake::secondFails = secondFails;
         VolumeTable table(functions);
         for (int round = 0; round < 2; ++round) {
             table.RefreshVolumes();
             EXPECT_EQ(table.MountPoints(), (std::set<wxString>{L"C:\\", L"C:\\mount\\", L"D:\\"}));
-            EXPECT_EQ(log.take(),
-                      std::vector<std::string>{std::string("1: Error: Failed to retrieve mount point names: ") +
-                                               (links ? "00000005" : "00000000")});
+            EXPECT_EQ(log.take(), std::vector<std::string>{
+                                      std::string("1: Error: Failed to retrieve mount point names: ") + logged});
+            EXPECT_EQ(fake::openHandles, 0);
         }
         EXPECT_EQ(table.mountPointOf(L"\\Device\\Volume{0}"), L"C:\\");
         EXPECT_EQ(table.mountPointOf(links ? L"\\Device\\Disk7" : L"\\Device\\Volume{1}"), L"C:\\mount\\");
     }
+    functions.findFirst = fake::findNothing;
+    VolumeTable none(functions);
+    none.RefreshVolumes();
+    EXPECT_TRUE(none.MountPoints().empty() && log.take().empty());
+    EXPECT_EQ(fake::openHandles, 0);
     // The system's own functions: a name resolves to itself where it is no link.
     VolumeFunctions system = VolumeFunctions::system();
     EXPECT_TRUE(system.openLink);
@@ -239,39 +331,54 @@ TEST(Volumes, AreTheMountPointsOfFixedVolumes)
     EXPECT_EQ(real.MountPoints().count(L"C:\\"), 1u);
 }
 
-TEST(Graylist, IsBuiltPublishedAndReplaced)
+// Users whose places have every odd state; the folders are named after it. A build logs one line, since the install key
+// names no data folder.
+class Graylists : public testing::Test {
+  protected:
+    Graylists()
+    {
+        for (const wchar_t* const name : {L"\\1\\Identities", L"\\3\\Microsoft\\Outlook", L"\\3\\Microsoft\\Other",
+                                          L"\\5\\Identities", L"\\5\\Cache", L"\\7"})
+            std::filesystem::create_directories(root_.path() + name);
+        wxRegKey(GetSettingsKeyName()).Create();
+        service_.install().DeleteValue(L"DataPath");
+        DropGraylist();
+    }
+    ~Graylists() override
+    {
+        DropGraylist();
+    }
+    LogCapture log_;
+    InstalledService service_;
+    const TemporaryFolder root_;
+    const AbsentUser users_[4] = {{L"S-1-5-21-1-2-3-4004", L"Local Settings", root_.path()},
+                                  {L"S-1-5-21-1-2-3-4005", L"Local AppData", root_.path() + L"\\1"},
+                                  {L"S-1-5-21-1-2-3-4006", L"Local AppData", root_.path() + L"\\3"},
+                                  {L"S-1-5-21-1-2-3-4007", L"Local AppData", root_.path() + L"\\5"}};
+    const wxString here_ = LongPath(root_.path());
+};
+
+TEST_F(Graylists, AreBuiltPublishedAndReplaced)
 {
-    const InstalledService service;
-    const TemporaryFolder local;
-    for (const wchar_t* const name : {L"\\Microsoft", L"\\Microsoft\\Outlook", L"\\Microsoft\\Other", L"\\Cache"})
-        CreateDirectoryW((local.path() + name).c_str(), nullptr);
-    const AbsentUser user(L"S-1-5-21-1-2-3-4004", L"Local AppData", local.path());
-    const wxString here = LongPath(local.path());
-    wchar_t windows[MAX_PATH], before[MAX_PATH];
+    wchar_t windows[MAX_PATH], temp[MAX_PATH];
     GetWindowsDirectoryW(windows, MAX_PATH);
     // The test's own folders are in the temporary one.
-    GetEnvironmentVariableW(L"TEMP", before, MAX_PATH);
+    GetEnvironmentVariableW(L"TEMP", temp, MAX_PATH);
     SetEnvironmentVariableW(L"TEMP", L"C:\\elsewhere\\..\\scratch");
-
-    wxRegKey settings(GetSettingsKeyName());
-    settings.Create();
+    service_.install().SetValue(L"DataPath", L"C:\\served");
     for (const long keeps : {1L, 0L}) {
-        settings.SetValue(L"options.graylist", keeps);
+        wxRegKey(GetSettingsKeyName()).SetValue(L"options.graylist", keeps);
         const PathTree* const first = GetGraylist(true);
         EXPECT_TRUE(temporaryHives().empty());
         const PathTree* const again = GetGraylist(false);
         EXPECT_EQ(again, first);
         again->Release();
-        EXPECT_TRUE(IsGrayed(wxString(windows) + L"\\Temp\\x"));
-        EXPECT_TRUE(IsGrayed(GetDataFilePath(kDataDirectory)));
+        EXPECT_TRUE(IsGrayed(wxString(windows) + L"\\Temp\\x") && IsGrayed(L"C:\\served"));
         EXPECT_EQ(IsGrayed(wxString(windows) + L"\\notepad.exe"), keeps == 0);
         EXPECT_TRUE(IsGrayed(L"C:\\scratch\\x"));
         EXPECT_FALSE(IsGrayed(L"C:\\users"));
-        EXPECT_EQ(first->Lookup(view(here + L"\\Microsoft\\Outlook\\mail.pst")), 8u);
-        EXPECT_EQ(first->Lookup(view(here + L"\\Cache\\x")), keeps ? 8u : 7u);
-        EXPECT_EQ(first->Lookup(view(here)), keeps ? 8u : 5u);
-        EXPECT_EQ(IsGrayed(here) && IsPartlyGrayed(here), keeps == 0);
-        EXPECT_FALSE(IsPartlyGrayed(here + L"\\Cache"));
+        EXPECT_EQ(first->Lookup(view(here_)), keeps ? 8u : 5u);
+        EXPECT_EQ(first->Lookup(view(here_ + L"\\3\\Microsoft\\Outlook\\mail.pst")), 8u);
         // An old list stays whole for who holds it.
         const PathTree* const next = GetGraylist(true);
         EXPECT_NE(next, first);
@@ -279,14 +386,60 @@ TEST(Graylist, IsBuiltPublishedAndReplaced)
         next->Release();
         first->Release();
     }
-    SetEnvironmentVariableW(L"TEMP", before);
-    settings.DeleteValue(L"options.graylist");
-    EXPECT_EQ(GetUserDataTree(true), GetUserDataTree(false));
-    EXPECT_TRUE(IsUserData(wxString(windows) + L"\\Temp"));
-    EXPECT_FALSE(IsUserData(GetDataFilePath(kDataDirectory)));
+    SetEnvironmentVariableW(L"TEMP", temp);
+}
+
+TEST_F(Graylists, AnswerByStateAndCountWhatTheListInForceDoesNotLeaveOut)
+{
+    const PathTree* users = GetUserDataTree(true);
+    EXPECT_EQ(GetUserDataTree(false), users);
+    EXPECT_EQ(users->Lookup(view(here_)), 5u);
+    for (const PathState state : {1u, 3u, 5u, 7u}) {
+        const wxString folder = here_ + wxString::Format(L"\\%u", static_cast<unsigned>(state));
+        EXPECT_EQ(users->Lookup(view(folder)), state);
+        EXPECT_TRUE(IsUserData(folder));
+        EXPECT_EQ(IsGrayed(folder), state != 1) << state;
+        EXPECT_EQ(IsPartlyGrayed(folder), state != 7) << state;
+    }
+    EXPECT_FALSE(IsUserData(L"C:\\users") || IsUserData(here_ + L"\\1\\Identities"));
+
+    // Where a list is in force, the folder 7 and the cache do not count, and each entry left has a rule of its own.
+    users = GetUserDataTree(true);
+    for (const wchar_t* const name : {L"", L"\\3", L"\\5"})
+        EXPECT_EQ(users->Lookup(view(here_ + name)), 1u) << name;
+    // Among the users' places all count, also where another list comes into force during the build.
+    log_.onNextLine([] { GetGraylist(false)->Release(); });
+    const PathTree* const built = GetGraylist(true);
+    EXPECT_EQ(log_.take().size(), 3u); // one for each list
+    EXPECT_EQ(built->Lookup(view(here_)), 5u);
+    built->Release();
+}
+
+TEST_F(Graylists, AreBuiltOneAfterTheOtherAndPublishedBeforeTheHivesGo)
+{
+    std::future<const PathTree*> waiter, users;
+    const PathTree* published = nullptr;
+    log_.onNextLine([&] {
+        waiter = std::async(std::launch::async, [] { return GetGraylist(false); });
+        users = std::async(std::launch::async, [] { return GetUserDataTree(true); });
+        EXPECT_EQ(users.wait_for(std::chrono::milliseconds(500)), std::future_status::timeout);
+        EXPECT_EQ(unloadByHand(temporaryHives().at(0)), ERROR_SUCCESS);
+        // The next line says that this hive cannot be unloaded.
+        log_.onNextLine([&] {
+            published = GetGraylist(false);
+            published->Release();
+        });
+    });
+    const PathTree* const built = GetGraylist(true);
+    EXPECT_EQ(published, built);
+    EXPECT_EQ(users.get(), GetUserDataTree(false));
+    // The waiter has no reference: with the builder's and the published one the tree goes.
+    EXPECT_EQ(waiter.get(), built);
+    FailingAllocations::watched = built;
+    built->Release();
+    EXPECT_EQ(FailingAllocations::watched, built);
     DropGraylist();
-    EXPECT_TRUE(IsGrayed(windows)) << "built again when there is none";
-    DropGraylist();
+    EXPECT_EQ(FailingAllocations::watched, nullptr);
 }
 
 // The watcher's own work on the real system; only the waiting is left out.

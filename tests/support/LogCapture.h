@@ -1,5 +1,6 @@
 #pragma once
 
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -15,11 +16,14 @@ class LogCapture {
     class Target : public wxLog {
       public:
         std::vector<std::string> lines;
+        std::function<void()> onNextLine;
 
       protected:
         void DoLogTextAtLevel(wxLogLevel level, const wxString& text) override
         {
             lines.push_back(std::to_string(level) + ": " + toUtf8(view(text)));
+            if (const auto action = std::exchange(onNextLine, nullptr))
+                action();
         }
     };
 
@@ -38,6 +42,11 @@ class LogCapture {
     std::vector<std::string> take()
     {
         return std::move(target_.lines);
+    }
+    // Called once, on the thread that logs: so a test acts in the middle of what it tests.
+    void onNextLine(std::function<void()> action)
+    {
+        target_.onNextLine = std::move(action);
     }
 
   private:
