@@ -138,7 +138,8 @@ void shutDownDatabaseLibrary() noexcept
 }
 
 DbException::DbException(int code, const wxString& detail)
-    : code_(code), message_(wxString::Format(L"%s[%d]: ", nameOf(code), code) + detail), utf8_(toUtf8(view(message_)))
+    : code_(code), message_(nameOf(code) + (L'[' + std::to_wstring(code) + L"]: ") + detail),
+      utf8_(toUtf8(view(message_)))
 {
 }
 
@@ -204,6 +205,9 @@ int DbQuery::fieldText(int index, const char*& text)
 {
     sqlite3_stmt* const held = statementWith(index);
     text = reinterpret_cast<const char*>(sqlite3_column_text(held, index));
+    // Null stands for NULL too; SQLite reports a failed conversion by the connection's error code only.
+    if (!text && sqlite3_errcode(connection_) == SQLITE_NOMEM)
+        throw DbException(SQLITE_NOMEM, errorText(connection_));
     return sqlite3_column_bytes(held, index);
 }
 
@@ -415,7 +419,8 @@ void DbConnection::beginTransaction(int mode)
 
 void DbConnection::commitTransaction()
 {
-    execDML(wxString(L"commit transaction"));
+    // As narrow text it allocates nothing: the lock goes even where no memory is left.
+    execDML("commit transaction");
 }
 
 void DbConnection::rollbackTransaction()

@@ -57,7 +57,8 @@ class DbQuery {
 
     // True when the cursor stands on a row; call it before the first one too.
     bool nextRow();
-    // The column as UTF-8, or a blob as its bytes; valid until the next step. Returns the length in bytes.
+    // Points `text` to the column as UTF-8, or to a blob's bytes, valid until the next step; null for NULL. Returns the
+    // length in bytes.
     int fieldText(int index, const char*& text);
     int fieldType(int index);
     int fieldInt(int index, int valueIfNull);

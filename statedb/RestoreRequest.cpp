@@ -103,16 +103,14 @@ bool RestoreRequestWriter::requestRestore(const RestorePlan& files, const wxStri
 
 void RestoreRequestWriter::recover() noexcept
 {
-    // The library may have rolled back by itself, and then there is nothing to roll back: either way nothing is half
-    // written.
-    const auto attempt = [](auto step) {
-        try {
-            step();
-        } catch (...) {
-        }
-    };
-    attempt([&] { connection_->rollbackTransaction(); });
-    attempt([&] { connection_->beginTransaction(kPlainTransaction); });
+    try {
+        connection_->rollbackTransaction();
+        connection_->beginTransaction(kPlainTransaction);
+    } catch (...) {
+        // The rows may still be in an open transaction, which the commit in close() would store. Closing the connection
+        // rolls it back. SQLite may also have rolled back by itself; then close() has nothing to commit.
+        connection_.reset();
+    }
 }
 
 void RestoreRequestWriter::close()

@@ -13,7 +13,8 @@ class RestoreRequestWriter {
   public:
     // Opens the database and begins a transaction. On failure requestRestore writes nothing.
     void open();
-    // True when the rows have been written.
+    // True when the rows have been written and the next transaction begun. A failure that cannot be rolled back closes
+    // the connection.
     bool requestRestore(const RestorePlan& files, const wxString& machineId, const wxString& machineAlias,
                         const wxString& encryptionKey);
     void close();

@@ -56,8 +56,8 @@ FolderStateTable::~FolderStateTable()
     try {
         select_.finalize();
         replace_.finalize();
-    } catch (const DbException&) {
-        // Their last run failed, which its caller has been told.
+    } catch (...) {
+        // Their last run failed, which its caller has been told. What is not finalized yet goes with the members.
     }
     // The delete statement goes after the connection, with the members.
     connection_.close();
@@ -76,8 +76,9 @@ FolderStateTable::ReadScope::~ReadScope()
     table_.knownParent_.clear();
     try {
         table_.connection_.commitTransaction();
-    } catch (const DbException&) {
-        // Nothing was written; a transaction that the library has ended by itself is gone already.
+    } catch (...) {
+        // Nothing was written. Either SQLite has ended the transaction by itself, or the lock lasts until the table is
+        // destroyed.
     }
 }
 

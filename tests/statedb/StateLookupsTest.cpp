@@ -1,7 +1,10 @@
 #include "statedb/StateLookups.h"
 
+#include <optional>
+
 #include <gtest/gtest.h>
 
+#include "tests/support/Allocations.h"
 #include "tests/support/Registry.h"
 
 namespace tavi {
@@ -39,9 +42,14 @@ TEST(StateLookups, FoldersInheritFromTheNearestRecordedOne)
     EXPECT_EQ(states.getFolderState(L"C:\\s6"), 5);
     EXPECT_EQ(states.getFolderState(L"C:\\s6\\x"), 7);
     writer.execDML("UPDATE filesystem SET state=2 WHERE folder='C:\\s6'");
-    const FolderStateTable::ReadScope reading(states);
+    std::optional<FolderStateTable::ReadScope> reading(std::in_place, states);
     EXPECT_EQ(states.getFolderState(L"C:\\s6\\x"), 8); // not what was so before
     EXPECT_EQ(states.getFolderState(L"C:\\s4\\y"), 4);
+    {
+        const test::FailingAllocations failing(0);
+        reading.reset();
+    }
+    EXPECT_EQ(writer.execDML("UPDATE filesystem SET state=5 WHERE folder='C:\\s6'"), 1);
 }
 
 } // namespace

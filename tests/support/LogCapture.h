@@ -43,6 +43,13 @@ class LogCapture {
     {
         return std::move(target_.lines);
     }
+    std::string takeText()
+    {
+        std::string text;
+        for (const std::string& line : take())
+            text += line;
+        return text;
+    }
     // Called once, on the thread that logs: so a test acts in the middle of what it tests.
     void onNextLine(std::function<void()> action)
     {

@@ -4,6 +4,38 @@
 
 namespace tavi::test {
 
+// While it lives, `failing` allocations of SQLite fail once `succeeding` have succeeded. For one thread that uses
+// SQLite.
+class TestHeap {
+  public:
+    explicit TestHeap(int succeeding, int failing = 1 << 30)
+    {
+        left_ = succeeding;
+        failing_ = failing;
+    }
+    ~TestHeap()
+    {
+        failing_ = 0;
+    }
+
+  private:
+    static bool fails()
+    {
+        return failing_ > 0 && left_-- <= 0 && failing_-- > 0;
+    }
+    static inline int left_ = 0, failing_ = 0;
+    static inline sqlite3_mem_methods real_;
+    // SQLite takes other methods only before its first use. Without lookaside small blocks come from them too.
+    static inline const bool installed_ = [] {
+        sqlite3_config(SQLITE_CONFIG_GETMALLOC, &real_);
+        sqlite3_mem_methods methods = real_;
+        methods.xMalloc = [](int size) { return fails() ? nullptr : real_.xMalloc(size); };
+        methods.xRealloc = [](void* block, int size) { return fails() ? nullptr : real_.xRealloc(block, size); };
+        sqlite3_config(SQLITE_CONFIG_MALLOC, &methods);
+        return sqlite3_config(SQLITE_CONFIG_LOOKASIDE, 0, 0) == SQLITE_OK;
+    }();
+};
+
 // Takes the place of the database library's file system for as long as it lives: waiting costs no time, and the disk
 // can be full.
 class TestDisk {
