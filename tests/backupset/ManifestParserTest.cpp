@@ -1,5 +1,3 @@
-#include <algorithm>
-
 #include <gtest/gtest.h>
 
 #include "tests/backupset/ManifestSupport.h"
@@ -78,8 +76,10 @@ TEST(ManifestParser, TakesTheTextApart)
         EXPECT_EQ(unpacked ? unpacked->textLength() : 0, unpacked ? countUtf16Units(text) + 1 : 0);
         for (std::size_t slice = 1; slice < text.size(); ++slice) {
             ManifestParser parser;
-            for (std::size_t at = 0; at < text.size(); at += slice)
-                parser.feed(text.data() + at, std::min(slice, text.size() - at));
+            for (std::size_t at = 0; at < text.size(); at += slice) {
+                const std::string part = text.substr(at, slice);
+                parser.feed(part.c_str(), part.size());
+            }
             ASSERT_EQ(dump(held(parser.finish(countUtf16Units(text)))), expected) << "in slices of " << slice;
         }
     }

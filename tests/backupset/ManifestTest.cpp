@@ -3,7 +3,9 @@
 #include <algorithm>
 #include <map>
 #include <random>
+#include <thread>
 
+#include "core/PublishedPointer.h"
 #include "tests/backupset/ManifestSupport.h"
 
 namespace tavi {
@@ -26,6 +28,36 @@ TEST(Manifest, ExistenceAtATime)
     EXPECT_FALSE(manifest->FindPatches(L"C:\\deleted")->existsAt(kAnyTime));
     EXPECT_EQ(manifest->FindPatches(L"C:\\kept")->decidingAt(15), std::size_t{0});
     EXPECT_EQ(manifest->FindPatches(L"C:\\kept")->decidingAt(9), std::nullopt);
+}
+
+// Readers keep references beyond later swaps; each manifest they hold must be whole.
+TEST(Manifest, StaysWholeForItsReadersWhileOthersReplaceIt)
+{
+    PublishedPointer<const Manifest> published;
+    std::atomic<bool> done{false};
+    std::vector<std::thread> readers;
+    for (int reader = 0; reader < 3; ++reader)
+        readers.emplace_back([&] {
+            std::vector<ManifestRef> kept(4);
+            for (std::size_t turn = 0; !done; ++turn) {
+                kept[turn % kept.size()] = ManifestRef(published.acquire());
+                for (const ManifestRef& manifest : kept) {
+                    const auto patches = manifest ? manifest->FindPatches(L"C:\\a") : std::nullopt;
+                    ASSERT_TRUE(!manifest || patches);
+                    ASSERT_TRUE(!manifest || utf8(manifest->hash()) == std::to_string((*patches)[0].timestamp()));
+                }
+            }
+        });
+    for (int version = 1; version <= 400; ++version) {
+        const std::string number = std::to_string(version);
+        const Manifest* const next =
+            Manifest::Parse(fromUtf8("USER\n_hash|" + number + "\n\n\nFILES\nC:\\a\n" + number + ":1:2:3:0:x:0:40"));
+        next->AddRef();
+        published.replace(next);
+    }
+    done = true;
+    for (std::thread& reader : readers)
+        reader.join();
 }
 
 std::u16string utf16(const wxString& text)
