@@ -1,0 +1,74 @@
+#include <cstdint>
+#include <cstdlib>
+#include <set>
+#include <string>
+#include <string_view>
+
+#include "tests/backupset/PathTreeModel.h"
+
+namespace {
+
+using namespace tavi;
+
+constexpr std::size_t kMostRules = 40;
+constexpr unsigned kStates = 10; // 9 is unknown
+constexpr unsigned kDeepest = 6;
+constexpr const char* kNames = "abc";
+
+// Takes the input apart; behind its end come zeros.
+class Bytes {
+  public:
+    Bytes(const std::uint8_t* bytes, std::size_t length) : left_(reinterpret_cast<const char*>(bytes), length) {}
+    bool empty() const
+    {
+        return left_.empty();
+    }
+    std::uint8_t next()
+    {
+        if (left_.empty())
+            return 0;
+        const auto byte = static_cast<std::uint8_t>(left_.front());
+        left_.remove_prefix(1);
+        return byte;
+    }
+
+  private:
+    std::string_view left_;
+};
+
+} // namespace
+
+// The first byte seeds the numbers of entries; each rule is a byte of state and depth and one byte per name.
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t length)
+{
+    Bytes input(bytes, length);
+    const std::size_t seed = input.next();
+    // None at all, fewer entries than names, as many, or more.
+    const EntryCounter counter = [seed](const wxString& folder, bool) {
+        std::size_t sum = seed;
+        for (const wchar_t character : view(folder))
+            sum = sum * 31 + static_cast<std::size_t>(character);
+        return static_cast<std::uint32_t>(sum % 1009 % 5);
+    };
+    PathTree* const tree = PathTree::Create(false, counter);
+    tree->AddRef();
+    test::PathTreeModel model(counter);
+    std::set<std::wstring> asked;
+    for (std::size_t rule = 0; rule < kMostRules && !input.empty(); ++rule) {
+        const std::uint8_t head = input.next();
+        std::wstring path;
+        for (unsigned depth = head / kStates % kDeepest + 1; depth-- > 0;) {
+            path += (path.empty() ? L"" : L"\\");
+            path += static_cast<wchar_t>(kNames[input.next() % 3]);
+            asked.insert({path, path + L"\\a", path + L"\\c\\b"});
+        }
+        tree->Insert(path, head % kStates);
+        model.insert(path, head % kStates);
+    }
+    for (const std::wstring& question : asked) {
+        if (tree->Lookup(question) != model.lookup(question))
+            std::abort();
+    }
+    tree->Release();
+    return 0;
+}
