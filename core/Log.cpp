@@ -14,7 +14,7 @@ namespace tavi {
 namespace {
 
 constexpr int kInstallReads = 31;
-constexpr DWORD kInstallReadInterval = 1000;
+constexpr unsigned long kInstallReadIntervalMs = 1000;
 constexpr std::size_t kLongestMessage = 4095;
 // Above the longest line in bytes, so that each line is one write and processes that share the file do not tear it.
 constexpr std::size_t kFileBuffer = 32768;
@@ -60,11 +60,16 @@ class FileLogTarget : public wxLogStderr {
 
 bool OpenLog(unsigned long level)
 {
+    return OpenLog(level, [](unsigned long milliseconds) { Sleep(milliseconds); });
+}
+
+bool OpenLog(unsigned long level, const std::function<void(unsigned long)>& sleep)
+{
     // The host may be up before the service has been installed; the wait inside process attach is deliberate.
     for (int reads = 1; GetDataFilePath(kDataDirectory).empty(); ++reads) {
         if (reads == kInstallReads)
             return false;
-        Sleep(kInstallReadInterval);
+        sleep(kInstallReadIntervalMs);
     }
     const wxString path = GetDataFilePath(kLogFile);
     if (std::FILE* file = _wfopen(path.wc_str(), L"a")) {

@@ -1,5 +1,7 @@
 #pragma once
 
+#include <functional>
+
 // The module's lines in the service's shared log file. Written with the library's log functions (wxLogError and so on)
 // from any thread; each line is in the file, whole, when the call returns.
 namespace tavi {
@@ -8,6 +10,8 @@ namespace tavi {
 // `level`. False when the directory never became known: then nothing was set up. A file that cannot be opened still
 // answers true.
 bool OpenLog(unsigned long level);
+// As above, for a caller that brings its own wait, in milliseconds.
+bool OpenLog(unsigned long level, const std::function<void(unsigned long)>& sleep);
 
 // Closes the file, so that nothing stays open when the module is unloaded. No thread may log afterwards.
 void CloseLog() noexcept;

@@ -76,5 +76,25 @@ TEST(Log, LinesOfAnyThreadReachTheFileAtOnceOrThePreviousTarget)
     wxLog::SetLogLevel(levelBefore);
 }
 
+TEST(Log, WaitsThirtySecondsForTheDataDirectory)
+{
+    test::InstalledService service;
+    service.install().DeleteValue(L"DataPath");
+    test::LogCapture log;
+    wxLog* const target = wxLog::GetActiveTarget();
+    for (const std::size_t installedAfter : {31u, 30u}) {
+        std::vector<unsigned long> sleeps;
+        const bool opened = OpenLog(wxLOG_Max, [&](unsigned long milliseconds) {
+            sleeps.push_back(milliseconds);
+            if (sleeps.size() == installedAfter)
+                service.install().SetValue(L"DataPath", wxString(service.file(L"")));
+        });
+        EXPECT_EQ(sleeps, std::vector<unsigned long>(30, 1000));
+        EXPECT_EQ(opened, installedAfter == 30);
+        EXPECT_EQ(wxLog::GetActiveTarget() != target, opened);
+    }
+    CloseLog();
+}
+
 } // namespace
 } // namespace tavi
