@@ -478,7 +478,7 @@ class AnHour : public WatcherServices {
 
     WatcherState state;
     std::uint32_t slept = 0, rounds = 0, loads = 0, builds = 0;
-    std::array<std::size_t, 3> early{};
+    Counts early;
 };
 
 TEST(ManifestWatcher, KeepsItsCountsThroughAnHourOfRounds)
