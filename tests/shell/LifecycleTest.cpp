@@ -1,10 +1,16 @@
 #include "shell/Lifecycle.h"
 
+#include <atomic>
 #include <stdexcept>
+#include <thread>
 
 #include <gtest/gtest.h>
 
+#include "backupset/CurrentManifest.h"
 #include "core/Handles.h"
+#include "statedb/Database.h"
+#include "tests/support/Counts.h"
+#include "tests/support/Dialogs.h"
 
 namespace tavi {
 namespace {
@@ -47,6 +53,38 @@ TEST(Lifecycle, TheRuntimesShareOfAThreadOutlivesAnExceptionInFlight)
     }
     EXPECT_EQ(caught, "kept");
     releaseThreadRuntime();
+}
+
+TEST(Lifecycle, TheFirstManifestIsNullAndItsWatcherTheOnlyOne)
+{
+    const test::InstalledService service;
+    const test::LogCapture log;
+    const std::size_t before = test::countThreads();
+    const auto isLoaded = [] { return static_cast<bool>(ManifestRef(GetCurrentManifest())); };
+    const auto hasWatcher = [&](bool more) {
+        return test::waitUntil([&] { return test::countThreads() == before + more; });
+    };
+    DbConnection database;
+    database.open(service.file(L"tavistate.dat"));
+    database.execDML("BEGIN EXCLUSIVE"); // holds up the load
+    std::vector<std::thread> callers(8);
+    for (std::thread& caller : callers)
+        caller = std::thread([&] { EXPECT_FALSE(isLoaded()); });
+    for (std::thread& caller : callers)
+        caller.join();
+    EXPECT_TRUE(!isLoaded() && hasWatcher(true));
+    database.execDML("COMMIT");
+    EXPECT_TRUE(test::waitUntil(isLoaded));
+
+    // Takes the mutex of the start for this thread and keeps it.
+    StopManifestWatcher();
+    static std::atomic<bool> isNull{false};
+    EXPECT_TRUE(hasWatcher(false));
+    std::thread([&] { isNull = !isLoaded(); }).detach();
+    EXPECT_TRUE(test::waitUntil([] { return isNull.load(); })) << "the call waits, or there is a manifest";
+    EXPECT_TRUE(hasWatcher(false)) << "nothing was started";
+    EXPECT_TRUE(test::waitUntil(isLoaded) && hasWatcher(true)) << "by the owner of the mutex";
+    StopManifestWatcher();
 }
 
 } // namespace

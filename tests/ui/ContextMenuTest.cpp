@@ -1,5 +1,7 @@
 #include "ui/ContextMenu.h"
 
+#include <thread>
+
 #include <malloc.h>
 
 #include "backupset/CurrentManifest.h"
@@ -33,19 +35,19 @@ struct ContextMenuTest : test::UiTest {
 
 TEST_F(ContextMenuTest, InsertsTheCommandThatFits)
 {
-    const std::tuple<Selection, UINT, std::wstring> cases[] = {
-        {one, CMF_NORMAL, L"-|Restore Previous Version|Open|"},
-        {folder, CMF_EXPLORE, L"-|Restore Files in Folder|Open|"},
-        {files, CMF_NORMAL, L"-|Restore Previous Versions|Open|"},
-        {mixed, CMF_CANRENAME | 0x100, L"-|Restore Files|Open|"},
-        {none, CMF_NORMAL, L"-|Open|"},
-        {one, CMF_DEFAULTONLY, L"Open|"},
-        {one, CMF_NOVERBS | CMF_EXPLORE, L"Open|"},
+    const std::tuple<Selection, UINT, UINT, std::wstring> cases[] = {
+        {one, 0, CMF_NORMAL, L"-|Restore Previous Version|Open|"},
+        {folder, 1, CMF_EXPLORE, L"Open|-|Restore Files in Folder|"},
+        {files, 1, CMF_NORMAL, L"Open|-|Restore Previous Versions|"},
+        {mixed, 0, CMF_CANRENAME | 0x100, L"-|Restore Files|Open|"},
+        {none, 1, CMF_NORMAL, L"Open|-|"},
+        {one, 0, CMF_DEFAULTONLY, L"Open|"},
+        {one, 0, CMF_NOVERBS | CMF_EXPLORE, L"Open|"},
     };
-    for (const auto& [selection, flags, expected] : cases) {
+    for (const auto& [selection, index, flags, expected] : cases) {
         const HMENU menu = CreatePopupMenu();
         AppendMenuW(menu, MF_STRING, 1, L"Open");
-        const UINT used = insertMenuItems(menu, 0, kFirstId, flags, selection);
+        const UINT used = insertMenuItems(menu, index, kFirstId, flags, selection);
         std::wstring texts;
         for (UINT i = 0; static_cast<int>(i) < GetMenuItemCount(menu); ++i) {
             wchar_t text[200] = L"";
@@ -125,6 +127,25 @@ TEST_F(ContextMenuTest, AnswersVerbsAndHelp)
             MultiByteToWideChar(CP_ACP, 0, narrow, -1, wide, 120);
         EXPECT_EQ(std::wstring(wide), test.text);
     }
+}
+
+TEST_F(ContextMenuTest, InvokesByOffsetAndWithAManifestOnly)
+{
+    const auto invoke = [&](LPCSTR verb, HRESULT result, bool opens) {
+        CMINVOKECOMMANDINFO info{};
+        info.lpVerb = verb;
+        EXPECT_EQ(invokeCommand(info, one), result);
+        EXPECT_EQ(moduleRefCount(), opens ? 1 : 0);
+    };
+    invoke("TaviRestore", E_INVALIDARG, false);
+    for (const UINT offset : {1u, 2u, 3u})
+        invoke(MAKEINTRESOURCEA(offset), offset == 3 ? E_INVALIDARG : S_OK, false);
+    invoke(MAKEINTRESOURCEA(0), S_OK, true);
+    test::click(test::waitDialog(L"Restore Files"), IDCANCEL);
+    test::waitForThreads();
+    // Keeps the start of a watcher, and so a new manifest, from every other thread.
+    StopManifestWatcher();
+    std::thread([&] { invoke(MAKEINTRESOURCEA(0), S_OK, false); }).join();
 }
 
 using MenuBitmapTest = test::UiTest;

@@ -32,6 +32,8 @@ void offer(Pages& pages, const PathSet& paths)
     addPropertyPage({paths, 0, 1, false, {}}, ManifestRef(manifest), take, reinterpret_cast<LPARAM>(&pages));
 }
 
+// Wine ignores the page description's reference counter. Windows adds one to each module count below while its page
+// exists.
 TEST_F(PropertyPageTest, IsOfferedForWhatIsBackedUp)
 {
     const std::pair<PathSet, std::size_t> cases[] = {

@@ -77,9 +77,7 @@ TEST_F(SelectionTest, TakesManyItemsButNoneTooLong)
         items.emplace_back(ILClone(items[0].get()), ILFree);
         std::memcpy(reinterpret_cast<char*>(items.back().get()) + place, std::to_wstring(i).c_str(), 10);
     }
-    const DWORD start = GetTickCount();
     const PathSet paths = collect(parent, items);
-    EXPECT_LT(GetTickCount() - start, 3000u);
     EXPECT_EQ(paths.size(), 70000u);
     EXPECT_EQ(paths.count(parent + L"\\79999" + name.substr(5)), 1u);
 }

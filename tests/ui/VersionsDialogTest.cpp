@@ -10,6 +10,7 @@
 
 #include "statedb/Database.h"
 #include "tests/support/Dialogs.h"
+#include "ui/CopyTarget.h"
 #include "ui/resource.h"
 
 namespace tavi {
@@ -114,7 +115,11 @@ TEST_F(VersionsDialogTest, IsReadyForTheKeyboard)
     click(waitDialog(L"Tavi Remote Backup"), IDCANCEL);
     waitForThreads();
     dialog = open(selectionOf({L"C:\\d\\deleted.txt"}), kVersions);
+    // Without a version, Enter does nothing and leaves the window to Esc. The color is set after the key was handled.
     PostMessageW(listOf(dialog), WM_KEYDOWN, VK_RETURN, 0);
+    PostMessageW(listOf(dialog), LVM_SETTEXTCOLOR, 0, 0x123456);
+    EXPECT_TRUE(waitUntil([&] { return ListView_GetTextColor(listOf(dialog)) == 0x123456; }));
+    EXPECT_TRUE(IsWindowEnabled(dialog)) << "no box is open";
     PostMessageW(listOf(dialog), WM_KEYDOWN, VK_ESCAPE, 0);
     waitForThreads();
 }
@@ -225,6 +230,33 @@ TEST_F(VersionsDialogTest, ShortensALongNameAndTranslates)
     EXPECT_NE(message.find(L"xend.txt are backed up"), std::wstring::npos);
     EXPECT_LT(message.length(), 250u);
     click(dialog, IDCANCEL);
+}
+
+TEST_F(VersionsDialogTest, SharesWholeComponentsAndLooksBehindTheFolder)
+{
+    const wxString target = in(L"t\\"), deep = L"C:\\" + wxString(L'd', 300);
+    for (const wchar_t* name : {L"t", L"t\\x"})
+        CreateDirectoryW(in(name).wc_str(), nullptr);
+    const std::tuple<PathSet, wxString, bool> cases[] = {
+        {{}, L"", false},
+        {{L"C:\\a\\none"}, L"C:\\a\\none", true}, // the target is the folder itself
+        {{L"C:\\"}, L"C:\\", true},
+        {{L"C:\\a\\n", L"C:\\a\\X"}, L"C:\\a", true},
+        {{L"C:\\a\\xx", L"C:\\a\\xy"}, L"C:\\a", false},
+        {{L"C:\\a", L"C:\\a\\x"}, L"C:\\a", true},
+        {{L"C:\\n", L"C:\\m"}, L"C:\\", false},
+        {{L"C:\\Dir\\N", L"c:\\dIR\\m"}, L"C:\\Dir", false},
+        {{L"C:\\n", L"D:\\n"}, L"", false},
+        {{L"C:\\", L"D:\\"}, L"", false},
+        // The odd one of three comes out of the set last in one of the two.
+        {{L"C:\\a\\x", L"C:\\a\\b\\n", L"C:\\a\\b\\m"}, L"C:\\a", true},
+        {{L"C:\\a\\b\\n", L"C:\\a\\b\\m", L"C:\\a\\x"}, L"C:\\a", true},
+        {{deep + L"\\n", deep + L"\\m"}, deep, false},
+    };
+    for (const auto& [paths, prefix, exists] : cases) {
+        EXPECT_TRUE(commonPrefix(paths).IsSameAs(prefix, false)) << commonPrefix(paths) << " for " << prefix;
+        EXPECT_EQ(anyTargetExists(paths, prefix, target), exists) << prefix;
+    }
 }
 
 } // namespace
