@@ -3,12 +3,13 @@
 #include <algorithm>
 #include <cstdio>
 #include <fstream>
-#include <memory>
 #include <numeric>
 #include <random>
 #include <stdexcept>
 
 #include <zlib.h>
+
+#include "backupset/StoredManifest.h"
 
 namespace tavi::bench {
 namespace {
@@ -148,17 +149,31 @@ StoredText storedText(const std::string& dataFolder, std::uint32_t files, FileOr
     return made;
 }
 
-std::vector<char> readBlob(const StoredText& text)
+std::vector<char> readBlob(const std::string& file)
 {
-    const std::unique_ptr<std::FILE, int (*)(std::FILE*)> file(std::fopen(text.file.c_str(), "rb"), std::fclose);
-    if (!file)
-        throw std::runtime_error("cannot open " + text.file);
-    std::fseek(file.get(), 0, SEEK_END);
-    std::vector<char> blob(static_cast<std::size_t>(std::ftell(file.get())));
-    std::rewind(file.get());
-    if (std::fread(blob.data(), 1, blob.size(), file.get()) != blob.size())
-        throw std::runtime_error("cannot read " + text.file);
+    std::ifstream in(file, std::ios::binary | std::ios::ate);
+    std::vector<char> blob(in ? static_cast<std::size_t>(in.tellg()) : 0);
+    in.seekg(0);
+    if (!in.read(blob.data(), static_cast<std::streamsize>(blob.size())))
+        throw std::runtime_error("cannot read " + file);
     return blob;
+}
+
+ManifestRef whole(const Manifest* manifest, std::uint32_t files)
+{
+    if (!manifest)
+        throw std::runtime_error("the bench set is no manifest");
+    manifest->AddRef();
+    ManifestRef held(manifest);
+    if (manifest->fileCount() != files)
+        throw std::runtime_error("the manifest lacks files");
+    return held;
+}
+
+ManifestRef loadSet(const std::string& file, std::uint32_t files)
+{
+    const std::vector<char> blob = readBlob(file);
+    return whole(parseStoredManifest(blob.data(), blob.size()), files);
 }
 
 // What no reader can do without: the same blob, inflated into 64 KB and forgotten.

@@ -67,7 +67,7 @@ void Bench::report(const Figure& figure)
     char bound[32] = "";
     if (bounded)
         std::snprintf(bound, sizeof bound, "%10.2f", figure.bound);
-    std::printf("%-60s %10.2f %10s %-6s %s\n", figure.name.c_str(), figure.value, bound, figure.unit.c_str(),
+    std::printf("%-80s %10.2f %10s %-6s %s\n", figure.name.c_str(), figure.value, bound, figure.unit.c_str(),
                 !bounded ? ""
                 : within ? "ok"
                          : "MISSED");
@@ -152,7 +152,7 @@ int main(int argc, char** argv)
         }
         const bool quick = std::count(arguments.begin(), arguments.end(), "--quick") != 0;
         Bench bench(arguments[0], quick);
-        std::printf("%-60s %10s %10s %-6s\n", "figure", "value", "bound", "unit");
+        std::printf("%-80s %10s %10s %-6s\n", "figure", "value", "bound", "unit");
         std::vector<std::string> wanted(arguments.begin() + 1, arguments.end());
         wanted.erase(std::remove(wanted.begin(), wanted.end(), "--quick"), wanted.end());
         for (const std::string& name : wanted)

@@ -147,7 +147,6 @@ void runExclusions(Bench& bench)
     const auto seconds = medianSeconds(bench.repetitions(), {[] { BuildGraylist(true); }, required});
     bench.report({"exclusions: build, 20 profiles / the system calls it needs", seconds[0] / seconds[1], 2, ""});
     bench.report({"exclusions: build", seconds[0] * 1000, kNoBound, "ms"});
-    bench.report({"exclusions: folders listed, each once", static_cast<double>(graylistListings()), kNoBound, ""});
     bench.report({"exclusions: memory kept after rebuilding", (workingSet() - before) / 1048576, 1, "MB"});
     DropGraylist();
 }

@@ -1,3 +1,4 @@
+#include <algorithm>
 #include <stdexcept>
 
 #include <windows.h>
@@ -17,7 +18,10 @@
 namespace tavi::bench {
 namespace {
 
-// A folder of empty files and the shell's own data object for all of them.
+constexpr unsigned kFiles = 10000;
+constexpr unsigned kManyItems = 70000;
+
+// A folder of empty files, and the shell's own data objects for them and for many more that do not exist.
 class BenchFolder {
   public:
     BenchFolder(std::wstring path, unsigned files) : path_(std::move(path)), files_(files)
@@ -39,9 +43,17 @@ class BenchFolder {
                 throw std::runtime_error("no item of a file");
             items_.push_back(item);
         }
-        if (FAILED(folder_->GetUIObjectOf(nullptr, files_, const_cast<LPCITEMIDLIST*>(items_.data()), IID_IDataObject,
-                                          nullptr, data_.outVoid())))
-            throw std::runtime_error("no data object");
+        // Copies of the first item, each with another number in its name.
+        const std::wstring name = file(0).substr(path_.size() + 1, 10);
+        for (unsigned i = files_; i < kManyItems; ++i) {
+            items_.push_back(ILClone(items_[0]));
+            auto* const begin = reinterpret_cast<wchar_t*>(items_.back());
+            wchar_t* const end = begin + ILGetSize(items_.back()) / sizeof(wchar_t);
+            wchar_t* const place = std::search(begin, end, name.begin(), name.end());
+            if (place == end)
+                throw std::runtime_error("no name in an item");
+            file(i).copy(place, name.size(), path_.size() + 1);
+        }
     }
     BenchFolder(const BenchFolder&) = delete;
     BenchFolder& operator=(const BenchFolder&) = delete;
@@ -55,20 +67,24 @@ class BenchFolder {
     }
     std::wstring file(unsigned i) const
     {
-        return path_ + L"\\file " + std::to_wstring(i) + L".txt";
+        return path_ + L"\\file " + std::to_wstring(10000 + i) + L".txt";
     }
-    IDataObject* data() const
+    ComPtr<IDataObject> data(unsigned items) const
     {
-        return data_.get();
+        ComPtr<IDataObject> data;
+        if (FAILED(folder_->GetUIObjectOf(nullptr, items, const_cast<LPCITEMIDLIST*>(items_.data()), IID_IDataObject,
+                                          nullptr, data.outVoid())))
+            throw std::runtime_error("no data object");
+        return data;
     }
     // The calls that no handler of this selection can do without: the shell's, the file system's and, unless `states`
     // is null, one question to the database for each file. Returns how many files there were.
-    unsigned requiredCalls(sqlite3_stmt* states) const
+    unsigned requiredCalls(IDataObject* data, sqlite3_stmt* states) const
     {
         FORMATETC request{static_cast<CLIPFORMAT>(RegisterClipboardFormatW(L"Shell IDList Array")), nullptr,
                           DVASPECT_CONTENT, -1, TYMED_HGLOBAL};
         STGMEDIUM medium{};
-        data_->GetData(&request, &medium);
+        data->GetData(&request, &medium);
         const auto* array = static_cast<const CIDA*>(GlobalLock(medium.hGlobal));
         unsigned found = 0;
         for (UINT i = 1; i <= array->cidl; ++i) {
@@ -95,12 +111,10 @@ class BenchFolder {
     unsigned files_;
     ComPtr<IShellFolder> folder_;
     std::vector<LPITEMIDLIST> items_;
-    ComPtr<IDataObject> data_;
 };
 
 void menuBench(Bench& bench)
 {
-    constexpr unsigned kFiles = 10000;
     const BenchInstall install(bench.dataFolder() + "/menu");
     install.stateDatabase().execDML("CREATE TABLE manifest(contents BLOB)");
     install.configDatabase().execDML("CREATE TABLE filesystem(state INTEGER, folder TEXT PRIMARY KEY);"
@@ -110,6 +124,7 @@ void menuBench(Bench& bench)
     OleInitialize(nullptr);
     {
         const BenchFolder folder(std::wstring(temporary) + L"tavi-menu-bench", kFiles);
+        const ComPtr<IDataObject> some = folder.data(kFiles), many = folder.data(kManyItems);
         FolderStateTable states;
         setModuleInstance(GetModuleHandleW(nullptr));
         // The watcher loads the empty manifest first, so that the versions of every file are asked for.
@@ -120,30 +135,33 @@ void menuBench(Bench& bench)
         sqlite3_open(toUtf8(view(GetConfigFilePath(kConfigDatabase))).c_str(), &database);
         sqlite3_prepare_v2(database, "SELECT state FROM filesystem WHERE folder=?", -1, &bare, nullptr);
         unsigned found = 0;
-        std::size_t selected = 0;
-        const auto times =
-            medianSeconds(bench.repetitions(), {
-                                                   [&] { found = folder.requiredCalls(nullptr); },
-                                                   [&] {
-                                                       sqlite3_exec(database, "BEGIN", nullptr, nullptr, nullptr);
-                                                       found = folder.requiredCalls(bare);
-                                                       sqlite3_exec(database, "COMMIT", nullptr, nullptr, nullptr);
-                                                   },
-                                                   [&] {
-                                                       Selection selection;
-                                                       captureSelection(nullptr, folder.data(), states, selection);
-                                                       selected = selection.paths.size();
-                                                       const HMENU menu = CreatePopupMenu();
-                                                       insertMenuItems(menu, 0, 1, CMF_NORMAL, selection);
-                                                       DestroyMenu(menu);
-                                                   },
-                                               });
+        std::size_t selected = 0, all = 0;
+        const auto times = medianSeconds(bench.repetitions(),
+                                         {
+                                             [&] { found = folder.requiredCalls(some.get(), nullptr); },
+                                             [&] {
+                                                 sqlite3_exec(database, "BEGIN", nullptr, nullptr, nullptr);
+                                                 found = folder.requiredCalls(some.get(), bare);
+                                                 sqlite3_exec(database, "COMMIT", nullptr, nullptr, nullptr);
+                                             },
+                                             [&] {
+                                                 Selection selection;
+                                                 captureSelection(nullptr, some.get(), states, selection);
+                                                 selected = selection.paths.size();
+                                                 const HMENU menu = CreatePopupMenu();
+                                                 insertMenuItems(menu, 0, 1, CMF_NORMAL, selection);
+                                                 DestroyMenu(menu);
+                                             },
+                                             [&] { collectPaths(nullptr, some.get(), GetDriveTypeW); },
+                                             [&] { all = collectPaths(nullptr, many.get(), GetDriveTypeW).size(); },
+                                         });
         sqlite3_finalize(bare);
         sqlite3_close(database);
-        if (found != kFiles || selected != kFiles)
+        if (found != kFiles || selected != kFiles || all != kManyItems)
             throw std::runtime_error("files are missing from the selection");
         bench.report({"menu query / required calls, 10000 files", times[2] / times[1], 1.3, "x"});
         bench.report({"menu query / the system calls among them", times[2] / times[0], kNoBound, "x"});
+        bench.report({"an item of 70000 / an item of 10000", times[4] / times[3] * kFiles / kManyItems, 1.3, "x"});
         bench.report({"menu query, 10000 files", times[2] * 1e3, kNoBound, "ms"});
         StopManifestWatcher();
         while (isWatcherActive())
