@@ -17,7 +17,7 @@ volatile std::size_t tooMuch = 64;
 
 [[gnu::noinline]] void copyBeyondTheArray()
 {
-    char bytes[16];
+    static char bytes[16]; // beyond the reach of the stack protector
     std::memcpy(bytes, "0123456789012345678901234567890123456789012345678901234567890123", tooMuch);
     asm volatile("" ::"r"(bytes) : "memory");
 }
