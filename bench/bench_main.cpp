@@ -90,7 +90,9 @@ std::vector<double> Bench::inOwnProcess(const std::string& child, const std::vec
     PROCESS_INFORMATION process{};
     if (!CreateProcessA(program, line.data(), nullptr, nullptr, FALSE, 0, nullptr, nullptr, &startup, &process))
         throw std::runtime_error("cannot start " + line);
-    WaitForSingleObject(process.hProcess, INFINITE);
+    constexpr DWORD kLimitMs = 15 * 60 * 1000;
+    if (WaitForSingleObject(process.hProcess, kLimitMs) != WAIT_OBJECT_0)
+        TerminateProcess(process.hProcess, 1);
     DWORD code = 1;
     GetExitCodeProcess(process.hProcess, &code);
     CloseHandle(process.hThread);
