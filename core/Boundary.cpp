@@ -8,15 +8,18 @@ namespace tavi {
 
 void logEscaped(const char* entry) noexcept
 {
-    // Out of memory or a failing log must not undo the boundary.
+    // Out of memory or a failing log must not undo the boundary. Not by the formatting calls: a destructor of theirs
+    // allocates, so that they would end the process where no memory is left.
     try {
+        wxString text = L"Unhandled exception in " + wxString::FromUTF8(entry);
         try {
             throw;
         } catch (const std::exception& error) {
-            wxLogError("Unhandled exception in %s: %s", wxString::FromUTF8(entry), wxString::FromUTF8(error.what()));
+            text += L": " + wxString::FromUTF8(error.what());
         } catch (...) {
-            wxLogError("Unhandled exception in %s", wxString::FromUTF8(entry));
         }
+        if (wxLog::IsEnabled())
+            wxLog::OnLog(wxLOG_Error, text, wxLogRecordInfo(nullptr, 0, nullptr, wxLOG_COMPONENT));
     } catch (...) {
     }
 }

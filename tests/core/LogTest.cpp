@@ -9,6 +9,7 @@
 #include <wx/textfile.h>
 
 #include "core/Boundary.h"
+#include "tests/support/Allocations.h"
 #include "tests/support/LogCapture.h"
 #include "tests/support/Registry.h"
 
@@ -58,6 +59,12 @@ TEST(Log, LinesOfAnyThreadReachTheFileAtOnceOrThePreviousTarget)
     EXPECT_GE(lines.size(), expected.size() + 50);
     for (std::size_t line = expected.size(); line < lines.size(); ++line)
         EXPECT_EQ(lines[line], "@ Error: " + std::string(1000, 'm') + ".");
+    // Wherever memory runs out the boundary holds.
+    for (int succeeding = 0; succeeding < 100; ++succeeding) {
+        const test::FailingAllocations few(succeeding);
+        guarded("need", [] { throw std::runtime_error("is known"); });
+    }
+    EXPECT_EQ(linesOf(service.file(L"tavi.log")).back(), "@ Error: Unhandled exception in need: is known");
     CloseLog();
     EXPECT_TRUE(DeleteFileW(service.file(L"tavi.log").c_str()));
 

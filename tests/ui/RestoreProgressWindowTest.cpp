@@ -143,10 +143,9 @@ TEST_F(RestoreProgressWindowTest, EndsUnseenWhenTheRestoreIsQuick)
 TEST_F(RestoreProgressWindowTest, StaysRegisteredThoughItsDialogCannotBeMade)
 {
     setModuleInstance(GetModuleHandleW(L"kernel32.dll"));
-    const auto threads = [] { return countNow()[2]; };
-    const std::size_t before = threads();
+    const std::size_t before = countThreads();
     RestoreProgressWindow::getOrCreate();
-    EXPECT_TRUE(waitUntil([&] { return threads() == before; }));
+    EXPECT_TRUE(waitUntil([&] { return countThreads() == before; }));
     EXPECT_EQ(log.take().size(), 1u);
     const auto item = text(L"item");
     tell(54, 0, item);
