@@ -18,6 +18,8 @@ class TemporaryFolder {
         static unsigned number = 0;
         path_ = std::filesystem::temp_directory_path() /
                 ("tavi" + std::to_string(GetCurrentProcessId()) + "-" + std::to_string(number++));
+        // A run that was ended left its folder behind, and the numbers of processes come again.
+        std::filesystem::remove_all(path_);
         std::filesystem::create_directory(path_);
     }
     TemporaryFolder(const TemporaryFolder&) = delete;
