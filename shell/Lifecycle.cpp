@@ -17,7 +17,7 @@ namespace tavi {
 namespace {
 
 constexpr unsigned long kLogLevel = 3;
-constexpr DWORD kStatusThreadPatience = 500;
+constexpr DWORD kStatusThreadPatienceMs = 500;
 
 struct HostName {
     const wchar_t* name;
@@ -83,10 +83,10 @@ void StartStatusThread() noexcept
 void StopStatusThread() noexcept
 {
     const KernelHandle thread(statusThread.releaseHandle());
-    // The thread's own last reference may be what unloads the module: then this runs on it, and it must not wait for
-    // itself.
-    if (thread && GetThreadId(thread.get()) != GetCurrentThreadId() &&
-        WaitForSingleObject(thread.get(), kStatusThreadPatience) != WAIT_OBJECT_0)
+    // A listener that has ended is past all code of the module, but may still need the loader lock, which the detach
+    // holds: to wait for it would be in vain. It may even be the thread that this runs on.
+    if (thread && statusThread.isActive() &&
+        WaitForSingleObject(thread.get(), kStatusThreadPatienceMs) != WAIT_OBJECT_0)
         TerminateThread(thread.get(), 0);
 }
 
