@@ -9,6 +9,7 @@
 
 #include "core/Boundary.h"
 #include "core/Handles.h"
+#include "core/ThreadLocals.h"
 
 // Of the C++ runtime, which declares it in no header.
 namespace __gnu_cxx { // NOLINT(bugprone-reserved-identifier)
@@ -53,6 +54,7 @@ struct LastRelease {
     ~LastRelease()
     {
         releaseThreadRuntime();
+        releaseAllThreadLocals();
         __gnu_cxx::__freeres();
     }
 };

@@ -1,0 +1,177 @@
+#include "core/ThreadLocals.h"
+
+#include <atomic>
+#include <cstddef>
+#include <cstdint>
+#include <cstdlib>
+#include <cstring>
+
+#include <malloc.h>
+#include <windows.h>
+
+#include "core/Boundary.h"
+
+namespace {
+
+// A variable as the compiler describes it, in its layout.
+struct Variable {
+    std::size_t size;
+    std::size_t alignment;
+    // 0 until the variable is used for the first time.
+    std::atomic<std::uintptr_t> number;
+    const void* initial;
+};
+
+// The variables of one thread, by number; in a list, so that the module can free those of threads that go on without
+// it.
+struct ThreadVariables {
+    ThreadVariables* next;
+    ThreadVariables** link;
+    std::uintptr_t count;
+    void* variables[1];
+};
+
+// Needs no clean-up, unlike a critical section.
+SRWLOCK lock = SRWLOCK_INIT;
+ThreadVariables* allThreads = nullptr;
+std::atomic<std::uintptr_t> lastNumber{0};
+std::atomic<DWORD> slot{TLS_OUT_OF_INDEXES};
+
+DWORD slotOfThreads() noexcept
+{
+    DWORD index = slot;
+    if (index != TLS_OUT_OF_INDEXES)
+        return index;
+    const DWORD created = TlsAlloc();
+    if (created == TLS_OUT_OF_INDEXES)
+        std::abort();
+    if (slot.compare_exchange_strong(index, created))
+        return created;
+    TlsFree(created);
+    return index;
+}
+
+std::uintptr_t numberOf(Variable& variable) noexcept
+{
+    std::uintptr_t number = variable.number;
+    if (number != 0)
+        return number;
+    const std::uintptr_t next = ++lastNumber;
+    return variable.number.compare_exchange_strong(number, next) ? next : number;
+}
+
+// Room for a few more than asked for; grows once or twice in the life of a thread.
+ThreadVariables* grow(ThreadVariables* before, std::uintptr_t count) noexcept
+{
+    const std::size_t capacity = count + 4;
+    auto* const grown =
+        static_cast<ThreadVariables*>(std::calloc(1, sizeof(ThreadVariables) + capacity * sizeof(void*)));
+    if (!grown)
+        return nullptr;
+    grown->count = capacity;
+    AcquireSRWLockExclusive(&lock);
+    if (before) {
+        std::memcpy(grown->variables, before->variables, before->count * sizeof(void*));
+        *before->link = before->next;
+        if (before->next)
+            before->next->link = before->link;
+    }
+    grown->next = allThreads;
+    grown->link = &allThreads;
+    if (allThreads)
+        allThreads->link = &grown->next;
+    allThreads = grown;
+    ReleaseSRWLockExclusive(&lock);
+    std::free(before);
+    return grown;
+}
+
+void* create(const Variable& variable) noexcept
+{
+    void* const created = _aligned_malloc(variable.size, variable.alignment);
+    if (created && variable.initial)
+        std::memcpy(created, variable.initial, variable.size);
+    else if (created)
+        std::memset(created, 0, variable.size);
+    return created;
+}
+
+void freeVariables(ThreadVariables* thread) noexcept
+{
+    for (std::uintptr_t i = 0; i < thread->count; ++i)
+        _aligned_free(thread->variables[i]);
+    std::free(thread);
+}
+
+void* variableOfThread(Variable& variable) noexcept
+{
+    const DWORD index = slotOfThreads();
+    const std::uintptr_t number = numberOf(variable);
+    auto* thread = static_cast<ThreadVariables*>(TlsGetValue(index));
+    if (!thread || thread->count < number) {
+        thread = grow(thread, number);
+        // Like the compiler's own: nothing can be thrown without these variables.
+        if (!thread || !TlsSetValue(index, thread))
+            std::abort();
+    }
+    void*& found = thread->variables[number - 1];
+    if (!found && !(found = create(variable)))
+        std::abort();
+    return found;
+}
+
+void releaseThread() noexcept
+{
+    const DWORD index = slot;
+    auto* const thread = index == TLS_OUT_OF_INDEXES ? nullptr : static_cast<ThreadVariables*>(TlsGetValue(index));
+    if (!thread)
+        return;
+    TlsSetValue(index, nullptr);
+    AcquireSRWLockExclusive(&lock);
+    *thread->link = thread->next;
+    if (thread->next)
+        thread->next->link = thread->link;
+    ReleaseSRWLockExclusive(&lock);
+    freeVariables(thread);
+}
+
+void NTAPI endOfThread(void*, DWORD reason, void*)
+{
+    tavi::guarded("end of a thread", [&] {
+        if (reason == DLL_THREAD_DETACH)
+            releaseThread();
+    });
+}
+
+} // namespace
+
+// Called by the code that the compiler generates for each use of a thread-local variable.
+extern "C" void* __emutls_get_address(void* variable); // NOLINT(bugprone-reserved-identifier)
+extern "C" void* __emutls_get_address(void* variable)  // NOLINT(bugprone-reserved-identifier)
+{
+    // The code around it may be about to ask for the error of the call before.
+    const DWORD error = GetLastError();
+    void* const found = variableOfThread(*static_cast<Variable*>(variable));
+    SetLastError(error);
+    return found;
+}
+
+// The loader calls what stands in this section; the letters behind the $ order it behind the runtime's own callbacks,
+// whose destructors may still use the variables.
+extern "C" {
+[[gnu::section(".CRT$XLX"), gnu::used]] const PIMAGE_TLS_CALLBACK tavishellEndOfThread = endOfThread;
+}
+
+namespace tavi {
+
+void releaseAllThreadLocals() noexcept
+{
+    while (ThreadVariables* const thread = allThreads) {
+        allThreads = thread->next;
+        freeVariables(thread);
+    }
+    if (const DWORD index = slot.exchange(TLS_OUT_OF_INDEXES); index != TLS_OUT_OF_INDEXES)
+        TlsFree(index);
+}
+
+} // namespace tavi
