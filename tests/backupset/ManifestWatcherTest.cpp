@@ -4,10 +4,17 @@
 #include <vector>
 
 #include <gtest/gtest.h>
-#include <wx/log.h>
+
+#include "statedb/Database.h"
+#include "tests/backupset/ManifestSupport.h"
+#include "tests/support/Allocations.h"
+#include "tests/support/LogCapture.h"
+#include "tests/support/Registry.h"
 
 namespace tavi {
 namespace {
+
+using namespace test;
 
 // The times are what the service's setting says, round by round; the third load is invalid and the fourth fails.
 class ScriptedServices : public WatcherServices {
@@ -32,7 +39,7 @@ class ScriptedServices : public WatcherServices {
     }
     void sleep(std::uint32_t milliseconds) override
     {
-        slept += milliseconds;
+        EXPECT_EQ(milliseconds, 500u);
         --naps;
     }
     bool isStopping() override
@@ -47,34 +54,65 @@ class ScriptedServices : public WatcherServices {
 
     WatcherState state;
     int naps = 0, loads = 0;
-    std::uint32_t rounds = 0, slept = 0;
+    std::uint32_t rounds = 0;
     std::vector<int> builds;
 };
 
 TEST(ManifestWatcher, ReloadsForALaterTimeRebuildsEvery18thRoundAndStopsWithinANap)
 {
-    const wxLogNull quiet;
+    const LogCapture log;
     // The n-th load is at n seconds, and a load does not take over the time that the service wrote.
     ScriptedServices services;
     services.naps = 10 * 55 + 3;
     RunManifestWatcher(services.state, services);
+    EXPECT_EQ(services.naps, 0);
     EXPECT_EQ(services.loads, 4);
     EXPECT_EQ(services.rounds, 55u);
-    EXPECT_EQ(services.slept, 55u * 5000 + 1500);
     EXPECT_EQ(services.builds, (std::vector<int>{-1, 18, 36, 54}));
     // The invalid and the failing one leave the one in force.
-    const ManifestRef current(services.state.manifest.acquire());
-    EXPECT_EQ(current ? current->hash() : wxString("none"), L"2");
+    EXPECT_EQ(dump(ManifestRef(services.state.manifest.acquire())), "2[] ");
 
+    // The first load is not skipped. A second run finds the manifest of the first: it loads a changed one only. The
+    // third round's time is later.
     ScriptedServices stopped;
-    RunManifestWatcher(stopped.state, stopped);
-    EXPECT_EQ(stopped.loads, 1); // the first load is not skipped
-    EXPECT_EQ(stopped.slept, 0u);
-    // A second run finds the manifest of the first: it loads a changed one only. The third round's time is later.
-    for (const int loads : {1, 1, 2, 2}) {
+    for (const int loads : {1, 1, 1, 2, 2}) {
         RunManifestWatcher(stopped.state, stopped);
         EXPECT_EQ(stopped.loads, loads) << stopped.rounds;
     }
+}
+
+TEST(ReadStoredManifest, IsEmptyWhereThereIsNoneAndWarnsOfFailures)
+{
+    LogCapture log;
+    InstalledService service;
+    const auto read = [&] {
+        EXPECT_EQ(dump(held(ReadStoredManifest())), "");
+        return log.takeText();
+    };
+    const std::string failed = "2: Warning: Failed to retrieve stored manifest ";
+    EXPECT_EQ(read(), failed + "(1: DB_ERROR[1]: )");
+    {
+        DbConnection database;
+        database.open(service.file(L"tavistate.dat"));
+        for (const char* const sql : {"CREATE TABLE manifest(contents)", "INSERT INTO manifest VALUES(NULL)",
+                                      "UPDATE manifest SET contents=x''", "UPDATE manifest SET contents=''"}) {
+            database.execDML(sql);
+            EXPECT_EQ(read(), "") << sql;
+        }
+        // No manifest, but so long that SQLite needs memory for its text.
+        database.execDML("UPDATE manifest SET contents=zeroblob(20000)");
+    }
+    const std::string invalid = read();
+    int succeeding = 0;
+    for (std::string lines; lines != invalid && succeeding < 1000; ++succeeding) {
+        const FailingAllocations failing(succeeding, Heap::sqlite);
+        lines = read();
+        ASSERT_TRUE(lines == invalid || lines.rfind(failed + "(7: DB_NOMEM[7]: ", 0) == 0) << succeeding << lines;
+    }
+    EXPECT_GT(succeeding, 20);
+    EXPECT_TRUE(DeleteFileW(service.file(L"tavistate.dat").c_str())) << "a connection has stayed open";
+    service.install().SetValue(L"DataPath", wxString(L"C:\\no such folder"));
+    EXPECT_EQ(read(), failed + "(14: DB_CANTOPEN[14]: unable to open database file)");
 }
 
 } // namespace

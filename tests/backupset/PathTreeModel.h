@@ -32,11 +32,8 @@ class PathTreeModel {
     PathState lookup(const std::wstring& path) const
     {
         for (std::wstring at = path; !at.empty(); at = parent(at)) {
-            const auto node = nodes_.find(at);
-            if (node == nodes_.end())
-                continue;
-            const PathState own = node->second;
-            return at == path || own > 8 ? own : static_cast<PathState>("878747678"[own] - '0');
+            if (const auto node = nodes_.find(at); node != nodes_.end())
+                return at == path ? node->second : static_cast<PathState>("8787476789"[node->second] - '0');
         }
         return 8;
     }
@@ -50,27 +47,24 @@ class PathTreeModel {
     void summarize(std::wstring path)
     {
         for (; !path.empty(); path = parent(path)) {
-            bool plain = false, marked = false, mixed = false;
             std::uint32_t children = 0;
+            int column = 0;
             for (const auto& [other, state] : nodes_) {
                 if (parent(other) != path)
                     continue;
                 ++children;
-                plain |= state == 0 || state == 1 || state == 8;
-                marked |= state >= 2 && state <= 7;
-                mixed |= state >= 2 && state <= 5;
+                column |= "1144442210"[state] - '0';
             }
             const std::uint32_t entries = counter_(path, false);
-            // Columns: nothing, plain, marked, both, mixed, mixed and plain. Rows: own states 0 to 9.
-            static const char* const others[] = {"002222", "757333", "002222", "757333", "646444",
-                                                 "757555", "646444", "757555", "002222", "000000"};
-            static const char* const whole[] = {"006222", "117333", "006222", "117333", "006222",
-                                                "117333", "006222", "117333", "006222", "000000"};
+            // Columns: bit 0 for children of state 0, 1 or 8, bit 1 for 6 or 7, bit 2 for 2 to 5. Rows: own states 0
+            // to 9.
+            static const char* const others[] = {"00222222", "75733333", "00222222", "75733333", "64644444",
+                                                 "75755555", "64644444", "75755555", "00222222", "00000000"};
+            static const char* const whole[] = {"00622222", "11733333", "00622222", "11733333", "00622222",
+                                                "11733333", "00622222", "11733333", "00622222", "00000000"};
             PathState& own = nodes_[path];
-            const PathState row = own > 8 ? 9 : own;
-            const int column = (mixed ? 4 : marked ? 2 : 0) + plain;
             if (entries > 0)
-                own = static_cast<PathState>((children == entries ? whole : others)[row][column] - '0');
+                own = static_cast<PathState>((children == entries ? whole : others)[own][column] - '0');
         }
     }
 

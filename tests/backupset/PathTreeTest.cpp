@@ -3,27 +3,11 @@
 
 #include <gtest/gtest.h>
 
+#include "core/Reference.h"
 #include "tests/backupset/PathTreeModel.h"
 
 namespace tavi {
 namespace {
-
-struct Held {
-    explicit Held(EntryCounter counter, bool foldersOnly = false)
-        : tree(PathTree::Create(foldersOnly, std::move(counter)))
-    {
-        tree->AddRef();
-    }
-    ~Held()
-    {
-        tree->Release();
-    }
-    PathTree* operator->() const
-    {
-        return tree;
-    }
-    PathTree* tree;
-};
 
 TEST(PathTree, AnswersAsAnObviousModelDoes)
 {
@@ -39,7 +23,7 @@ TEST(PathTree, AnswersAsAnObviousModelDoes)
         const EntryCounter counter = [seed](const wxString& folder, bool) {
             return static_cast<std::uint32_t>((std::hash<std::wstring>()(folder.ToStdWstring()) ^ seed) % 1009 % 5);
         };
-        Held tree(counter);
+        const Reference<PathTree> tree(PathTree::Create(false, counter));
         test::PathTreeModel model(counter);
         std::string rules;
         for (unsigned rule = 0, count = random() % 12 + 1; rule < count; ++rule) {
@@ -54,40 +38,24 @@ TEST(PathTree, AnswersAsAnObviousModelDoes)
     }
 }
 
-TEST(PathTree, KeepsItsRulesInPlainCases)
+// Where the model has no say.
+TEST(PathTree, TakesOddPathsAsTheyAreAndCountsAFolderOnce)
 {
-    using Rules = std::vector<std::pair<const wchar_t*, PathState>>;
-    const struct {
-        Rules rules;
-        std::uint32_t entries;
-        Rules answers;
-    } cases[] = {
-        {{{L"C:\\A", 0}}, 5, {{L"C:", 8}, {L"C:\\A", 8}, {L"", 0}}},
-        {{{L"C:\\A", 7}}, 5, {{L"C:", 2}, {L"C:\\", 2}, {L"C:\\B", 8}, {L"C:\\A\\x", 7}, {L"C:\\A", 7}, {L"c:\\A", 8}}},
-        {{{L"C:\\X", 7}, {L"C:\\X\\Y", 0}}, 5, {{L"C:\\X", 5}, {L"C:\\X\\Z", 7}, {L"C:\\X\\Y\\z", 8}}},
-        {{{L"C:\\X", 7}, {L"C:\\X\\Y", 0}}, 0, {{L"C:\\X", 7}, {L"C:\\X\\Z", 7}}}, // listed as empty
-        {{{L"C:\\X\\Y", 7}, {L"C:\\X", 0}}, 5, {{L"C:\\X\\Y", 8}, {L"C:\\X", 0}}},
-        {{{L"C:\\X", 7}, {L"C:\\Y", 7}}, 2, {{L"C:", 6}, {L"C:\\Z", 6}}},
-        {{{L"", 7}}, 5, {{L"", 0}, {L"\\x", 7}, {L"x", 8}}},
-    };
-    for (const auto& test : cases) {
-        std::map<wxString, int> counted;
-        Held tree(
-            [&](const wxString& folder, bool foldersOnly) {
-                EXPECT_TRUE(foldersOnly);
-                ++counted[folder];
-                return test.entries;
-            },
-            true);
-        for (const auto& [path, state] : test.rules)
-            tree->Insert(path, state);
-        for (const auto& [path, state] : test.answers)
-            EXPECT_EQ(tree->Lookup(path), state) << wxString(path).utf8_string();
-        for (const auto& [folder, times] : counted)
-            EXPECT_EQ(times, 1) << folder.utf8_string();
-    }
+    std::map<wxString, int> counted;
+    const Reference<PathTree> tree(PathTree::Create(true, [&](const wxString& folder, bool foldersOnly) {
+        EXPECT_TRUE(foldersOnly);
+        ++counted[folder];
+        return 5u;
+    }));
+    for (const wchar_t* const path : {L"C:\\A", L"C:\\B", L"C:\\B\\x", L""})
+        tree->Insert(path, 7);
+    const std::pair<const wchar_t*, PathState> answers[] = {
+        {L"", 0}, {L"x", 8}, {L"\\x", 7}, {L"C:\\", 2}, {L"c:\\A", 8}};
+    for (const auto& [path, state] : answers)
+        EXPECT_EQ(tree->Lookup(path), state) << wxString(path).utf8_string();
+    EXPECT_EQ(counted, (std::map<wxString, int>{{L"C:", 1}, {L"C:\\B", 1}}));
     // As deep as a path can be: neither filling nor freeing goes by recursion.
-    Held deep([](const wxString&, bool) { return 0u; });
+    const Reference<PathTree> deep(PathTree::Create(false, [](const wxString&, bool) { return 0u; }));
     std::wstring path(60000, L'\\');
     path[0] = L'x';
     deep->Insert(path.substr(0, 2000), 7);

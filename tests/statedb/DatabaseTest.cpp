@@ -1,7 +1,6 @@
 #include "statedb/Database.h"
 
 #include <functional>
-#include <vector>
 
 #include <gtest/gtest.h>
 
@@ -34,42 +33,42 @@ DbConnection opened()
 TEST(Database, ReportsMisuseAndFailures)
 {
     DbConnection connection = opened();
-    DbStatement moved = connection.compileStatement("SELECT 1");
-    const DbStatement taken = std::move(moved);
-    DbStatement insert = connection.compileStatement("INSERT INTO t VALUES(?,?)");
-    insert.bind(1, std::int32_t{1});
-    insert.execDML();
+    connection.execDML("INSERT INTO t(b) VALUES(1),(-9223372036854775807-1)");
+    DbStatement insert = connection.compileStatement("INSERT INTO t VALUES(1,?)");
     DbQuery one = connection.execQuery("SELECT a FROM t");
     const char* text = nullptr;
+    DbStatement select = connection.compileStatement("SELECT abs(b) FROM t ORDER BY a");
+    DbQuery failing = select.execQuery();
+    EXPECT_TRUE(failing.nextRow());
+    const DbStatement late = connection.compileStatement("SELECT 1");
+    // In this order. A row that fails empties its statement and cursor; a statement may outlive its connection.
     const std::pair<wxString, std::function<void()>> cases[] = {
-        {L"WDB_ERROR[1000]: No Database opened", [] { DbConnection().execDML("SELECT 1"); }},
         {L"WDB_ERROR[1000]: No Database opened", [] { DbStatement().execDML(); }},
         {L"WDB_ERROR[1000]: Statement not accessible", [&] { connection.compileStatement("").execDML(); }},
-        {L"WDB_ERROR[1000]: Statement not accessible", [&] { DbQuery().nextRow(); }},
-        {L"WDB_ERROR[1000]: Statement not accessible", [&] { moved.reset(); }},
         {L"WDB_ERROR[1000]: Invalid field index", [&] { one.fieldText(-1, text); }},
         {L"WDB_ERROR[1000]: Invalid field index", [&] { one.fieldInt(1, 0); }},
         {L"DB_ERROR[1]: ", [&] { connection.compileStatement("SELEC"); }}, // the detail is left empty on purpose
-        {L"DB_ERROR[1]: no such table: missing", [&] { connection.execDML("DELETE FROM missing"); }},
         {L"DB_ERROR[1]: near \"\xE9\": syntax error", [&] { connection.execDML(wxString(L"\xE9 x")); }},
         {L"DB_RANGE[25]: Error binding string param", [&] { insert.bind(3, wxString(L"x")); }},
         {L"DB_RANGE[25]: Error binding int64 param", [&] { insert.bind(9, std::int64_t{1}); }},
         {L"DB_CONSTRAINT[19]: UNIQUE constraint failed: t.a", [&] { insert.execDML(); }},
         {L"DB_CANTOPEN[14]: unable to open database file", [] { DbConnection().open(L"/no such folder/x.db"); }},
-        {L"nothing", [&] { insert.finalize(); }},
-        {L"WDB_ERROR[1000]: Statement not accessible", [&] { insert.execDML(); }},
+        {L"DB_ERROR[1]: integer overflow", [&] { failing.nextRow(); }},
+        {L"WDB_ERROR[1000]: Statement not accessible", [&] { failing.nextRow(); }},
+        {L"WDB_ERROR[1000]: Statement not accessible", [&] { select.reset(); }},
     };
     for (const auto& [expected, action] : cases)
         EXPECT_EQ(thrownBy(action), expected);
+    connection.close();
+    EXPECT_EQ(thrownBy([&] { connection.execDML("SELECT 1"); }), L"WDB_ERROR[1000]: No Database opened");
 }
 
 #ifdef _WIN32 // The native tests use the system's library.
 TEST(Database, TrustsNeitherSchemaNorPages)
 {
     DbConnection connection = opened();
-    const std::pair<const char*, int> settings[] = {{"PRAGMA trusted_schema", 0}, {"PRAGMA cell_size_check", 1}};
-    for (const auto& [question, expected] : settings)
-        EXPECT_EQ(connection.execQuery(question).fieldInt(0, -1), expected) << question;
+    EXPECT_EQ(connection.execQuery("PRAGMA trusted_schema").fieldInt(0, -1), 0);
+    EXPECT_EQ(connection.execQuery("PRAGMA cell_size_check").fieldInt(0, -1), 1);
     connection.execDML("PRAGMA writable_schema=1");
     EXPECT_EQ(thrownBy([&] { connection.execDML("DELETE FROM sqlite_master"); }),
               L"DB_ERROR[1]: table sqlite_master may not be modified");
@@ -80,48 +79,27 @@ TEST(Database, WalksRowsAndKeepsBindings)
 {
     DbConnection connection = opened();
     DbStatement insert = connection.compileStatement("INSERT INTO t(b) VALUES(?)");
-    const wxString names[] = {L"plain", wxString(L"\x65E5\xE9"), wxString()};
-    for (const wxString& name : names) {
-        insert.bind(1, name);
-        EXPECT_EQ(insert.execDML(), 1);
-    }
+    insert.bind(1, wxString(L"\x65E5\xE9"));
+    EXPECT_EQ(insert.execDML(), 1);
     EXPECT_EQ(insert.execDML(), 1); // the last binding again
     insert.bind(1, std::int64_t{0x7FFFFFFFFFFFFFFF});
     insert.execDML();
-    EXPECT_EQ(connection.lastRowId(), 5);
-    connection.execDML("INSERT INTO t(b) VALUES(NULL),(x'6100C3A9')");
-    EXPECT_EQ(connection.execDML("UPDATE t SET a=a"), 7);
+    EXPECT_EQ(connection.lastRowId(), 3);
+    connection.execDML("INSERT INTO t(b) VALUES(''),(NULL),(x'6100C3A9')");
+    EXPECT_EQ(connection.execDML("UPDATE t SET a=a"), 6);
 
     DbQuery rows = connection.execQuery("SELECT b, a FROM t ORDER BY a");
-    std::vector<std::pair<int, std::string>> found;
+    std::string found;
     while (rows.nextRow()) {
         const char* text = nullptr;
         const int type = rows.fieldType(0); // before the text is asked for, which converts
         const int length = rows.fieldText(0, text);
-        found.emplace_back(type, std::string(text ? text : "", static_cast<std::size_t>(length)));
+        found += std::to_string(type) + ":" + std::string(text ? text : "", static_cast<std::size_t>(length)) + ", ";
         EXPECT_EQ(rows.fieldInt(0, 42) == 42, type == 5);
     }
     EXPECT_FALSE(rows.nextRow()); // it stays at the end
-    const std::vector<std::pair<int, std::string>> expected = {
-        {3, "plain"}, {3, "\xE6\x97\xA5\xC3\xA9"},       {3, ""}, {3, ""}, {1, "9223372036854775807"},
-        {5, ""},      {4, std::string("a\0\xC3\xA9", 4)}};
-    EXPECT_EQ(found, expected);
-}
-
-TEST(Database, ARowThatFailsEmptiesStatementAndCursor)
-{
-    DbConnection connection = opened();
-    connection.execDML("INSERT INTO t(b) VALUES(1),(-9223372036854775807-1)");
-    DbStatement select = connection.compileStatement("SELECT abs(b) FROM t ORDER BY a");
-    DbQuery rows = select.execQuery();
-    EXPECT_TRUE(rows.nextRow());
-    EXPECT_EQ(thrownBy([&] { rows.nextRow(); }), L"DB_ERROR[1]: integer overflow");
-    EXPECT_EQ(thrownBy([&] { rows.nextRow(); }), L"WDB_ERROR[1000]: Statement not accessible");
-    EXPECT_EQ(thrownBy([&] { select.reset(); }), L"WDB_ERROR[1000]: Statement not accessible");
-    // A statement may outlive its connection; both are freed.
-    DbStatement late = connection.compileStatement("SELECT 1");
-    connection.close();
-    EXPECT_EQ(thrownBy([&] { connection.execDML("SELECT 1"); }), L"WDB_ERROR[1000]: No Database opened");
+    using namespace std::string_literals;
+    EXPECT_EQ(found, "3:\xE6\x97\xA5\xC3\xA9, 3:\xE6\x97\xA5\xC3\xA9, 1:9223372036854775807, 3:, 5:, 4:a\0\xC3\xA9, "s);
 }
 
 } // namespace

@@ -3,25 +3,50 @@
 #include <atomic>
 
 #include <windows.h>
+#include <sqlite3.h>
 
 namespace tavi::test {
 
-// While it lives, operator new throws in its thread once `succeeding` allocations have succeeded. The operators are in
-// GraylistTest.cpp.
-struct FailingAllocations {
-    explicit FailingAllocations(int succeeding)
+enum class Heap { cpp, sqlite };
+
+// While it lives, `failing` allocations of its thread from one heap fail once `succeeding` have succeeded. The
+// operators new and delete are in GraylistTest.cpp.
+class FailingAllocations {
+  public:
+    explicit FailingAllocations(int succeeding, Heap heap = Heap::cpp, int failing = 1 << 30)
     {
-        left = succeeding;
-        thread = GetCurrentThreadId();
+        heap_ = heap;
+        left_ = succeeding;
+        failing_ = failing;
+        thread_ = GetCurrentThreadId();
     }
     ~FailingAllocations()
     {
-        thread = 0;
+        thread_ = 0;
     }
-    static inline std::atomic<DWORD> thread{0};
-    static inline std::atomic<int> left{0};
+    static bool fails(Heap heap)
+    {
+        return thread_ == GetCurrentThreadId() && heap_ == heap && left_-- <= 0 && failing_-- > 0;
+    }
     // Becomes null as operator delete frees it.
     static inline std::atomic<const void*> watched{nullptr};
+
+  private:
+    static inline std::atomic<DWORD> thread_{0};
+    static inline Heap heap_{};
+    static inline int left_ = 0, failing_ = 0;
+    static inline sqlite3_mem_methods real_;
+    // SQLite takes other methods only before its first use. Without lookaside small blocks come from them too.
+    static inline const bool installed_ = [] {
+        sqlite3_config(SQLITE_CONFIG_GETMALLOC, &real_);
+        sqlite3_mem_methods methods = real_;
+        methods.xMalloc = [](int size) { return fails(Heap::sqlite) ? nullptr : real_.xMalloc(size); };
+        methods.xRealloc = [](void* block, int size) {
+            return fails(Heap::sqlite) ? nullptr : real_.xRealloc(block, size);
+        };
+        sqlite3_config(SQLITE_CONFIG_MALLOC, &methods);
+        return sqlite3_config(SQLITE_CONFIG_LOOKASIDE, 0, 0) == SQLITE_OK;
+    }();
 };
 
 } // namespace tavi::test
