@@ -1,41 +1,32 @@
 #pragma once
 
-#include <cstdio>
+#include <algorithm>
 #include <string>
 
 #include "link/PipeMessage.h"
 
-// Frames as readable tables: two hexadecimal digits a byte, blanks anywhere.
+// Messages and frames in short form.
 namespace tavi::test {
 
-inline std::string bytes(const std::string& digits)
+// Bytes as a readable table: two hexadecimal digits a byte, blanks anywhere.
+inline std::string bytes(std::string digits)
 {
-    std::string out, pair;
-    for (const char digit : digits) {
-        if (digit != ' ')
-            pair += digit;
-        if (pair.size() == 2) {
-            out += static_cast<char>(std::stoi(pair, nullptr, 16));
-            pair.clear();
-        }
-    }
-    return out;
-}
-
-inline std::string hex(const std::string& text)
-{
+    digits.erase(std::remove(digits.begin(), digits.end(), ' '), digits.end());
     std::string out;
-    for (const char byte : text) {
-        char pair[3];
-        std::snprintf(pair, sizeof(pair), "%02x", static_cast<unsigned char>(byte));
-        out += pair;
-    }
+    for (std::size_t i = 0; i < digits.size(); i += 2)
+        out += static_cast<char>(std::stoi(digits.substr(i, 2), nullptr, 16));
     return out;
 }
 
 inline MessageText text(const wxString& content)
 {
     return std::make_shared<const wxString>(content);
+}
+
+inline std::unique_ptr<EventMessage> event(std::uint32_t type, std::uint64_t value = 0,
+                                           const wxString& content = wxString(), std::uint32_t flag = 0)
+{
+    return std::make_unique<EventMessage>(type, 0, value, flag, text(content));
 }
 
 inline std::string serialised(const PipeMessage& message)

@@ -12,8 +12,8 @@ namespace {
 
 using test::bytes;
 
-// A peer that is played from a list: what is there at each look. A part is gone once it has been read; the end of the
-// list is the end of the pipe.
+// Plays a peer from a list of parts, one at a time; an empty part is a look that finds nothing. The end of the list is
+// the end of the pipe.
 class PlayedSource : public ByteSource {
   public:
     explicit PlayedSource(std::vector<std::string> parts) : parts_(std::move(parts)) {}
@@ -21,10 +21,8 @@ class PlayedSource : public ByteSource {
     {
         if (at_ == parts_.size())
             return false;
-        // An empty part is a look that finds nothing.
         available = static_cast<std::uint32_t>(parts_[at_].size());
-        if (parts_[at_].empty())
-            ++at_;
+        at_ += parts_[at_].empty();
         return true;
     }
     void pause() override
@@ -37,8 +35,7 @@ class PlayedSource : public ByteSource {
         if (at_ == parts_.size())
             return false;
         std::string& part = parts_[at_];
-        const std::size_t count = part.copy(reinterpret_cast<char*>(into), size);
-        part.erase(0, count);
+        part.erase(0, part.copy(reinterpret_cast<char*>(into), size));
         at_ += part.empty();
         ++open;
         return true;
@@ -50,7 +47,7 @@ class PlayedSource : public ByteSource {
     }
     void abandonRead() override
     {
-        --open;
+        finishRead();
     }
 
     int pauses = 0;
@@ -89,8 +86,7 @@ TEST(MessageReader, ReadsWhatPeersSend)
     };
     for (const auto& test : cases) {
         PlayedSource source(test.parts);
-        const auto message = readFrame(source, nullptr);
-        EXPECT_EQ(message != nullptr, test.message) << test.what;
+        EXPECT_EQ(readFrame(source, nullptr) != nullptr, test.message) << test.what;
         EXPECT_EQ(source.pauses, test.pauses) << test.what;
         EXPECT_EQ(source.open, 0) << test.what;
         EXPECT_EQ(source.largestRead, test.largestRead) << test.what;
@@ -111,10 +107,6 @@ TEST(MessageReader, GivesUpWheneverItIsTold)
         EXPECT_EQ(question, at);
         EXPECT_EQ(source.open, 0) << at;
     }
-    // A peer that stops in mid-frame for ever.
-    PlayedSource stalled(std::vector<std::string>(2000, std::string()));
-    int looks = 0;
-    EXPECT_FALSE(readFrame(stalled, [&] { return ++looks == 1000; }));
 }
 
 } // namespace

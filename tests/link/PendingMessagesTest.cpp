@@ -10,12 +10,9 @@
 namespace tavi {
 namespace {
 
-constexpr std::size_t kMax = PendingMessages::kMaxCount;
+using test::event;
 
-std::unique_ptr<PipeMessage> event(std::uint32_t type, std::uint64_t value = 0, const wxString& text = wxString())
-{
-    return std::make_unique<EventMessage>(type, 0, value, 0, test::text(text));
-}
+constexpr std::size_t kMax = PendingMessages::kMaxCount;
 
 TEST(PendingMessages, LoseTheOldestTextsAndAmountsOnly)
 {
@@ -47,18 +44,16 @@ TEST(PendingMessages, LoseTheOldestTextsAndAmountsOnly)
 TEST(PendingMessages, HoldTextsUpToTheirBound)
 {
     constexpr std::size_t bound = PendingMessages::kMaxTextBytes / sizeof(wchar_t);
-    const struct {
-        std::uint32_t type;
-        std::size_t length, messages;
-    } cases[] = {{54, bound / 10, 10}, {56, bound / 3, 3}, {54, bound + 1, 0}, {51, bound + 1, 20}};
-    for (const auto& test : cases) {
+    const std::tuple<std::uint32_t, std::size_t, int> cases[] = {
+        {54, bound / 10, 10}, {56, bound / 3, 3}, {54, bound + 1, 0}, {51, bound + 1, 20}};
+    for (const auto& [type, length, held] : cases) {
         PendingMessages pending;
         for (int i = 0; i < 20; ++i)
-            pending.put(event(test.type, 0, wxString(L'x', test.length)));
-        std::size_t messages = 0;
-        for (; const auto next = pending.take(); ++messages)
-            EXPECT_EQ(static_cast<const EventMessage&>(*next).text->empty(), test.type == 51);
-        EXPECT_EQ(messages, test.messages) << test.type;
+            pending.put(event(type, 0, wxString(L'x', length)));
+        int taken = 0;
+        for (; const auto next = pending.take(); ++taken)
+            EXPECT_EQ(static_cast<const EventMessage&>(*next).text->empty(), type == 51);
+        EXPECT_EQ(taken, held) << type;
     }
 }
 

@@ -2,7 +2,7 @@
 
 #include <cmath>
 #include <map>
-#include <sstream>
+#include <set>
 #include <thread>
 #include <vector>
 
@@ -13,161 +13,132 @@
 namespace tavi {
 namespace {
 
-using test::text;
-
 std::atomic<std::uint32_t> now{0};
 std::uint32_t tick()
 {
     return now;
 }
 
-void event(TransferStatus& status, std::uint32_t type, std::uint64_t value = 0, std::uint32_t flag = 0,
-           const wxString& content = wxString())
+void apply(TransferStatus& status, std::uint32_t type, std::uint64_t value = 0, std::uint32_t flag = 0,
+           const wxString& text = "new")
 {
-    status.apply(EventMessage(type, 0, value, flag, text(content)));
+    status.apply(*test::event(type, value, text, flag));
 }
 
-// Whatever is set, by name.
-using Picture = std::map<std::string, std::string>;
+// Sets every field, the flags as told.
+void fill(TransferStatus& s, bool flags)
+{
+    for (auto* const flag : {&s.ended, &s.ended3, &s.ended4, &s.ended5, &s.ended6, &s.ended8, &s.ended9, &s.ended10,
+                             &s.mark10, &s.switch24, &s.switch32, &s.switch34, &s.switch39, &s.restoreStarted})
+        *flag = flags;
+    std::int64_t value = 0;
+    for (auto* const amount : {&s.doneA, &s.totalA, &s.doneB, &s.totalB, &s.restoreDone, &s.restoreTotal})
+        *amount = value += 100;
+    for (auto* const rate : {&s.rate0, &s.rate1, &s.rate2, &s.restoreRateShort, &s.restoreRateLong})
+        *rate = 1;
+    for (auto* const text : {&s.statusTextA, &s.statusTextB, &s.restoreText})
+        text->set("old");
+    now += 9000;
+    for (auto* const ring : {&s.ringA, &s.ringB, &s.restoreRing})
+        ring->addSample(100);
+    now += 1000;
+}
+
+// Fields by name: a number, the length of a text, the bytes per second of a ring.
+using Picture = std::map<std::string, double>;
 
 Picture pictureOf(const TransferStatus& s)
 {
-    const auto bytes = [](const RateRing& ring) { return ring.rateOver(100000) * 1000; };
     const auto n = [](const auto& field) { return static_cast<double>(field.load()); };
-    std::istringstream names("ringA ringB ring short long rates ended started ended3 34 32 39 24 mark ended10 ended4 "
-                             "ended6 ended8 ended5 ended9 totalA totalB total doneA doneB done");
-    Picture picture;
-    for (const double value : {bytes(s.ringA),       bytes(s.ringB),
-                               bytes(s.restoreRing), n(s.restoreRateShort),
-                               n(s.restoreRateLong), n(s.rate0) + n(s.rate1) + n(s.rate2),
-                               n(s.ended),           n(s.restoreStarted),
-                               n(s.ended3),          n(s.switch34),
-                               n(s.switch32),        n(s.switch39),
-                               n(s.switch24),        n(s.mark10),
-                               n(s.ended10),         n(s.ended4),
-                               n(s.ended6),          n(s.ended8),
-                               n(s.ended5),          n(s.ended9),
-                               n(s.totalA),          n(s.totalB),
-                               n(s.restoreTotal),    n(s.doneA),
-                               n(s.doneB),           n(s.restoreDone)}) {
-        std::string name;
-        names >> name;
-        if (value != 0)
-            picture[name] = std::to_string(static_cast<int>(value));
-    }
-    for (const auto& [name, content] :
-         {std::pair("A", &s.statusTextA), {"B", &s.statusTextB}, {"text", &s.restoreText}}) {
-        if (!content->get().empty())
-            picture[name] = content->get().utf8_string();
-    }
-    return picture;
+    const auto ring = [](const RateRing& samples) { return samples.rateOver(9000) * 1000; };
+    const auto text = [](const PublishedText& content) { return static_cast<double>(content.get().length()); };
+    return {{"textA", text(s.statusTextA)},  {"textB", text(s.statusTextB)},
+            {"text", text(s.restoreText)},   {"ringA", ring(s.ringA)},
+            {"ringB", ring(s.ringB)},        {"ring", ring(s.restoreRing)},
+            {"rate0", n(s.rate0)},           {"rate1", n(s.rate1)},
+            {"rate2", n(s.rate2)},           {"short", n(s.restoreRateShort)},
+            {"long", n(s.restoreRateLong)},  {"totalA", n(s.totalA)},
+            {"totalB", n(s.totalB)},         {"total", n(s.restoreTotal)},
+            {"doneA", n(s.doneA)},           {"doneB", n(s.doneB)},
+            {"done", n(s.restoreDone)},      {"ended", n(s.ended)},
+            {"ended3", n(s.ended3)},         {"ended4", n(s.ended4)},
+            {"ended5", n(s.ended5)},         {"ended6", n(s.ended6)},
+            {"ended8", n(s.ended8)},         {"ended9", n(s.ended9)},
+            {"ended10", n(s.ended10)},       {"mark10", n(s.mark10)},
+            {"24", n(s.switch24)},           {"32", n(s.switch32)},
+            {"34", n(s.switch34)},           {"39", n(s.switch39)},
+            {"started", n(s.restoreStarted)}};
 }
 
-// Changes are words: name=value, -name, or a group of names that go.
-Picture changed(Picture picture, const std::string& changes)
+const std::set<std::string> kRestore = {"text", "ring", "short", "long", "total", "done", "started"};
+const std::set<std::string> kMoving = {"textA", "textB", "text",  "ringA", "ringB", "ring",
+                                       "rate0", "rate1", "rate2", "short", "long"};
+
+// By the code of an event or the state of a snapshot.
+using Changes = std::multimap<std::uint32_t, std::pair<std::string, double>>;
+const Changes kEnds = {{0, {"ended", 1}},   {2, {"ended", 1}},   {3, {"ended", 1}},  {4, {"ended", 1}},
+                       {5, {"ended", 1}},   {6, {"ended", 1}},   {8, {"ended", 1}},  {9, {"ended", 1}},
+                       {10, {"ended", 1}},  {3, {"ended3", 1}},  {4, {"ended4", 1}}, {5, {"ended5", 1}},
+                       {6, {"ended6", 1}},  {8, {"ended8", 1}},  {9, {"ended9", 1}}, {10, {"ended10", 1}},
+                       {10, {"mark10", 1}}, {51, {"started", 1}}};
+// An amount never exceeds its total, but its sample counts.
+const Changes kEvents = {{10, {"totalA", 900}}, {10, {"totalB", 900}},  {11, {"textA", 3}},     {12, {"textA", 0}},
+                         {13, {"textB", 3}},    {14, {"textB", 0}},     {16, {"doneA", 200}},   {16, {"ringA", 100}},
+                         {17, {"doneB", 400}},  {18, {"totalA", 1100}}, {19, {"totalB", 1300}}, {24, {"24", 1}},
+                         {25, {"24", 0}},       {32, {"32", 1}},        {33, {"32", 0}},        {34, {"34", 1}},
+                         {35, {"34", 0}},       {36, {"mark10", 0}},    {39, {"39", 1}},        {40, {"39", 0}},
+                         {53, {"total", 900}},  {54, {"text", 3}},      {55, {"text", 0}},      {56, {"done", 600}},
+                         {56, {"ring", 100}},   {57, {"total", 1500}}};
+
+void change(Picture& picture, std::uint32_t code, const Changes& changes)
 {
-    const std::map<std::string, std::string> groups = {
-        {"-backup", "-A -B -ringA -ringB -rates -totalA -totalB -doneA -doneB -ended -ended3 -34 -32 -39 -24 -mark "
-                    "-ended10 -ended4 -ended6 -ended8 -ended5 -ended9"},
-        {"-restore", "-text -ring -short -long -total -done -started"},
-        {"-moving", "-A -B -text -ringA -ringB -ring -short -long -rates"}};
-    std::istringstream words(changes);
-    for (std::string word; words >> word;) {
-        const std::size_t equals = word.find('=');
-        if (const auto group = groups.find(word); group != groups.end())
-            picture = changed(picture, group->second);
-        else if (equals == std::string::npos)
-            picture.erase(word.substr(1));
-        else
-            picture[word.substr(0, equals)] = word.substr(equals + 1);
-    }
-    return picture;
+    for (auto [row, end] = changes.equal_range(code); row != end; ++row)
+        picture[row->second.first] = row->second.second;
 }
 
-// Rows parted by semicolons: a code and its changes.
-std::map<std::uint32_t, std::string> effectsOf(const std::string& table)
+TEST(TransferStatus, EveryEventAndSnapshotHasItsEffect)
 {
-    std::map<std::uint32_t, std::string> effects;
-    std::istringstream rows(table);
-    for (std::string row; std::getline(rows, row, ';');) {
-        std::size_t end = 0;
-        const auto code = static_cast<std::uint32_t>(std::stoul(row, &end));
-        effects[code] = row.substr(end);
-    }
-    return effects;
-}
-
-// Everything that a message can change is set.
-Picture fill(TransferStatus& status)
-{
-    for (auto* const flag : {&status.ended, &status.ended3, &status.mark10, &status.ended10, &status.ended4,
-                             &status.ended6, &status.ended8, &status.ended5, &status.ended9, &status.restoreStarted,
-                             &status.switch24, &status.switch32, &status.switch34, &status.switch39})
-        *flag = true;
-    for (auto* const rate :
-         {&status.rate0, &status.rate1, &status.rate2, &status.restoreRateShort, &status.restoreRateLong})
-        *rate = 1;
-    const std::pair<std::uint32_t, std::uint64_t> events[] = {{11, 0},   {13, 0},   {54, 0},
-                                                              {18, 100}, {19, 200}, {53, 300}};
-    for (const auto& [type, value] : events)
-        event(status, type, value, 0, L"old");
-    now += 1000;
-    event(status, 16, 10);
-    event(status, 17, 20, 1);
-    event(status, 56, 30);
-    return pictureOf(status);
-}
-
-TEST(TransferStatus, EveryEventHasItsEffect)
-{
-    // 16: no more than the total, but the sample counts. 17: without the flag no sample.
-    const auto effects = effectsOf(
-        "0 -backup ended=1; 1 -backup; 2 -backup ended=1; 3 -backup ended=1 ended3=1; 4 -backup ended=1 ended4=1;"
-        "5 -backup ended=1 ended5=1; 6 -backup ended=1 ended6=1; 7; 8 -backup ended=1 ended8=1;"
-        "9 -backup ended=1 ended9=1; 10 -backup ended=1 ended10=1 mark=1 totalA=500 totalB=500; 11 A=new; 12 -A;"
-        "13 B=new; 14 -B; 15; 16 doneA=100 ringA=255; 17 doneB=200; 18 totalA=600; 19 totalB=700; 24; 25 -24; 32;"
-        "33 -32; 34; 35 -34; 36 -mark; 39; 40 -39; 51 -restore started=1; 52 -restore; 53 total=500; 54 text=new;"
-        "55 -text; 56 done=300 ring=265; 57 total=800; 20; 30; 99");
-    for (const auto& [type, effect] : effects) {
-        TransferStatus status(true, tick);
-        const Picture full = fill(status);
-        ASSERT_EQ(full.size(), 29u);
-        now += 1000;
-        event(status, type, 500, 0, L"new");
-        EXPECT_EQ(pictureOf(status), changed(full, effect)) << "type " << type;
-    }
-}
-
-TEST(TransferStatus, EverySnapshotHasItsEffect)
-{
-    const auto effects = effectsOf(
-        "0 ended=1; 1 -backup; 2 ended=1 ended3=1; 3 ended=1 ended3=1; 4 ended=1 ended4=1; 5 ended=1 ended5=1;"
-        "6 ended=1 ended6=1; 7; 8 ended=1 ended8=1; 9 ended=1 ended9=1; 10 ended=1 ended10=1 mark=1; 51 started=1;"
-        "52 -restore; 53; 99");
-    for (const auto& [state, effect] : effects) {
-        TransferStatus status(true, tick);
-        fill(status);
-        event(status, 1);
-        event(status, 19, 200);
-        status.restoreStarted = false;
-        const Picture before = pictureOf(status);
-        status.apply(SnapshotMessage(state, 1, 2, 3, 4));
-        EXPECT_EQ(pictureOf(status), changed(before, "-moving totalA=1 doneA=2 doneB=4 " + effect)) << state;
+    TransferStatus status(true, tick);
+    for (std::uint32_t round = 0; round < 4 * 60; ++round) {
+        const std::uint32_t code = round / 4;
+        const bool snapshot = round % 2 == 1;
+        const bool flags = round % 4 < 2;
+        fill(status, flags);
+        Picture expected = pictureOf(status);
+        if (snapshot)
+            change(expected, 0, {{0, {"totalA", 1}}, {0, {"doneA", 2}}, {0, {"doneB", 4}}});
+        const bool resetsBackup = snapshot ? code == 1 : code <= 10 && code != 7;
+        const bool resetsRestore = code == 52 || (!snapshot && code == 51);
+        for (auto& [name, value] : expected) {
+            if ((snapshot && kMoving.count(name) == 1) || (kRestore.count(name) == 1 ? resetsRestore : resetsBackup))
+                value = 0;
+        }
+        change(expected, code, kEnds);
+        if (snapshot) {
+            change(expected, code, {{2, {"ended3", 1}}});
+            status.apply(SnapshotMessage(code, 1, 2, 3, 4));
+        } else {
+            change(expected, code, kEvents);
+            // Its flag tells whether there is a sample.
+            if (code == 17 && flags)
+                expected["ringB"] = 100;
+            apply(status, code, 900, flags ? 1 : 0);
+        }
+        EXPECT_EQ(pictureOf(status), expected) << (snapshot ? "snapshot " : "event ") << code;
     }
 }
 
 TEST(TransferStatus, AmountsThatMakeNoSenseStayDefined)
 {
     TransferStatus status(false, tick);
-    event(status, 57, UINT64_MAX);
-    event(status, 57, 1);
+    apply(status, 57, UINT64_MAX);
+    apply(status, 57, 1);
     EXPECT_EQ(status.restoreTotal, 0);
-    event(status, 53, 1ull << 63);
-    event(status, 56, 5);
-    EXPECT_EQ(status.restoreDone, INT64_MIN); // the sum is larger than the total
-    event(status, 53, 1);
+    apply(status, 53, 1ull << 63);
+    apply(status, 56, 5);
+    EXPECT_EQ(status.restoreDone, INT64_MIN) << "the sum is larger than the total";
+    apply(status, 53, 1);
     EXPECT_EQ(status.barPosition(), INT32_MIN);
-    EXPECT_EQ(status.restoreRing.rateOver(5000), 0); // not sampling
 }
 
 TEST(TransferStatus, RatesAndEstimatesFollowTheClock)
@@ -175,71 +146,72 @@ TEST(TransferStatus, RatesAndEstimatesFollowTheClock)
     // Starts shortly before the tick count wraps.
     now = UINT32_MAX - 700;
     TransferStatus status(true, tick);
-    const auto quarter = [&](int count) {
-        for (; count > 0; --count) {
+    // Total, amount added, ticks of 250 ms; speed, position and estimate after them.
+    const std::tuple<std::uint64_t, std::uint64_t, int, std::uint64_t, int, std::optional<std::uint32_t>> steps[] = {
+        {4 << 20, 1 << 20, 3, 0, 62, {}},
+        {4 << 20, 0, 1, 8388608, 62, {}},
+        {4 << 20, 0, 12, 2097152, 62, {}},
+        // Nothing came in the last 5000 ms; the first long rate comes after 10 s.
+        {4 << 20, 0, 23, 0, 62, {}},
+        {4 << 20, 0, 1, 0, 62, 30},
+        // Finished.
+        {1 << 20, 0, 40, 0, 250, {}}};
+    for (const auto& [total, added, ticks, speed, position, seconds] : steps) {
+        apply(status, 53, total);
+        apply(status, 56, added);
+        for (int i = 0; i < ticks; ++i) {
             now += 250;
             status.timerTick();
         }
-    };
-    event(status, 51);
-    quarter(3);
-    EXPECT_EQ(status.restoreRing.rateOver(5000), 0);
-    EXPECT_EQ(status.restoreSpeed(), 0u);
-    EXPECT_EQ(status.barPosition(), 0);
-    now += 125;
-    event(status, 53, 4 << 20);
-    event(status, 56, 1 << 20);
-    quarter(17);
-    EXPECT_EQ(status.restoreSpeed(), 1636801u) << "1048576 bytes in a life of 5125 ms";
-    EXPECT_EQ(status.barPosition(), 62);
-    EXPECT_FALSE(status.remainingSeconds()) << "the first long rate comes after ten seconds";
-    quarter(20);
-    EXPECT_FLOAT_EQ(status.restoreRateLong, 828504.5f) << "1048576 bytes in 10125 ms";
-    EXPECT_EQ(status.remainingSeconds(), 30u) << "for another 3 MiB";
-    EXPECT_EQ(status.restoreSpeed(), 0u) << "nothing came in the last 5000 ms";
+        const auto seen = std::tuple(status.restoreSpeed(), status.barPosition(), status.remainingSeconds());
+        EXPECT_EQ(seen, std::tuple(speed, position, seconds));
+    }
+}
 
-    const std::pair<float, std::optional<std::uint32_t>> rates[] = {
-        {999.0f, std::nullopt}, {1000.0f, 25165u},   {0.0f, std::nullopt}, {-1e9f, std::nullopt},
-        {INFINITY, 0u},         {NAN, std::nullopt}, {1e6f, 25u},          {1000.9f, 25165u}};
-    for (const auto& [rate, seconds] : rates) {
+TEST(TransferStatus, EstimatesNeedARateOfAKilobit)
+{
+    TransferStatus status(true, tick);
+    constexpr std::uint64_t mebibytes = 3 << 20;
+    const std::tuple<std::uint64_t, float, std::optional<std::uint32_t>> cases[] = {
+        {mebibytes, 999.0F, {}},
+        {mebibytes, 1000.0F, 25165u},
+        {mebibytes, 1000.9F, 25165u},
+        {mebibytes, 1e6F, 25u},
+        {mebibytes, 0.0F, {}},
+        {mebibytes, -1e9F, {}},
+        {mebibytes, NAN, {}},
+        {mebibytes, INFINITY, 0u},
+        // The quotient keeps 32 bits; one value of them stands for unknown.
+        {0x100000001ull * 1000, 8000.0F, 1u},
+        {0xffffffffull * 1000, 8000.0F, {}}};
+    for (const auto& [total, rate, seconds] : cases) {
+        apply(status, 53, total);
         status.restoreRateLong = rate;
         EXPECT_EQ(status.remainingSeconds(), seconds) << rate;
     }
-    // The quotient keeps 32 bits; one value of them stands for unknown.
-    status.restoreRateLong = 8000;
-    for (const auto& [total, seconds] : {std::pair(0x100000001ull * 1000, std::optional(1u)),
-                                         std::pair(0xffffffffull * 1000, std::optional<std::uint32_t>())}) {
-        event(status, 53, total + (1 << 20));
-        EXPECT_EQ(status.remainingSeconds(), seconds);
-    }
-    // What is finished has no speed.
-    event(status, 53, 1 << 20);
-    status.restoreRateShort = 5;
-    quarter(40);
-    EXPECT_EQ(status.restoreRateShort + status.restoreRateLong, 0);
-    EXPECT_EQ(status.barPosition(), TransferStatus::kBarRange);
 }
 
 TEST(RateRing, CountsItsNewestSamples)
 {
-    const struct {
-        int capacity, samples, span;
-        double rate;
-    } cases[] = {
-        {8, 3, 200, 2.5 / 100},  // the last two: 2 and 3
-        {8, 3, 201, 2.0 / 100},  // and the one before
-        {8, 3, 9999, 2.0 / 100}, // 1, 2 and 3
-        {4, 4, 9999, 3.0 / 100}, // just wrapped: the slot that comes next does not count
-        {4, 9, 9999, 8.0 / 100}, {8, 8, 100, 8.0 / 100}, {1, 5, 9999, 0}, {8, 3, 0, 0}, {8, 3, -5, 0}, {8, 0, 100, 0},
-    };
-    for (const auto& test : cases) {
-        RateRing ring(test.capacity, tick);
-        for (int sample = 1; sample <= test.samples; ++sample) {
+    // Samples of 1, 2, 3 and so on every 100 ms.
+    const std::tuple<int, int, int, double> cases[] = {{8, 3, 200, 2.5 / 100},
+                                                       {8, 3, 201, 2.0 / 100},
+                                                       {8, 3, 9999, 2.0 / 100},
+                                                       {8, 8, 100, 8.0 / 100},
+                                                       // Wrapped: the slot that comes next does not count.
+                                                       {4, 4, 9999, 3.0 / 100},
+                                                       {4, 9, 9999, 8.0 / 100},
+                                                       {1, 5, 9999, 0},
+                                                       {8, 3, 0, 0},
+                                                       {8, 3, -5, 0},
+                                                       {8, 0, 100, 0}};
+    for (const auto& [capacity, samples, span, rate] : cases) {
+        RateRing ring(capacity, tick);
+        for (int sample = 1; sample <= samples; ++sample) {
             now += 100;
             ring.addSample(static_cast<std::uint64_t>(sample));
         }
-        EXPECT_DOUBLE_EQ(ring.rateOver(test.span), test.rate)
-            << test.capacity << ' ' << test.samples << ' ' << test.span;
+        EXPECT_DOUBLE_EQ(ring.rateOver(span), rate) << capacity << ' ' << samples << ' ' << span;
         now += 5000;
         ring.clearRing();
         ring.addSample(7);
@@ -247,37 +219,30 @@ TEST(RateRing, CountsItsNewestSamples)
     }
 }
 
-// The listener, a window's thread and a reader at once: the thread sanitizer sees any touch without order, the address
-// sanitizer any of a freed text.
+// The listener and a window's thread at once, for the sanitizers: any access without order, any freed text.
 TEST(TransferStatus, IsReadWhileItChanges)
 {
     TransferStatus status(true, tick);
     std::atomic<bool> done{false};
     std::thread listener([&] {
-        for (std::uint32_t round = 0; round < 100000; ++round)
-            event(status, round % 500 == 0 ? 51 + round / 500 % 7 : 54 + (round % 64 == 63), 1000, 1,
-                  wxString(static_cast<wchar_t>(L'a' + round % 26), round % 40 + 1));
+        for (std::uint32_t round = 0; round < 100000; ++round) {
+            const wxString text(static_cast<wchar_t>(L'a' + round % 26), round % 40 + 1);
+            apply(status, round % 500 == 0 ? 51 + round / 500 % 7 : 54 + (round % 64 == 63), 1000, 1, text);
+        }
         status.apply(SnapshotMessage(51, 1, 2, 3, 4));
         done = true;
     });
-    std::thread window([&] {
-        while (!done) {
-            ++now;
-            status.timerTick();
-            status.remainingSeconds();
-            status.barPosition();
-            status.restoreSpeed();
-            status.restoreRing.clearRing();
-        }
-    });
-    int torn = 0;
     while (!done) {
+        ++now;
+        status.timerTick();
+        status.remainingSeconds();
+        status.barPosition();
+        status.restoreSpeed();
+        status.restoreRing.clearRing();
         const wxString text = status.restoreText.get();
-        torn += text.empty() || text == wxString(text[0], text.length()) ? 0 : 1;
+        EXPECT_TRUE(text.empty() || text == wxString(text[0], text.length())) << "torn";
     }
     listener.join();
-    window.join();
-    EXPECT_EQ(torn, 0);
 }
 
 } // namespace

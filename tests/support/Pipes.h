@@ -9,6 +9,9 @@
 
 namespace tavi::test {
 
+constexpr const wchar_t* kStatus = L"\\\\.\\pipe\\tavistatus";
+constexpr const wchar_t* kCommand = L"\\\\.\\pipe\\tavibackup";
+
 // The service's end of a pipe: one of as many instances as there are in all.
 class PipeServer {
   public:
@@ -25,11 +28,6 @@ class PipeServer {
                 hangUp(); // one that came and went
             return GetLastError() == ERROR_PIPE_CONNECTED;
         });
-    }
-    // Until the client has closed its end.
-    bool waitHangUp() const
-    {
-        return waitState(ERROR_NO_DATA);
     }
     void write(const std::string& bytes) const
     {
@@ -57,14 +55,6 @@ class PipeServer {
     }
 
   private:
-    bool waitState(DWORD state) const
-    {
-        return waitUntil([&] {
-            ConnectNamedPipe(pipe_.get(), nullptr);
-            return GetLastError() == state;
-        });
-    }
-
     FileHandle pipe_;
 };
 
