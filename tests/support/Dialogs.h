@@ -4,6 +4,7 @@
 #include <fstream>
 #include <functional>
 
+#include <prsht.h>
 #include <gtest/gtest.h>
 #include <wx/translation.h>
 
@@ -14,6 +15,18 @@
 // What the tests of the user interface share. They drive this process's dialogs from another thread of it, by the
 // messages a user's actions would cause.
 namespace tavi::test {
+
+inline std::wstring ownPath()
+{
+    wchar_t path[MAX_PATH];
+    return std::wstring(path, GetModuleFileNameW(nullptr, path, MAX_PATH));
+}
+
+inline std::wstring modulePath()
+{
+    const std::wstring own = ownPath();
+    return own.substr(0, own.rfind(L"\\tests\\")) + L"\\tavishell.dll";
+}
 
 inline bool waitUntil(const std::function<bool()>& condition)
 {
@@ -43,15 +56,23 @@ inline HWND waitDialog(const wchar_t* caption, std::initializer_list<HWND> other
 }
 
 // Posted: a click that opens a box does not return before the box is gone.
-inline void click(HWND dialog, int id)
+inline BOOL click(HWND dialog, int id)
 {
-    PostMessageW(GetDlgItem(dialog, id), BM_CLICK, 0, 0);
+    return PostMessageW(GetDlgItem(dialog, id), BM_CLICK, 0, 0);
 }
 
 inline std::wstring controlText(HWND dialog, int id)
 {
     wchar_t text[1024];
     return std::wstring(text, GetDlgItemTextW(dialog, id, text, 1024));
+}
+
+// Accepts a page into the handle that the parameter points at; refuses it without one.
+inline BOOL CALLBACK takePage(HPROPSHEETPAGE page, LPARAM taken)
+{
+    if (taken)
+        *reinterpret_cast<HPROPSHEETPAGE*>(taken) = page;
+    return taken != 0;
 }
 
 struct UiTest : testing::Test {

@@ -12,36 +12,20 @@ namespace tavi::test {
 
 // Takes the log of a test: one line per message, in UTF-8, as "level: " with wx's number of the level, and the line as
 // written.
-class LogCapture {
-    class Target : public wxLog {
-      public:
-        std::vector<std::string> lines;
-        std::function<void()> onNextLine;
-
-      protected:
-        void DoLogTextAtLevel(wxLogLevel level, const wxString& text) override
-        {
-            lines.push_back(std::to_string(level) + ": " + toUtf8(view(text)));
-            if (const auto action = std::exchange(onNextLine, nullptr))
-                action();
-        }
-    };
-
+class LogCapture : wxLog {
   public:
-    LogCapture() : before_(wxLog::SetActiveTarget(&target_))
+    LogCapture()
     {
-        wxLog::DisableTimestamp();
+        DisableTimestamp();
     }
-    LogCapture(const LogCapture&) = delete;
-    LogCapture& operator=(const LogCapture&) = delete;
-    ~LogCapture()
+    ~LogCapture() override
     {
-        wxLog::SetActiveTarget(before_);
+        SetActiveTarget(before_);
     }
     // What was logged since the last call.
     std::vector<std::string> take()
     {
-        return std::move(target_.lines);
+        return std::move(lines_);
     }
     std::string takeText()
     {
@@ -53,12 +37,20 @@ class LogCapture {
     // Called once, on the thread that logs: so a test acts in the middle of what it tests.
     void onNextLine(std::function<void()> action)
     {
-        target_.onNextLine = std::move(action);
+        onNextLine_ = std::move(action);
     }
 
   private:
-    Target target_;
-    wxLog* before_;
+    void DoLogTextAtLevel(wxLogLevel level, const wxString& text) override
+    {
+        lines_.push_back(std::to_string(level) + ": " + toUtf8(view(text)));
+        if (const auto action = std::exchange(onNextLine_, nullptr))
+            action();
+    }
+
+    std::vector<std::string> lines_;
+    std::function<void()> onNextLine_;
+    wxLog* before_ = SetActiveTarget(this);
 };
 
 } // namespace tavi::test

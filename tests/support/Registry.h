@@ -22,8 +22,6 @@ class TemporaryFolder {
         std::filesystem::remove_all(path_);
         std::filesystem::create_directory(path_);
     }
-    TemporaryFolder(const TemporaryFolder&) = delete;
-    TemporaryFolder& operator=(const TemporaryFolder&) = delete;
     ~TemporaryFolder()
     {
         std::error_code ignored;

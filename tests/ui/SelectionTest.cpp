@@ -1,12 +1,11 @@
 #include "ui/Selection.h"
 
 #include <memory>
-#include <tuple>
-#include <vector>
 
 #include "core/Handles.h"
 #include "statedb/Database.h"
 #include "statedb/StateLookups.h"
+#include "tests/backupset/ManifestSupport.h"
 #include "tests/support/Dialogs.h"
 
 namespace tavi {
@@ -22,18 +21,18 @@ IdList idsOf(const wxString& path)
     return IdList(list, ILFree);
 }
 
-UINT driveType = DRIVE_FIXED;
+UINT driveType = DRIVE_REMOTE;
 UINT WINAPI chosenDriveType(LPCWSTR)
 {
     return driveType;
 }
 
 // What is taken from the shell's own data object for the last ids in a folder.
-PathSet collect(const wxString& parent, const std::vector<IdList>& items, const IdList& background = nullptr)
+PathSet collect(const wxString& parent, const std::vector<IdList>& items, const IdList& background = {})
 {
-    std::vector<LPCITEMIDLIST> lists;
-    for (const IdList& item : items)
-        lists.push_back(ILFindLastID(item.get()));
+    std::vector<LPCITEMIDLIST> lists(items.size());
+    std::transform(items.begin(), items.end(), lists.begin(),
+                   [](const auto& item) { return ILFindLastID(item.get()); });
     ComPtr<IShellFolder> desktop, folder;
     ComPtr<IDataObject> data;
     SHGetDesktopFolder(desktop.out());
@@ -42,34 +41,17 @@ PathSet collect(const wxString& parent, const std::vector<IdList>& items, const 
     return collectPaths(background.get(), data.get(), chosenDriveType);
 }
 
-TEST_F(SelectionTest, TakesTheShellsItems)
+TEST_F(SelectionTest, TakesTheShellsItemsButNoneTooLong)
 {
-    const wxString here = folder.path(), file = in(L"a.txt"), rare = in(L"\u65e5\U0001F4BE.txt"), sub = in(L"sub"),
+    const wxString parent = in(wxString(L'd', 199 - folder.path().size())), name = L"00000" + wxString(L'f', 53),
+                   rare = parent + L"\\\u65e5\U0001F4BE", sub = parent + L"\\sub",
                    computer = L"::{20D04FE0-3AEA-1069-A2D8-08002B30309D}",
                    controlPanel = computer + L"\\::{21EC2020-3AEA-1069-A2DD-08002B30309D}";
-    for (const wxString& name : {file, rare})
-        std::ofstream(name.wc_str());
-    CreateDirectoryW(sub.wc_str(), nullptr);
-    const std::vector<IdList> items = {idsOf(file), idsOf(rare), idsOf(sub)};
-    EXPECT_EQ(collect(here, items), PathSet({file, rare, sub}));
-    // A click on a folder's background: the folder is all there is.
-    EXPECT_EQ(collectPaths(idsOf(here).get(), nullptr, chosenDriveType), PathSet({here}));
-    EXPECT_EQ(collect(here, items, idsOf(here)), PathSet({here, file, rare, sub}));
-    // Of what is no file, roots of fixed drives only.
-    for (driveType = DRIVE_UNKNOWN; driveType <= DRIVE_RAMDISK; ++driveType) {
-        EXPECT_EQ(collect(computer, {idsOf(controlPanel), idsOf(L"C:\\")}),
-                  driveType == DRIVE_FIXED ? PathSet({L"C:\\"}) : PathSet());
-        EXPECT_EQ(collect(here, items).size(), 3u);
-    }
-}
-
-TEST_F(SelectionTest, TakesManyItemsButNoneTooLong)
-{
-    const wxString parent = in(wxString(L'd', 199 - folder.path().size())), name = L"00000" + wxString(L'f', 53);
-    CreateDirectoryW(parent.wc_str(), nullptr);
-    for (const wxString& each : {name, name + L"f"})
-        std::ofstream(in(each).wc_str());
-    std::vector<IdList> items = {idsOf(in(name)), idsOf(in(name + L"f"))};
+    for (const wxString& each : {parent, sub})
+        CreateDirectoryW(each.wc_str(), nullptr);
+    for (const wxString& each : {in(name), in(name + L"f"), rare})
+        std::ofstream(each.wc_str());
+    std::vector<IdList> items{idsOf(in(name)), idsOf(in(name + L"f")), idsOf(rare), idsOf(sub)};
     // The first one again and again, each with another number in its name.
     const std::string bytes(reinterpret_cast<const char*>(items[0].get()), ILGetSize(items[0].get()));
     const std::size_t place = bytes.find(std::string(reinterpret_cast<const char*>(name.wx_str()), 20));
@@ -77,23 +59,29 @@ TEST_F(SelectionTest, TakesManyItemsButNoneTooLong)
         items.emplace_back(ILClone(items[0].get()), ILFree);
         std::memcpy(reinterpret_cast<char*>(items.back().get()) + place, std::to_wstring(i).c_str(), 10);
     }
-    const PathSet paths = collect(parent, items);
-    EXPECT_EQ(paths.size(), 70000u);
-    EXPECT_EQ(paths.count(parent + L"\\79999" + name.substr(5)), 1u);
+    const PathSet paths = collect(parent, items, idsOf(parent));
+    EXPECT_EQ(paths.size(), 70003u);
+    for (const wxString& path : {parent, rare, sub, parent + L"\\79999" + name.substr(5)})
+        EXPECT_EQ(paths.count(path), 1u) << path;
+    // Of what is no file, roots of fixed drives only.
+    for (driveType = DRIVE_UNKNOWN; driveType <= DRIVE_RAMDISK; ++driveType)
+        EXPECT_EQ(collect(computer, {idsOf(controlPanel), idsOf(L"C:\\")}),
+                  driveType == DRIVE_FIXED ? PathSet({L"C:\\"}) : PathSet());
 }
 
 TEST_F(SelectionTest, NeverReadsOutsideAForgedBlock)
 {
     // Counts and offsets beyond the block, and lists that do not end inside it.
-    const std::vector<UINT> blocks[] = {{1},
-                                        {1, 12, 0x10000},
-                                        {0x40000000, 0},
-                                        {0xFFFFFFFE, 0, 0},
-                                        {1, 12, 15, 0},
-                                        {1, 12, 14, 0x7FFF0000},
-                                        {1, 12, 14, 0x00010000},
-                                        {1, 0xFFFFFFFF, 0xFFFFFFF0, 0},
-                                        {1, 12, 16, 0, 4, 4}};
+    using Block = std::vector<UINT>;
+    const auto blocks = {Block({1}),
+                         Block({1, 12, 0x10000}),
+                         Block({0x40000000, 0}),
+                         Block({0xFFFFFFFE, 0, 0}),
+                         Block({1, 12, 15, 0}),
+                         Block({1, 12, 14, 0x7FFF0000}),
+                         Block({1, 12, 14, 0x10000}),
+                         Block({1, 0xFFFFFFFF, 0xFFFFFFF0, 0}),
+                         Block({1, 12, 16, 0, 4, 4})};
     FORMATETC format{static_cast<CLIPFORMAT>(RegisterClipboardFormatW(L"Shell IDList Array")), nullptr,
                      DVASPECT_CONTENT, -1, TYMED_HGLOBAL};
     for (const auto& block : blocks) {
@@ -116,9 +104,8 @@ TEST_F(SelectionTest, NeverReadsOutsideAForgedBlock)
 
 TEST_F(SelectionTest, SummarizesVersionsAndStates)
 {
-    const ManifestRef manifest(Manifest::Parse(L"FILES\n" + in(L"a.txt\n5:5:5:9:0::0:0\n6:6:6:-1:0::0:0\n\n") +
-                                               in(L"sub\\deep\\c.txt\n5:5:5:9:0::0:0\n")));
-    manifest.get()->AddRef();
+    const ManifestRef manifest = test::held(Manifest::Parse(
+        L"FILES\n" + in(L"a.txt\n5:5:5:9:0::0:0\n6:6:6:-1:0::0:0\n\n") + in(L"sub\\deep\\c.txt\n5:5:5:9:0::0:0\n")));
     CreateDirectoryW(in(L"sub").wc_str(), nullptr);
     DbConnection database;
     database.open(service.file(L"taviconf.dat"));
