@@ -25,16 +25,14 @@ TEST(PathTree, AnswersAsAnObviousModelDoes)
         };
         const Reference<PathTree> tree(PathTree::Create(false, counter));
         test::PathTreeModel model(counter);
-        std::string rules;
         for (unsigned rule = 0, count = random() % 12 + 1; rule < count; ++rule) {
             const std::wstring& path = paths[random() % paths.size()];
             const PathState state = random() % 3 == 0 ? random() % 10 : random() % 2 * 7;
             tree->Insert(path, state);
             model.insert(path, state);
-            rules += wxString(path).utf8_string() + "=" + std::to_string(state) + " ";
         }
         for (const std::wstring& path : paths)
-            ASSERT_EQ(tree->Lookup(path), model.lookup(path)) << wxString(path).utf8_string() << " of " << rules;
+            ASSERT_EQ(tree->Lookup(path), model.lookup(path)) << wxString(path).utf8_string() << " of set " << set;
     }
 }
 

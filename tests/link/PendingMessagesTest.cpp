@@ -31,14 +31,13 @@ TEST(PendingMessages, LoseTheOldestTextsAndAmountsOnly)
     // Beyond the bound these are counted, and then leave no place for others.
     std::map<std::uint32_t, std::size_t> types;
     for (std::size_t i = 0; i < kMax; ++i) {
-        pending.put(event(51));
-        pending.put(event(52));
+        pending.put(event(51 + i % 2));
         pending.put(std::make_unique<SnapshotMessage>(0, 0, 0, 0, 0));
         pending.put(event(54));
     }
     while (const auto next = pending.take())
         ++types[next->type()];
-    EXPECT_EQ(types, (decltype(types){{20, kMax}, {51, kMax}, {52, kMax}}));
+    EXPECT_EQ(types, (decltype(types){{20, kMax}, {51, kMax / 2}, {52, kMax / 2}}));
 }
 
 TEST(PendingMessages, HoldTextsUpToTheirBound)

@@ -63,11 +63,9 @@ TEST(PipeMessage, TypesAndShortestPayloadsDecideWhatIsMade)
             (type >= 26 && type <= 31) || type == 37 || type == 38 || (type >= 41 && type <= 50) || type > 57;
         const auto [kind, least] = special.count(type) ? special.at(type) : std::pair(0u, 20u);
         EXPECT_FALSE(created(type, zeros, least - 1)) << type;
-        for (const std::uint32_t length : {least, least + 4}) {
-            const auto message = created(type, zeros, length);
-            ASSERT_EQ(message == nullptr, unused) << type;
-            EXPECT_TRUE(unused || (message->kind() == MessageKind{kind} && message->type() == type)) << type;
-        }
+        const auto message = created(type, zeros, least);
+        ASSERT_EQ(message == nullptr, unused) << type;
+        EXPECT_TRUE(unused || (message->kind() == MessageKind{kind} && message->type() == type)) << type;
     }
     EXPECT_FALSE(created(UINT32_MAX, zeros, 64));
 }
@@ -104,9 +102,7 @@ TEST(PipeMessage, BuffersGrowByAKilobyteMoreThanAsked)
         EXPECT_EQ(buffer->data() == nullptr, capacity == 0);
     }
     EXPECT_FALSE(createMessage(52, *buffer));
-    EventMessage(1, 0, 0, 0, text(wxString(L'x', 2000))).serialise(*buffer);
-    EXPECT_EQ(buffer->length(), 2028u);
-    EXPECT_EQ(buffer->capacity(), 2028u + 1024);
+    EXPECT_EQ(serialised(*event(1, 0, wxString(L'x', 2000))).size(), 2028u);
 }
 
 } // namespace

@@ -49,10 +49,6 @@ struct RestoreProgressWindowTest : UiTest {
     {
         EXPECT_TRUE(waitUntil([&] { return controlText(dialog, control) == content; })) << wxString(content);
     }
-    static LRESULT position(HWND dialog)
-    {
-        return SendDlgItemMessageW(dialog, TAVI_PROGRESS_BAR, PBM_GETPOS, 0, 0);
-    }
     static bool gone(HWND dialog)
     {
         return waitUntil([&] { return !IsWindow(dialog); }) && !RestoreProgressWindow::current();
@@ -78,7 +74,8 @@ TEST_F(RestoreProgressWindowTest, FollowsARestoreToItsEnd)
     shows(dialog, TAVI_PROGRESS_STATUS, L"C:\\d\\A & B.txt");
     EXPECT_EQ(transferStatus().restoreRing.rateOver(60000), 0);
     tell(56, 500);
-    EXPECT_TRUE(waitUntil([&] { return position(dialog) == 125; }));
+    const auto position = [&] { return SendDlgItemMessageW(dialog, TAVI_PROGRESS_BAR, PBM_GETPOS, 0, 0); };
+    EXPECT_TRUE(waitUntil([&] { return position() == 125; }));
     tell(54, 0, "C:\\d\\B.txt");
     shows(dialog, TAVI_PROGRESS_STATUS, L"C:\\d\\B.txt");
     EXPECT_TRUE(waitUntil([&] { return transferStatus().restoreSpeed() > 0; })) << "only the first item clears it";
@@ -95,11 +92,9 @@ TEST_F(RestoreProgressWindowTest, FollowsARestoreToItsEnd)
     tell(52);
     tell(51);
     shows(dialog, TAVI_PROGRESS_STATUS, L"Finding file on server...");
-    EXPECT_EQ(position(dialog), 125);
-    EXPECT_TRUE(IsWindow(dialog));
+    EXPECT_EQ(position(), 125);
     // Others know the message number too.
     SendMessageW(dialog, WM_USER + 1, 0, 0x1234);
-    SendMessageW(dialog, WM_APP, 0, 0);
     SendMessageW(dialog, DM_SETDEFID, TAVI_PROGRESS_CANCEL, 0);
     EXPECT_EQ(LOWORD(SendMessageW(dialog, DM_GETDEFID, 0, 0)), TAVI_PROGRESS_CANCEL);
     tell(52);
@@ -125,20 +120,18 @@ TEST_F(RestoreProgressWindowTest, StaysRegisteredThoughItsDialogCannotBeMade)
 
 TEST_F(RestoreProgressWindowTest, HoldsFewMessagesWhileNobodyReadsItsCancel)
 {
-    for (const bool reads : {true, false}) {
-        const PipeServer server(kCommand, PIPE_ACCESS_INBOUND, 1, 0);
-        const HWND dialog = opened();
-        PostMessageW(dialog, WM_COMMAND, TAVI_PROGRESS_CANCEL, 0);
-        ASSERT_TRUE(server.waitClient());
-        const auto item = text(L"item");
-        for (int round = 0; round < 50000; ++round)
-            dispatch(std::make_unique<EventMessage>(round % 100 == 0 ? 51 : 54, 0, 0, 0, item));
-        EXPECT_GT(item.use_count(), 1) << "it is stuck in its write";
-        EXPECT_LE(item.use_count(), 1001);
-        reads ? static_cast<void>(server.readAll()) : server.hangUp();
-        EXPECT_TRUE(gone(dialog));
-        EXPECT_TRUE(waitUntil([&] { return item.use_count() == 1; }));
-    }
+    const PipeServer server(kCommand, PIPE_ACCESS_INBOUND, 1, 0);
+    const HWND dialog = opened();
+    PostMessageW(dialog, WM_COMMAND, TAVI_PROGRESS_CANCEL, 0);
+    ASSERT_TRUE(server.waitClient());
+    const auto item = text(L"item");
+    for (int round = 0; round < 50000; ++round)
+        dispatch(std::make_unique<EventMessage>(round % 100 == 0 ? 51 : 54, 0, 0, 0, item));
+    EXPECT_GT(item.use_count(), 1) << "it is stuck in its write";
+    EXPECT_LE(item.use_count(), 1001);
+    server.hangUp();
+    EXPECT_TRUE(gone(dialog));
+    EXPECT_TRUE(waitUntil([&] { return item.use_count() == 1; }));
     EXPECT_TRUE(log.take().empty());
 }
 
