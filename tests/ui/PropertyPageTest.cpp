@@ -53,7 +53,6 @@ TEST_F(PropertyPageTest, LivesAndGoesWithItsSheet)
 {
     translate("Tavi", "Sicherung");
     const std::tuple<bool, UINT, WPARAM> ends[] = {{true, WM_COMMAND, IDCANCEL}, // of the page
-                                                   {false, PSM_PRESSBUTTON, PSBTN_CANCEL},
                                                    {false, PSM_PRESSBUTTON, PSBTN_OK},
                                                    {false, WM_SYSCOMMAND, SC_CLOSE}};
     for (const auto& [isOfPage, end, parameter] : ends) {

@@ -30,9 +30,9 @@ struct VersionsDialogTest : UiTest {
     HWND dialog = nullptr, list = nullptr;
 };
 
-Selection selectionOf(const PathSet& paths, bool isFolder = false, int coverage = 1)
+Selection selectionOf(const PathSet& paths, bool isFolder = false)
 {
-    return {paths, 0, coverage, isFolder, {}};
+    return {paths, 0, paths.size() == 1 ? 1 : -1, isFolder, {}};
 }
 
 const wchar_t* const kVersions =
@@ -48,21 +48,18 @@ TEST_F(VersionsDialogTest, ListsTheVersionsOfTheSelection)
     const std::wstring ends = L"\n11/14/2023 10:13 PM|09/13/2020 12:26 PM|10 bytes|",
                        runs = L"\n11/14/2023 10:13 PM|\n*11/17/2023 05:46 AM|",
                        items = L"the items you selected are backed up on the Tavi servers.  You can select one and ";
-    const struct {
-        Selection selection;
-        std::wstring message, label, rows;
-    } cases[] = {
+    const std::tuple<Selection, std::wstring, std::wstring, std::wstring> cases[] = {
         {selectionOf({L"C:\\d\\50% & more.txt"}),
          L"50% & more.txt are backed up on the Tavi servers.  You can select one and restore it", L"File &Versions:",
          ends + L"\n11/17/2023 05:46 AM|09/13/2020 12:26 PM|2.0 KB|\n*01/01/2100 12:00 AM|01/01/2100 12:01 AM|1.0 MB|"},
         {selectionOf({L"C:\\d\\ends.txt"}), L"ends.txt are", L"File &Versions:", ends},
         {selectionOf({L"C:\\d"}, true), items + L"restore the files", L"Available &Versions:", runs},
-        {selectionOf({L"C:\\a", L"C:\\b"}, true, -1), L"some of " + items, L"Available &Versions:", runs},
+        {selectionOf({L"C:\\a", L"C:\\b"}, true), L"some of " + items, L"Available &Versions:", runs},
     };
-    for (const auto& test : cases) {
-        open(test.selection, kVersions);
-        EXPECT_EQ(controlText(dialog, TAVI_VERSIONS_MESSAGE).find(L"The following versions of " + test.message), 0u);
-        EXPECT_EQ(controlText(dialog, TAVI_VERSIONS_LABEL), test.label);
+    for (const auto& [selection, message, label, expected] : cases) {
+        open(selection, kVersions);
+        EXPECT_EQ(controlText(dialog, TAVI_VERSIONS_MESSAGE).find(L"The following versions of " + message), 0u);
+        EXPECT_EQ(controlText(dialog, TAVI_VERSIONS_LABEL), label);
         std::wstring rows;
         for (int row = 0; row < ListView_GetItemCount(list); ++row) {
             rows += ListView_GetItemState(list, row, LVIS_SELECTED) ? L"\n*" : L"\n";
@@ -72,7 +69,7 @@ TEST_F(VersionsDialogTest, ListsTheVersionsOfTheSelection)
                 rows += text + std::wstring(L"|");
             }
         }
-        EXPECT_EQ(rows, test.rows);
+        EXPECT_EQ(rows, expected);
         EXPECT_EQ(enabledActions(), rows.find(L'*') == std::wstring::npos ? 0 : 2);
         click(dialog, IDCANCEL);
         waitForThreads();
@@ -118,8 +115,8 @@ TEST_F(VersionsDialogTest, RequestsWhatWasAnswered)
     setProgressWindowOpener([] { ++progressWindows; });
     for (const wchar_t* name : {L"f", L"t"})
         CreateDirectoryW(in(name).wc_str(), nullptr);
-    for (const wchar_t* name : {L"f\\5%", L"t\\was"})
-        std::ofstream(in(name).wc_str());
+    std::ofstream(in(L"f\\5%").wc_str());
+    std::ofstream(in(L"t\\was").wc_str());
     const wxString files = in(L"f\\5%\n100:1:7:1:0::0:40\n200:1:8:2:0::0:41\n\n") +
                            in(L"f\\b\\c\n100:1:7:3:0::0:0\n\n") + L"simple.map\n100:1:1:1:0::0:0";
     DbConnection database;
@@ -133,18 +130,12 @@ TEST_F(VersionsDialogTest, RequestsWhatWasAnswered)
     const wchar_t* const loses = L"Restoring this file will overwrite your current version, and you will lose any ";
     const wchar_t* const loseAll = L"since they were last backed up.  Would you like to overwrite it?";
     const wchar_t* const exist = L"One or more of the items you selected already exist.  Would you like to overwrite ";
-    const struct {
-        const Selection& selection;
-        int row, button;
-        std::vector<int> answers; // to one box after the other
-        const wchar_t* question;
-        // Source, time, attributes, target, whether it may be replaced. The chosen folder ends in a backslash and the
-        // rest begins with one.
-        const wchar_t* files;
-    } cases[] = {
+    // The row, the button, the answers to one box after the other, the question of the last, the files as source, time,
+    // attributes, target, whether it may be replaced. The chosen folder ends in a backslash and the rest begins with
+    // one.
+    const std::tuple<const Selection&, int, int, std::vector<int>, const wchar_t*, const wchar_t*> cases[] = {
         {one, 0, kRestore, {IDYES}, loses, LR"(f\5% 100 32 f\5% 1)"},
         {one, 1, kRestore, {IDNO}, loses, LR"(f\5% 200 33 f\5% (1) 0)"},
-        {one, 1, kRestore, {IDCANCEL}, loses, L""},
         {one, 1, kRestore, {kCloseWindow}, loses, L""},
         {whole, 0, kRestore, {IDYES}, loseAll, LR"(f\5% 100 32 f\5% 1;f\b\c 100 0 f\b\c 1)"},
         // The save box itself asks about the file that is there.
@@ -157,16 +148,16 @@ TEST_F(VersionsDialogTest, RequestsWhatWasAnswered)
         // The target of a single folder is the chosen folder itself, which is always there.
         {whole, 0, kCopy, {IDOK, IDYES}, exist, LR"(f\5% 100 32 t\\5% 1;f\b\c 100 0 t\\b\c 1)"},
     };
-    for (const auto& test : cases) {
-        SCOPED_TRACE(&test - cases);
+    for (const auto& [selection, row, button, answers, question, requested] : cases) {
+        SCOPED_TRACE(requested);
         DeleteFileW(in(L"t\\5%").wc_str());
-        if (test.answers.size() > 1)
+        if (answers.size() > 1)
             std::ofstream(in(L"t\\5%").wc_str());
-        open(test.selection, files);
-        ListView_SetItemState(list, test.row, LVIS_SELECTED, LVIS_SELECTED);
-        click(dialog, test.button);
+        open(selection, files);
+        ListView_SetItemState(list, row, LVIS_SELECTED, LVIS_SELECTED);
+        click(dialog, button);
         HWND box = nullptr;
-        for (const int answer : test.answers) {
+        for (const int answer : answers) {
             box = waitDialog(nullptr, {dialog, box});
             if (GetDlgItem(box, cmb13)) {
                 EXPECT_EQ(controlText(box, cmb13), L"5%");
@@ -180,19 +171,19 @@ TEST_F(VersionsDialogTest, RequestsWhatWasAnswered)
                 TVITEMW item{TVIF_TEXT, TreeView_GetSelection(tree), 0, 0, name, MAX_PATH, 0, 0, 0, 0};
                 return TreeView_GetItem(tree, &item) && std::wcscmp(name, L"t") == 0;
             }));
-            EXPECT_TRUE(answer == IDOK || controlText(box, 0xFFFF).find(test.question) != std::wstring::npos);
+            EXPECT_TRUE(answer == IDOK || controlText(box, 0xFFFF).find(question) != std::wstring::npos);
             answer == kCloseWindow ? PostMessageW(dialog, WM_CLOSE, 0, 0) : click(box, answer);
         }
         waitForThreads();
-        const char* text = "";
         DbQuery stored = database.execQuery(
             "SELECT ifnull(group_concat(manifest_path || ' ' || timestamp || ' ' || attributes || ' ' || "
             "target_path || ' ' || overwrite, ';'), '') FROM restore_files");
+        const char* text = "";
         EXPECT_TRUE(stored.nextRow());
         stored.fieldText(0, text);
         wxString rows = fromUtf8(text);
         rows.Replace(in(L""), L"");
-        EXPECT_EQ(rows, test.files);
+        EXPECT_EQ(rows, requested);
         EXPECT_EQ(database.execDML("DELETE FROM restores"), rows.empty() ? 0 : 1);
         EXPECT_EQ(progressWindows.exchange(0), rows.empty() ? 0 : 1);
         database.execDML("DELETE FROM restore_files");
@@ -203,16 +194,13 @@ TEST_F(VersionsDialogTest, RequestsWhatWasAnswered)
 TEST_F(VersionsDialogTest, SharesWholeComponentsAndLooksBehindTheFolder)
 {
     const wxString target = in(L"t\\"), deep = L"C:\\" + wxString(L'd', 300);
-    for (const wchar_t* name : {L"t", L"t\\x"})
-        CreateDirectoryW(in(name).wc_str(), nullptr);
+    std::filesystem::create_directories(in(L"t\\x").wc_str());
     const std::tuple<PathSet, wxString, bool> cases[] = {
         {{}, L"", false},
         {{L"C:\\a\\none"}, L"C:\\a\\none", true}, // the target is the folder itself
         {{L"C:\\"}, L"C:\\", true},
-        {{L"C:\\a\\n", L"C:\\a\\X"}, L"C:\\a", true},
         {{L"C:\\a\\xx", L"C:\\a\\xy"}, L"C:\\a", false},
-        {{L"C:\\a", L"C:\\a\\x"}, L"C:\\a", true},
-        {{L"C:\\n", L"C:\\m"}, L"C:\\", false},
+        {{L"C:\\a", L"C:\\a\\X"}, L"C:\\a", true},
         {{L"C:\\Dir\\N", L"c:\\dIR\\m"}, L"C:\\Dir", false},
         {{L"C:\\n", L"D:\\n"}, L"", false},
         // The odd one of three comes out of the set last in one of the two.
