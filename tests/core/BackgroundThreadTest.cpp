@@ -26,17 +26,12 @@ BackgroundThread subject("test", [](const BackgroundThread& self) {
         throw std::runtime_error("a failing body");
 });
 
-bool happens(const KernelHandle& event)
-{
-    return WaitForSingleObject(event.get(), 10000) == WAIT_OBJECT_0;
-}
-
 TEST(BackgroundThread, ExistsOnceAndTakesAStopRequestBack)
 {
     subject.requestStop(); // nothing to stop
     subject.start();
     subject.start();
-    ASSERT_TRUE(happens(entered));
+    ASSERT_EQ(WaitForSingleObject(entered.get(), 10000), WAIT_OBJECT_0);
 
     // Withdrawn before the body has looked: it never notices, and runs again since it has returned all the same.
     const DWORD first = thread;
@@ -45,7 +40,7 @@ TEST(BackgroundThread, ExistsOnceAndTakesAStopRequestBack)
     subject.start();
     EXPECT_FALSE(subject.isStopping());
     ReleaseSemaphore(leave.get(), 1, nullptr);
-    ASSERT_TRUE(happens(entered));
+    ASSERT_EQ(WaitForSingleObject(entered.get(), 10000), WAIT_OBJECT_0);
     EXPECT_FALSE(sawStop);
     EXPECT_EQ(thread, first) << "a second thread would compete with the first";
     subject.requestStop();
@@ -55,16 +50,16 @@ TEST(BackgroundThread, ExistsOnceAndTakesAStopRequestBack)
     for (int body = 2; body <= 3; ++body) {
         const KernelHandle ended(subject.releaseHandle());
         ReleaseSemaphore(leave.get(), 1, nullptr);
-        EXPECT_TRUE(happens(ended));
+        EXPECT_EQ(WaitForSingleObject(ended.get(), 10000), WAIT_OBJECT_0);
         EXPECT_EQ(sawStop, body == 2);
         EXPECT_FALSE(subject.isActive());
         subject.start();
-        ASSERT_TRUE(happens(entered));
+        ASSERT_EQ(WaitForSingleObject(entered.get(), 10000), WAIT_OBJECT_0);
     }
     EXPECT_EQ(bodies, 4);
     subject.requestStop();
     ReleaseSemaphore(leave.get(), 1, nullptr);
-    EXPECT_TRUE(happens(KernelHandle(subject.releaseHandle())));
+    EXPECT_EQ(WaitForSingleObject(KernelHandle(subject.releaseHandle()).get(), 10000), WAIT_OBJECT_0);
 }
 
 } // namespace
