@@ -4,7 +4,7 @@
 #include <string>
 #include <string_view>
 
-#include "tests/backupset/PathTreeModel.h"
+#include "fuzz/PathTreeModel.h"
 
 namespace {
 

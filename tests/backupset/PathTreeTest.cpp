@@ -4,7 +4,7 @@
 #include <gtest/gtest.h>
 
 #include "core/Reference.h"
-#include "tests/backupset/PathTreeModel.h"
+#include "fuzz/PathTreeModel.h"
 
 namespace tavi {
 namespace {
