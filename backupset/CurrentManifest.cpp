@@ -14,8 +14,17 @@ namespace tavi {
 namespace {
 
 WatcherState watcher;
-// The reference of the newest menu.
+// The reference of the newest menu, and one that a menu before it had. The watcher releases that: to destroy a manifest
+// of many files takes longer than a menu may.
 std::atomic<const Manifest*> menuManifest{nullptr};
+std::atomic<const Manifest*> retiredManifest{nullptr};
+
+void replaceReference(std::atomic<const Manifest*>& holder, const Manifest* next) noexcept
+{
+    if (const Manifest* const previous = holder.exchange(next))
+        previous->Release();
+}
+
 // Created before the process entry runs; serialises only the start of the watcher.
 const KernelHandle manifestMutex(CreateMutexW(nullptr, FALSE, nullptr));
 
@@ -39,6 +48,7 @@ class SystemServices : public WatcherServices {
     void sleep(std::uint32_t milliseconds) override
     {
         Sleep(milliseconds);
+        replaceReference(retiredManifest, nullptr);
     }
     bool isStopping() override
     {
@@ -57,12 +67,6 @@ BackgroundThread watcherThread("manifest watcher", [](const BackgroundThread& se
     SystemServices services(self);
     RunManifestWatcher(watcher, services);
 });
-
-void replaceMenuManifest(const Manifest* next) noexcept
-{
-    if (const Manifest* const previous = menuManifest.exchange(next))
-        previous->Release();
-}
 
 } // namespace
 
@@ -85,7 +89,12 @@ const Manifest* GetCurrentManifest() noexcept
 
 void holdManifestForMenu() noexcept
 {
-    replaceMenuManifest(GetCurrentManifest());
+    const Manifest* const current = GetCurrentManifest();
+    const Manifest* const previous = menuManifest.exchange(current);
+    if (previous == current && previous)
+        previous->Release();
+    else if (previous)
+        replaceReference(retiredManifest, previous);
 }
 
 void requestWatcherStop() noexcept
@@ -112,7 +121,8 @@ void StopManifestWatcher() noexcept
     if (const HANDLE thread = watcherThread.releaseHandle())
         CloseHandle(thread);
     watcher.manifest.replace(nullptr);
-    replaceMenuManifest(nullptr);
+    replaceReference(menuManifest, nullptr);
+    replaceReference(retiredManifest, nullptr);
     DropGraylist();
 }
 
