@@ -60,6 +60,14 @@ std::uintptr_t numberOf(Variable& variable) noexcept
     return variable.number.compare_exchange_strong(number, next) ? next : number;
 }
 
+// Takes the thread out of the list. Under the lock.
+void removeFromList(const ThreadVariables& thread) noexcept
+{
+    *thread.link = thread.next;
+    if (thread.next)
+        thread.next->link = thread.link;
+}
+
 // Room for a few more than asked for; grows once or twice in the life of a thread.
 ThreadVariables* grow(ThreadVariables* before, std::uintptr_t count) noexcept
 {
@@ -72,9 +80,7 @@ ThreadVariables* grow(ThreadVariables* before, std::uintptr_t count) noexcept
     AcquireSRWLockExclusive(&lock);
     if (before) {
         std::memcpy(grown->variables, before->variables, before->count * sizeof(void*));
-        *before->link = before->next;
-        if (before->next)
-            before->next->link = before->link;
+        removeFromList(*before);
     }
     grown->next = allThreads;
     grown->link = &allThreads;
@@ -128,9 +134,7 @@ void releaseThread() noexcept
         return;
     TlsSetValue(index, nullptr);
     AcquireSRWLockExclusive(&lock);
-    *thread->link = thread->next;
-    if (thread->next)
-        thread->next->link = thread->link;
+    removeFromList(*thread);
     ReleaseSRWLockExclusive(&lock);
     freeVariables(thread);
 }
