@@ -15,14 +15,14 @@ namespace tavi::bench {
 // An installed service whose databases stand in one folder, for as long as this lives.
 class BenchInstall {
   public:
-    explicit BenchInstall(const std::string& folder) : folder_(fromUtf8(folder)), key_(GetInstallKeyName())
+    explicit BenchInstall(const std::string& folder) : folder_(fromUtf8(folder)), key_(getInstallKeyName())
     {
         CreateDirectoryW(folder_.wc_str(), nullptr);
         key_.Create();
         key_.SetValue(L"ConfigPath", folder_);
         key_.SetValue(L"DataPath", folder_);
         for (const int file : {0, 1})
-            DeleteFileW((file == 0 ? GetConfigFilePath(kConfigDatabase) : GetDataFilePath(kStateDatabase)).wc_str());
+            DeleteFileW((file == 0 ? getConfigFilePath(kConfigDatabase) : getDataFilePath(kStateDatabase)).wc_str());
     }
     BenchInstall(const BenchInstall&) = delete;
     BenchInstall& operator=(const BenchInstall&) = delete;
@@ -32,11 +32,11 @@ class BenchInstall {
     }
     DbConnection stateDatabase() const
     {
-        return open(GetDataFilePath(kStateDatabase));
+        return open(getDataFilePath(kStateDatabase));
     }
     DbConnection configDatabase() const
     {
-        return open(GetConfigFilePath(kConfigDatabase));
+        return open(getConfigFilePath(kConfigDatabase));
     }
 
   private:

@@ -9,7 +9,7 @@
 
 #include <zlib.h>
 
-#include "backupset/StoredManifest.h"
+#include "manifest/StoredManifest.h"
 
 namespace tavi::bench {
 namespace {

@@ -4,7 +4,7 @@
 #include <string>
 #include <vector>
 
-#include "backupset/Manifest.h"
+#include "manifest/Manifest.h"
 
 namespace tavi::bench {
 

@@ -2,7 +2,7 @@
 
 #include <sqlite3.h>
 
-#include "backupset/ManifestWatcher.h"
+#include "manifest/ManifestWatcher.h"
 #include "bench/Bench.h"
 #include "bench/BenchInstall.h"
 #include "bench/ManifestGenerator.h"
@@ -12,7 +12,7 @@ namespace {
 
 void store(const std::vector<char>& blob)
 {
-    const std::string path = toUtf8(view(GetDataFilePath(kStateDatabase)));
+    const std::string path = toUtf8(view(getDataFilePath(kStateDatabase)));
     sqlite3* database = nullptr;
     sqlite3_stmt* insert = nullptr;
     const bool stored =
@@ -31,9 +31,9 @@ std::vector<double> measureLoad(const std::vector<std::string>& arguments)
 {
     const double idle = workingSet();
     const auto files = static_cast<std::uint32_t>(std::stoul(arguments[0]));
-    const ManifestRef held = whole(ReadStoredManifest(), files);
+    const ManifestRef held = whole(readStoredManifest(), files);
     const double first = peakWorkingSet() - idle;
-    const ManifestRef next = whole(ReadStoredManifest(), files);
+    const ManifestRef next = whole(readStoredManifest(), files);
     return {first, peakWorkingSet() - idle};
 }
 const Child loadChild("database-memory", measureLoad);
@@ -51,7 +51,7 @@ void databaseBench(Bench& bench)
         const auto times =
             medianSeconds(bench.quick() ? 3 : 5, {
                                                      [&] { inflateOnly(blob, text.textBytes); },
-                                                     [&] { manifest = whole(ReadStoredManifest(), files); },
+                                                     [&] { manifest = whole(readStoredManifest(), files); },
                                                      [&] { manifest = ManifestRef(); },
                                                  });
         bench.report({"database to manifest / inflating" + at, times[1] / times[0], 2.5, "x"});

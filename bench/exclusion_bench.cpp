@@ -3,8 +3,8 @@
 #include <windows.h>
 #include <sddl.h>
 
-#include "backupset/Graylist.h"
-#include "backupset/UserProfiles.h"
+#include "exclusions/Graylist.h"
+#include "exclusions/UserProfiles.h"
 #include "bench/Bench.h"
 #include "bench/BenchInstall.h"
 #include "core/Handles.h"
@@ -34,7 +34,7 @@ class Profiles {
     {
         KernelHandle token;
         OpenProcessToken(GetCurrentProcess(), TOKEN_ADJUST_PRIVILEGES | TOKEN_QUERY, token.out());
-        SetPrivilege(token.get(), L"SeBackupPrivilege", true);
+        setPrivilege(token.get(), L"SeBackupPrivilege", true);
         for (int user = 0; user < kProfiles; ++user) {
             const std::wstring home = folder + L"\\user" + std::to_wstring(user);
             wxRegKey hive(L"HKCU\\Software\\TaviBenchHive");
@@ -65,7 +65,7 @@ class Profiles {
             profile.SetValue(L"Sid", bytes);
             profile.SetValue(L"ProfileImagePath", wxString(home));
         }
-        SetPrivilege(token.get(), L"SeBackupPrivilege", false);
+        setPrivilege(token.get(), L"SeBackupPrivilege", false);
     }
     ~Profiles()
     {
@@ -128,14 +128,14 @@ void runExclusions(Bench& bench)
     GetFullPathNameW(folder.wc_str(), MAX_PATH, full, nullptr);
     const Profiles profiles(full);
     const LargeWindowsFolder windows(bench.quick() ? 500 : 5000);
-    BuildGraylist(true);
+    buildGraylist(true);
     const double before = workingSet();
     // The system's share: hives, every user's folders by name, and a listing of each folder that has rules below it.
     const auto required = [&] {
-        LoadUserHives();
+        loadUserHives();
         for (const wchar_t* const name : kFolders)
-            ShellFolderPaths(name);
-        UnloadUserHives();
+            shellFolderPaths(name);
+        unloadUserHives();
         count(LargeWindowsFolder::folder());
         for (int user = 0; user < kProfiles; ++user) {
             const std::wstring home = full + (L"\\user" + std::to_wstring(user));
@@ -144,11 +144,11 @@ void runExclusions(Bench& bench)
                 count(home + below);
         }
     };
-    const auto seconds = medianSeconds(bench.repetitions(), {[] { BuildGraylist(true); }, required});
+    const auto seconds = medianSeconds(bench.repetitions(), {[] { buildGraylist(true); }, required});
     bench.report({"exclusions: build, 20 profiles / the system calls it needs", seconds[0] / seconds[1], 2, ""});
     bench.report({"exclusions: build", seconds[0] * 1000, kNoBound, "ms"});
     bench.report({"exclusions: memory kept after rebuilding", (workingSet() - before) / 1048576, 1, "MB"});
-    DropGraylist();
+    dropGraylist();
 }
 
 const Group group("exclusions", runExclusions);

@@ -10,7 +10,7 @@
 #include "bench/BenchInstall.h"
 #include "core/Handles.h"
 #include "core/Options.h"
-#include "backupset/ManifestWatcher.h"
+#include "manifest/ManifestWatcher.h"
 #include "link/MessageReader.h"
 #include "link/PipeIo.h"
 #include "link/StatusListener.h"
@@ -262,7 +262,7 @@ class Services final : public WatcherServices {
     explicit Services(unsigned rounds) : inTime_(rounds == 0), left_(rounds) {}
     const Manifest* loadManifest() override
     {
-        return Manifest::Parse(wxString());
+        return Manifest::parse(wxString());
     }
     bool manifestTime(std::int64_t& milliseconds) override
     {
@@ -296,7 +296,7 @@ void runWatcher(unsigned rounds)
 {
     WatcherState state;
     Services services(rounds);
-    RunManifestWatcher(state, services);
+    runManifestWatcher(state, services);
     state.manifest.replace(nullptr);
 }
 
@@ -310,7 +310,7 @@ void readTime()
     HKEY key = nullptr;
     wchar_t text[64];
     DWORD size = sizeof text;
-    static const wxString name = GetSettingsKeyName().AfterFirst(L'\\');
+    static const wxString name = getSettingsKeyName().AfterFirst(L'\\');
     RegOpenKeyExW(HKEY_LOCAL_MACHINE, name.wc_str(), 0, KEY_READ, &key);
     RegQueryValueExW(key, L"options.manifestmtime", nullptr, nullptr, reinterpret_cast<BYTE*>(text), &size);
     RegCloseKey(key);
@@ -392,7 +392,7 @@ void reportIdle(Bench& bench, const std::string& name, double ours, double bare)
 
 void idleBench(Bench& bench)
 {
-    wxRegKey settings(GetSettingsKeyName());
+    wxRegKey settings(getSettingsKeyName());
     settings.Create();
     settings.SetValue(L"options.manifestmtime", L"2020-01-02 03:04:05");
     const auto alone = idleTimes(bench, {"listen", "attempts", "watch", "bare-watch"});

@@ -3,7 +3,7 @@
 
 #include <windows.h>
 
-#include "backupset/StoredManifest.h"
+#include "manifest/StoredManifest.h"
 #include "bench/Bench.h"
 #include "bench/ManifestGenerator.h"
 #include "core/Text.h"
@@ -89,12 +89,12 @@ void questionFigures(Bench& bench, std::uint32_t files)
     std::size_t answers = 0;
     const auto under = [&](const std::vector<std::wstring>& all, std::size_t count) {
         for (std::size_t i = 0; i < count; ++i)
-            answers += manifest->HasBackedUpUnder(all[i], kAnyTime) ? 1u : 0u;
+            answers += manifest->hasBackedUpUnder(all[i], kAnyTime) ? 1u : 0u;
     };
     const auto times = medianSeconds(bench.repetitions(), {
                                                               [&] {
                                                                   for (const auto& path : paths)
-                                                                      answers += manifest->FindPatches(path) ? 1u : 0u;
+                                                                      answers += manifest->findPatches(path) ? 1u : 0u;
                                                               },
                                                               [&] { under(folders, kQuestions); },
                                                               [&] { under(partial, kQuestions); },

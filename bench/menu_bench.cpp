@@ -10,7 +10,7 @@
 #include "bench/BenchInstall.h"
 #include "core/Handles.h"
 #include "core/Module.h"
-#include "backupset/CurrentManifest.h"
+#include "manifest/CurrentManifest.h"
 #include "statedb/StateLookups.h"
 #include "ui/ContextMenu.h"
 #include "ui/Selection.h"
@@ -128,11 +128,11 @@ void menuBench(Bench& bench)
         FolderStateTable states;
         setModuleInstance(GetModuleHandleW(nullptr));
         // The watcher loads the empty manifest first, so that the versions of every file are asked for.
-        for (int i = 0; i < 500 && !ManifestRef(GetCurrentManifest()); ++i)
+        for (int i = 0; i < 500 && !ManifestRef(getCurrentManifest()); ++i)
             Sleep(10);
         sqlite3* database = nullptr;
         sqlite3_stmt* bare = nullptr;
-        sqlite3_open(toUtf8(view(GetConfigFilePath(kConfigDatabase))).c_str(), &database);
+        sqlite3_open(toUtf8(view(getConfigFilePath(kConfigDatabase))).c_str(), &database);
         sqlite3_prepare_v2(database, "SELECT state FROM filesystem WHERE folder=?", -1, &bare, nullptr);
         unsigned found = 0;
         std::size_t selected = 0, all = 0;
@@ -163,7 +163,7 @@ void menuBench(Bench& bench)
         bench.report({"menu query / the system calls among them", times[2] / times[0], kNoBound, "x"});
         bench.report({"an item of 70000 / an item of 10000", times[4] / times[3] * kFiles / kManyItems, 1.3, "x"});
         bench.report({"menu query, 10000 files", times[2] * 1e3, kNoBound, "ms"});
-        StopManifestWatcher();
+        stopManifestWatcher();
         for (int i = 0; i < 500 && isWatcherActive(); ++i)
             Sleep(10);
     }

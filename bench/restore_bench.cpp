@@ -3,7 +3,7 @@
 #include "bench/Bench.h"
 #include "bench/BenchInstall.h"
 #include "bench/ManifestGenerator.h"
-#include "statedb/RestoreRequest.h"
+#include "restore/RestoreRequest.h"
 
 namespace tavi::bench {
 namespace {

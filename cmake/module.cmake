@@ -1,4 +1,4 @@
-# The Windows build: rooms, module, tests, stand-ins, benchmarks.
+# The Windows build: the product as a library, the module, tests, stand-ins, benchmarks.
 enable_language(RC)
 
 set(CMAKE_CROSSCOMPILING_EMULATOR "${CMAKE_SOURCE_DIR}/scripts/wine-run;${CMAKE_BINARY_DIR}/wineprefix")
@@ -13,21 +13,21 @@ add_library(tavi_platform INTERFACE)
 target_compile_definitions(tavi_platform INTERFACE UNICODE _UNICODE _WIN32_WINNT=0x0600 WINVER=0x0600 NOMINMAX
     WIN32_LEAN_AND_MEAN __WXMSW__ wxUSE_GUI=0 wxDEBUG_LEVEL=0)
 target_include_directories(tavi_platform SYSTEM INTERFACE ${TAVI_DEPS}/include)
-target_include_directories(tavi_platform INTERFACE ${CMAKE_SOURCE_DIR})
+target_include_directories(tavi_platform INTERFACE ${CMAKE_SOURCE_DIR}/src ${CMAKE_SOURCE_DIR})
 target_compile_options(tavi_platform INTERFACE -ffunction-sections -fdata-sections)
 target_link_options(tavi_platform INTERFACE -static -Wl,--gc-sections -Wl,--enable-stdcall-fixup -Wl,--no-insert-timestamp)
 target_link_libraries(tavi_platform INTERFACE ${TAVI_DEPS}/lib/libsqlite3.a ${TAVI_DEPS}/lib/libwxbase32u.a
     ${TAVI_DEPS}/lib/libz.a ole32 oleaut32 uuid shlwapi shell32 advapi32 comctl32 comdlg32 gdi32 user32 version)
 
-file(GLOB room_sources CONFIGURE_DEPENDS core/*.cpp statedb/*.cpp backupset/*.cpp link/*.cpp ui/*.cpp shell/*.cpp)
-# The module itself is thin: the process entry, the exports and the resources.
-list(REMOVE_ITEM room_sources ${CMAKE_SOURCE_DIR}/shell/DllMain.cpp ${CMAKE_SOURCE_DIR}/shell/Exports.cpp)
-add_library(tavi_rooms STATIC ${room_sources})
-target_link_libraries(tavi_rooms PUBLIC tavi_platform PRIVATE tavi_warnings)
+# The DLL itself is thin: the process entry, the exports and the resources.
+file(GLOB product_sources CONFIGURE_DEPENDS src/*/*.cpp)
+list(REMOVE_ITEM product_sources ${CMAKE_SOURCE_DIR}/src/shell/DllMain.cpp ${CMAKE_SOURCE_DIR}/src/shell/Exports.cpp)
+add_library(tavi_product STATIC ${product_sources})
+target_link_libraries(tavi_product PUBLIC tavi_platform PRIVATE tavi_warnings)
 
 include(cmake/resources.cmake)
 
-add_library(tavishell SHARED shell/DllMain.cpp shell/Exports.cpp shell/tavishell.def ui/tavishell.rc)
+add_library(tavishell SHARED src/shell/DllMain.cpp src/shell/Exports.cpp src/shell/tavishell.def src/ui/tavishell.rc)
 set_target_properties(tavishell PROPERTIES PREFIX "" LINK_FLAGS_RELEASE "-s")
 # Only 32-bit names are decorated.
 if(CMAKE_SIZEOF_VOID_P EQUAL 4)
@@ -35,11 +35,9 @@ if(CMAKE_SIZEOF_VOID_P EQUAL 4)
 else()
     target_link_options(tavishell PRIVATE -Wl,--entry=tavishellEntry)
 endif()
-set_property(SOURCE ui/tavishell.rc APPEND PROPERTY OBJECT_DEPENDS "${resource_files}")
+set_property(SOURCE src/ui/tavishell.rc APPEND PROPERTY OBJECT_DEPENDS "${resource_files}")
 target_include_directories(tavishell PRIVATE ${resource_folder})
-target_link_libraries(tavishell PRIVATE tavi_rooms tavi_warnings)
-add_custom_command(TARGET tavishell POST_BUILD
-    COMMAND ${CMAKE_COMMAND} -DFILE=$<TARGET_FILE:tavishell> -P ${CMAKE_SOURCE_DIR}/cmake/print_size.cmake VERBATIM)
+target_link_libraries(tavishell PRIVATE tavi_product tavi_warnings)
 
 add_subdirectory(tools)
 add_subdirectory(tests)

@@ -13,14 +13,15 @@ find_package(Threads REQUIRED)
 
 add_library(tavi_native INTERFACE)
 target_compile_options(tavi_native INTERFACE ${wx_flags} -g)
-target_include_directories(tavi_native INTERFACE ${CMAKE_SOURCE_DIR})
+target_include_directories(tavi_native INTERFACE ${CMAKE_SOURCE_DIR}/src ${CMAKE_SOURCE_DIR})
 target_link_libraries(tavi_native INTERFACE ${wx_libs} SQLite::SQLite3 ZLIB::ZLIB Threads::Threads)
 if(TAVI_SANITIZE)
     target_compile_options(tavi_native INTERFACE -fsanitize=${TAVI_SANITIZE} -fno-sanitize-recover=all -fno-omit-frame-pointer)
     target_link_options(tavi_native INTERFACE -fsanitize=${TAVI_SANITIZE})
 endif()
 
-add_library(tavi_pure STATIC ${pure_sources})
+list(TRANSFORM pure_sources PREPEND ${CMAKE_SOURCE_DIR}/src/ OUTPUT_VARIABLE pure_files)
+add_library(tavi_pure STATIC ${pure_files})
 target_link_libraries(tavi_pure PUBLIC tavi_native PRIVATE tavi_warnings)
 
 add_subdirectory(tests)

@@ -3,7 +3,7 @@
 #include <map>
 #include <string>
 
-#include "backupset/PathTree.h"
+#include "exclusions/PathTree.h"
 
 namespace tavi::test {
 

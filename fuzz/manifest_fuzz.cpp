@@ -5,7 +5,7 @@
 #include <wx/log.h>
 #include <zlib.h>
 
-#include "backupset/StoredManifest.h"
+#include "manifest/StoredManifest.h"
 #include "core/Text.h"
 
 namespace {
@@ -39,7 +39,7 @@ void checkAnswers(const Manifest& manifest)
 {
     for (std::uint32_t file = 0; file < manifest.fileCount(); ++file) {
         const wxString path = manifest.filePath(file);
-        const auto patches = manifest.FindPatches(view(path));
+        const auto patches = manifest.findPatches(view(path));
         require(patches && !patches->empty() && patches->size() == manifest.patches(file).size());
         for (std::size_t i = 0; i < patches->size(); ++i)
             (void)(*patches)[i].auxText();
@@ -86,7 +86,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t len
     const wxString wide = fromUtf8(text);
     if (toUtf8(view(wide)) != text || text.find('\0') != std::string::npos)
         return 0;
-    const ManifestRef parsed = held(Manifest::Parse(wide));
+    const ManifestRef parsed = held(Manifest::parse(wide));
     require(bool(stored) == bool(parsed));
     if (!stored)
         return 0;

@@ -50,7 +50,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t len
             sum = sum * 31 + static_cast<std::size_t>(character);
         return static_cast<std::uint32_t>(sum % 1009 % 5);
     };
-    PathTree* const tree = PathTree::Create(false, counter);
+    PathTree* const tree = PathTree::create(false, counter);
     tree->AddRef();
     test::PathTreeModel model(counter);
     std::set<std::wstring> asked;
@@ -62,11 +62,11 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t len
             path += static_cast<wchar_t>(kNames[input.next() % 3]);
             asked.insert({path, path + L"\\a", path + L"\\c\\b"});
         }
-        tree->Insert(path, head % kStates);
+        tree->insert(path, head % kStates);
         model.insert(path, head % kStates);
     }
     for (const std::wstring& question : asked) {
-        if (tree->Lookup(question) != model.lookup(question))
+        if (tree->lookup(question) != model.lookup(question))
             std::abort();
     }
     tree->Release();

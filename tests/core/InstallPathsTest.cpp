@@ -13,7 +13,7 @@ namespace {
 TEST(InstallPaths, FollowTheRegistryAtEveryCallAndUnreadableOptionsAreDeletedInSilence)
 {
     test::InstalledService service;
-    wxRegKey settings(GetSettingsKeyName());
+    wxRegKey settings(getSettingsKeyName());
     settings.Create();
     test::LogCapture log;
 
@@ -36,11 +36,11 @@ TEST(InstallPaths, FollowTheRegistryAtEveryCallAndUnreadableOptionsAreDeletedInS
 
     service.install().SetValue(L"ConfigPath", wxString(L"C:\\conf"));
     service.install().SetValue(L"DataPath", wxString(L"C:\\data"));
-    EXPECT_EQ(GetDataFilePath(kLogFile) + GetDataFilePath(kDataDirectory) + GetDataFilePath(8) + GetDataFilePath(-1),
+    EXPECT_EQ(getDataFilePath(kLogFile) + getDataFilePath(kDataDirectory) + getDataFilePath(8) + getDataFilePath(-1),
               L"C:\\data\\tavi.logC:\\data");
-    EXPECT_EQ(GetConfigFilePath(0) + GetConfigFilePath(2), L"C:\\conf\\taviconf.dat");
+    EXPECT_EQ(getConfigFilePath(0) + getConfigFilePath(2), L"C:\\conf\\taviconf.dat");
     service.install().DeleteValue(L"DataPath");
-    EXPECT_EQ(GetDataFilePath(kStateDatabase), L"\\tavistate.dat");
+    EXPECT_EQ(getDataFilePath(kStateDatabase), L"\\tavistate.dat");
 }
 
 } // namespace

@@ -30,7 +30,7 @@ TEST(Log, LinesOfAnyThreadReachTheFileAtOnceOrThePreviousTarget)
 {
     const unsigned long levelBefore = wxLog::GetLogLevel();
     test::InstalledService service;
-    ASSERT_TRUE(OpenLog(3));
+    ASSERT_TRUE(openLog(3));
 
     wxLogWarning("at once: %d", 7);
     wxLogInfo("Attaching to %s", "nobody");
@@ -61,14 +61,14 @@ TEST(Log, LinesOfAnyThreadReachTheFileAtOnceOrThePreviousTarget)
         guarded("need", [] { throw std::runtime_error("is known"); });
     }
     EXPECT_EQ(linesOf(path).back(), "@ Error: Unhandled exception in need: is known");
-    CloseLog();
+    closeLog();
     EXPECT_TRUE(DeleteFileW(path.c_str()));
 
     // Without a file the previous target goes on.
     service.install().SetValue(L"DataPath", wxString(L"C:\\no such folder"));
     test::LogCapture log;
     wxLog* const target = wxLog::GetActiveTarget();
-    EXPECT_TRUE(OpenLog(3));
+    EXPECT_TRUE(openLog(3));
     EXPECT_NE(log.take().at(0).find("Unable to open logfile C:\\no such folder\\tavi.log"), std::string::npos);
     // The library's target of last resort would open a message box in the host.
     wxLog::SetActiveTarget(nullptr);
@@ -88,10 +88,10 @@ TEST(Log, WaitsThirtySecondsForTheDataDirectory)
             if (sleeps.size() == installedAfter)
                 service.install().SetValue(L"DataPath", wxString(service.file(L"")));
         };
-        EXPECT_EQ(OpenLog(wxLOG_Max, sleep), installedAfter == 30);
+        EXPECT_EQ(openLog(wxLOG_Max, sleep), installedAfter == 30);
         EXPECT_EQ(sleeps, std::vector<unsigned long>(30, 1000));
     }
-    CloseLog();
+    closeLog();
     EXPECT_TRUE(DeleteFileW(service.file(L"tavi.log").c_str()));
 }
 

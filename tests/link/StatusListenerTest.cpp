@@ -84,7 +84,7 @@ TEST(StatusListener, WaitsForAServiceThatIsNotThereAndAfterAnException)
 TEST(CommandPipe, SendsOneFrameAndHangsUp)
 {
     LogCapture log;
-    auto command = CommandPipe::CancelRestore();
+    auto command = CommandPipe::cancelRestore();
     EXPECT_FALSE(CommandPipe::sendCommand(command));
     EXPECT_TRUE(command) << "left as it is when the pipe cannot be opened";
     EXPECT_EQ(log.take(), std::vector<std::string>{"1: Error: Unable to open command pipe: 2"});
@@ -92,7 +92,7 @@ TEST(CommandPipe, SendsOneFrameAndHangsUp)
         const PipeServer server(kCommand, PIPE_ACCESS_INBOUND);
         EXPECT_TRUE(CommandPipe::sendCommand(command));
         EXPECT_FALSE(command);
-        command = CommandPipe::CancelRestore();
+        command = CommandPipe::cancelRestore();
         EXPECT_EQ(server.readAll(), serialised(*event(52)));
     }
     // A write that fails: nobody reads, and then nobody is there.

@@ -4,7 +4,7 @@
 #include <stdexcept>
 #include <thread>
 
-#include "backupset/CurrentManifest.h"
+#include "manifest/CurrentManifest.h"
 #include "core/Handles.h"
 #include "statedb/Database.h"
 #include "tests/support/Counts.h"
@@ -42,7 +42,7 @@ TEST(Lifecycle, TheFirstManifestIsNullAndItsWatcherTheOnlyOne)
     const test::InstalledService service;
     const test::LogCapture log;
     const std::size_t before = test::countThreads();
-    const auto isLoaded = [] { return static_cast<bool>(ManifestRef(GetCurrentManifest())); };
+    const auto isLoaded = [] { return static_cast<bool>(ManifestRef(getCurrentManifest())); };
     const auto hasWatcher = [&](bool more) {
         return test::waitUntil([&] { return test::countThreads() == before + more; });
     };
@@ -59,14 +59,14 @@ TEST(Lifecycle, TheFirstManifestIsNullAndItsWatcherTheOnlyOne)
     EXPECT_TRUE(test::waitUntil(isLoaded));
 
     // Takes the mutex of the start for this thread and keeps it.
-    StopManifestWatcher();
+    stopManifestWatcher();
     static std::atomic<bool> isNull{false};
     EXPECT_TRUE(hasWatcher(false));
     std::thread([&] { isNull = !isLoaded(); }).detach();
     EXPECT_TRUE(test::waitUntil([] { return isNull.load(); })) << "the call waits, or there is a manifest";
     EXPECT_TRUE(hasWatcher(false)) << "nothing was started";
     EXPECT_TRUE(test::waitUntil(isLoaded) && hasWatcher(true)) << "by the owner of the mutex";
-    StopManifestWatcher();
+    stopManifestWatcher();
 }
 
 } // namespace

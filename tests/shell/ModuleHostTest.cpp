@@ -12,7 +12,7 @@
 #include "core/ModuleFunction.h"
 #include "shell/ClassIds.h"
 #include "statedb/Database.h"
-#include "tests/backupset/ManifestSupport.h"
+#include "tests/manifest/ManifestSupport.h"
 #include "tests/support/Counts.h"
 #include "tests/support/Pipes.h"
 #include "ui/PropertyPage.h"
@@ -281,7 +281,7 @@ TEST_F(ModuleHost, TheEndOfAPageLetsComFreeWhatNobodyUses)
     // The page is this program's own; the module is a library that COM has loaded for it.
     setModuleInstance(GetModuleHandleW(nullptr));
     HPROPSHEETPAGE page = nullptr;
-    addPropertyPage({{L"C:\\f"}, 0, 1, false, {}}, test::held(Manifest::Parse(L"FILES\nC:\\f\n1:1:1:1:0::0:0")),
+    addPropertyPage({{L"C:\\f"}, 0, 1, false, {}}, test::held(Manifest::parse(L"FILES\nC:\\f\n1:1:1:1:0::0:0")),
                     test::takePage, reinterpret_cast<LPARAM>(&page));
     EXPECT_TRUE(GetModuleHandleW(L"tavishell.dll"));
     DestroyPropertySheetPage(page);

@@ -59,7 +59,7 @@ class InstalledService {
 
   private:
     TemporaryFolder folder_;
-    wxRegKey install_{GetInstallKeyName()};
+    wxRegKey install_{getInstallKeyName()};
 };
 
 } // namespace tavi::test

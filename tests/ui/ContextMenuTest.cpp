@@ -4,7 +4,7 @@
 
 #include <malloc.h>
 
-#include "backupset/CurrentManifest.h"
+#include "manifest/CurrentManifest.h"
 #include "core/Handles.h"
 #include "core/InstallPaths.h"
 #include "tests/support/Dialogs.h"
@@ -19,12 +19,12 @@ constexpr UINT kFirstId = 0x7001;
 struct ContextMenuTest : test::UiTest {
     ContextMenuTest()
     {
-        test::waitUntil([&] { return (manifest = GetCurrentManifest()) != nullptr; });
+        test::waitUntil([&] { return (manifest = getCurrentManifest()) != nullptr; });
     }
     ~ContextMenuTest() override
     {
         freeMenuBitmaps();
-        StopManifestWatcher();
+        stopManifestWatcher();
         EXPECT_TRUE(test::waitUntil([] { return !isWatcherActive(); }));
     }
 
@@ -71,12 +71,12 @@ TEST_F(ContextMenuTest, KeepsTheManifestOfTheNewestMenu)
     showMenu();
     showMenu();
     // The watcher's own wait: five seconds until it sees the change.
-    wxRegKey settings(GetSettingsKeyName());
+    wxRegKey settings(getSettingsKeyName());
     settings.Create();
     settings.SetValue(L"options.manifestmtime", L"2037-01-02 03:04:05");
     const Manifest* next = nullptr;
     EXPECT_TRUE(test::waitUntil([&] {
-        next = GetCurrentManifest();
+        next = getCurrentManifest();
         next->Release();
         return next != manifest;
     }));
@@ -86,7 +86,7 @@ TEST_F(ContextMenuTest, KeepsTheManifestOfTheNewestMenu)
     EXPECT_TRUE(HeapValidate(heap, 0, manifest));
     showMenu();
     EXPECT_TRUE(test::waitUntil([&] { return !HeapValidate(heap, 0, manifest); })) << "within the watcher's next nap";
-    StopManifestWatcher();
+    stopManifestWatcher();
     EXPECT_FALSE(HeapValidate(heap, 0, next));
 }
 
@@ -133,7 +133,7 @@ TEST_F(ContextMenuTest, InvokesByOffsetAndWithAManifestOnly)
     test::click(test::waitDialog(L"Restore Files"), IDCANCEL);
     test::waitForThreads();
     // Keeps the start of a watcher, and so a new manifest, from every other thread.
-    StopManifestWatcher();
+    stopManifestWatcher();
     std::thread([&] { invoke(MAKEINTRESOURCEA(0), S_OK, 0); }).join();
 }
 

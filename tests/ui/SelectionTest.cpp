@@ -5,7 +5,7 @@
 #include "core/Handles.h"
 #include "statedb/Database.h"
 #include "statedb/StateLookups.h"
-#include "tests/backupset/ManifestSupport.h"
+#include "tests/manifest/ManifestSupport.h"
 #include "tests/support/Dialogs.h"
 
 namespace tavi {
@@ -100,7 +100,7 @@ TEST_F(SelectionTest, NeverReadsOutsideAForgedBlock)
 
 TEST_F(SelectionTest, SummarizesVersionsAndStates)
 {
-    const ManifestRef manifest = test::held(Manifest::Parse(
+    const ManifestRef manifest = test::held(Manifest::parse(
         L"FILES\n" + in(L"a.txt\n5:5:5:9:0::0:0\n6:6:6:-1:0::0:0\n\n") + in(L"sub\\deep\\c.txt\n5:5:5:9:0::0:0\n")));
     CreateDirectoryW(in(L"sub").wc_str(), nullptr);
     DbConnection database;

@@ -5,7 +5,7 @@
 #include <shlobj.h>
 
 #include "statedb/Database.h"
-#include "tests/backupset/ManifestSupport.h"
+#include "tests/manifest/ManifestSupport.h"
 #include "tests/support/Dialogs.h"
 #include "ui/CopyTarget.h"
 #include "ui/resource.h"
@@ -18,7 +18,7 @@ using namespace test;
 struct VersionsDialogTest : UiTest {
     void open(const Selection& selection, const wxString& files)
     {
-        EXPECT_TRUE(startVersionsDialog(selection, held(Manifest::Parse(L"FILES\n" + files)), nullptr));
+        EXPECT_TRUE(startVersionsDialog(selection, held(Manifest::parse(L"FILES\n" + files)), nullptr));
         dialog = waitDialog(L"Restore Files");
         list = GetDlgItem(dialog, TAVI_VERSIONS_LIST);
     }

@@ -5,8 +5,8 @@
 #include <windows.h>
 #include <prsht.h>
 
-#include "backupset/CurrentManifest.h"
-#include "backupset/Graylist.h"
+#include "manifest/CurrentManifest.h"
+#include "exclusions/Graylist.h"
 #include "core/Module.h"
 #include "core/Text.h"
 #include "ui/PropertyPage.h"
@@ -31,7 +31,7 @@ const char* meaning(PathState state)
 
 int printExclusions()
 {
-    const PathTree* const tree = GetGraylist(true);
+    const PathTree* const tree = getGraylist(true);
     std::printf("state  path, and what becomes of it\n");
     tree->forEach([](const wxString& path, PathState state) {
         std::printf("  %u    %s: %s\n", state, toUtf8(view(path)).c_str(), meaning(state));
@@ -43,8 +43,8 @@ int printExclusions()
 
 int explain(const wxString& path)
 {
-    const PathTree* const tree = GetGraylist(true);
-    const PathState state = tree->Lookup(view(path));
+    const PathTree* const tree = getGraylist(true);
+    const PathState state = tree->lookup(view(path));
     std::printf("%s: %u, %s\n", toUtf8(view(path)).c_str(), state, meaning(state));
     tree->Release();
     return 0;
@@ -65,7 +65,7 @@ BOOL CALLBACK keepPage(HPROPSHEETPAGE page, LPARAM pages)
 int showPage(const wxString& path)
 {
     const Manifest* manifest = nullptr;
-    for (int waited = 0; !(manifest = GetCurrentManifest()) && waited < 500; ++waited)
+    for (int waited = 0; !(manifest = getCurrentManifest()) && waited < 500; ++waited)
         Sleep(20);
     Pages pages{};
     Selection selection{};

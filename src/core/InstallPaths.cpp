@@ -1,0 +1,49 @@
+#include "core/InstallPaths.h"
+
+#include <cstddef>
+
+#include <windows.h>
+#include <wx/msw/registry.h>
+
+namespace tavi {
+namespace {
+
+const wchar_t* const kConfigFiles[] = {L"\\taviconf.dat", L"\\tavikey.dat"};
+const wchar_t* const kDataFiles[] = {L"\\tavistate.dat",  L"\\tavi.log",      L"\\tavilog.dat", L"\\changes.dat",
+                                     L"\\filter_raw.log", L"\\tavicache.dat", L"\\tavimap.dat", L""};
+
+template <std::size_t N>
+wxString filePath(const wchar_t* directoryValue, const wchar_t* const (&names)[N], int selector)
+{
+    if (selector < 0 || static_cast<std::size_t>(selector) >= N)
+        return wxString();
+    wxString directory;
+    const wxRegKey key(getInstallKeyName());
+    if (key.Exists() && !key.QueryValue(directoryValue, directory))
+        directory.clear();
+    return directory + names[selector];
+}
+
+} // namespace
+
+wxString getInstallKeyName()
+{
+    return L"HKLM\\Software\\Tavi";
+}
+
+wxString getSettingsKeyName()
+{
+    return getInstallKeyName() + L"\\params";
+}
+
+wxString getConfigFilePath(int selector)
+{
+    return filePath(L"ConfigPath", kConfigFiles, selector);
+}
+
+wxString getDataFilePath(int selector)
+{
+    return filePath(L"DataPath", kDataFiles, selector);
+}
+
+} // namespace tavi

@@ -1,0 +1,88 @@
+#pragma once
+
+#include <atomic>
+#include <cstdint>
+
+namespace tavi {
+
+// One reference-counted object that any thread may take a reference to while another replaces it: a reader gets the old
+// or the new object whole, never waits, and never touches one that has been freed.
+//
+// A plain pointer cannot do that: between reading it and counting up, the object may die. So the word holds the pointer
+// and the number of readers that are between those two steps. Who replaces the object adds that number to the object's
+// own count before dropping the word's reference; a reader that finds its pointer replaced gives back the reference it
+// was given that way. It may do so before it was given: a published object therefore holds a reserve of references
+// until it has been replaced.
+//
+// Object needs AddRef(), addRefs(int) and Release(), all atomic. An object may be published once only.
+template <class Object>
+class PublishedPointer {
+  public:
+    PublishedPointer() noexcept = default;
+    PublishedPointer(const PublishedPointer&) = delete;
+    PublishedPointer& operator=(const PublishedPointer&) = delete;
+    ~PublishedPointer()
+    {
+        replace(nullptr);
+    }
+
+    // The current object with one reference for the caller, or null.
+    Object* acquire() noexcept
+    {
+        Word word = word_.load(std::memory_order_relaxed);
+        do {
+            if (!object(word))
+                return nullptr;
+        } while (!word_.compare_exchange_weak(word, word + 1, std::memory_order_acq_rel, std::memory_order_relaxed));
+        Object* const taken = object(word);
+        taken->AddRef();
+
+        word = word_.load(std::memory_order_relaxed);
+        while (object(word) == taken) {
+            if (word_.compare_exchange_weak(word, word - 1, std::memory_order_acq_rel, std::memory_order_relaxed))
+                return taken;
+        }
+        taken->Release();
+        // NOLINTNEXTLINE(clang-analyzer-cplusplus.NewDelete): the checker does not count references.
+        return taken;
+    }
+
+    // Publishes `next`, whose caller's reference passes to the word, and drops the word's reference to the object
+    // before it.
+    void replace(Object* next) noexcept
+    {
+        if (next)
+            next->addRefs(kReserve);
+        const Word before = word_.exchange(pack(next), std::memory_order_acq_rel);
+        if (Object* const old = object(before)) {
+            old->addRefs(static_cast<int>(before & kReaders) - kReserve);
+            old->Release();
+        }
+    }
+
+    bool isSet() const noexcept
+    {
+        return object(word_.load(std::memory_order_relaxed)) != nullptr;
+    }
+
+  private:
+    using Word = std::uint64_t;
+    // User-space pointers fit in 48 bits; the rest counts readers, of which there are at most as many as threads.
+    static constexpr unsigned kCountBits = 16;
+    static constexpr Word kReaders = (Word{1} << kCountBits) - 1;
+    static constexpr int kReserve = 1 << kCountBits;
+    static_assert(std::atomic<Word>::is_always_lock_free, "readers must not wait");
+
+    static Object* object(Word word) noexcept
+    {
+        return reinterpret_cast<Object*>(static_cast<std::uintptr_t>(word >> kCountBits));
+    }
+    static Word pack(Object* object) noexcept
+    {
+        return static_cast<Word>(reinterpret_cast<std::uintptr_t>(object)) << kCountBits;
+    }
+
+    std::atomic<Word> word_{0};
+};
+
+} // namespace tavi

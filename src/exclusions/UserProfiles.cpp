@@ -1,0 +1,210 @@
+#include "exclusions/UserProfiles.h"
+
+#include <map>
+#include <memory>
+#include <new>
+#include <string>
+
+#include <sddl.h>
+#include <wx/log.h>
+
+#include "core/Boundary.h"
+#include "core/Handles.h"
+#include "core/RegistryText.h"
+
+namespace tavi {
+namespace {
+
+constexpr const wchar_t* kProfileList = L"Software\\Microsoft\\Windows NT\\CurrentVersion\\ProfileList";
+constexpr const wchar_t* kShellFolders = L"\\Software\\Microsoft\\Windows\\CurrentVersion\\Explorer\\Shell Folders";
+constexpr DWORD kMostSidBytes = 1024;
+
+int loadNesting = 0;
+// Only ever grows: each load of a hive gets a new name.
+int hiveCounter = 0;
+std::vector<wxString> loadedHives;
+// To tell whose hive a temporary name stands for.
+std::map<wxString, wxString> hiveOwners;
+
+// Both privileges on for as long as it lives, then as they were found.
+class HivePrivileges {
+  public:
+    HivePrivileges() noexcept
+    {
+        if (!OpenProcessToken(GetCurrentProcess(), TOKEN_ADJUST_PRIVILEGES | TOKEN_QUERY, token_.out()))
+            return;
+        for (std::size_t i = 0; i < kCount; ++i) {
+            if (isPrivilegeEnabled(token_.get(), kNames[i]))
+                continue;
+            enabledHere_[i] = setPrivilege(token_.get(), kNames[i], true);
+            if (!enabledHere_[i])
+                return;
+        }
+        held_ = true;
+    }
+    HivePrivileges(const HivePrivileges&) = delete;
+    HivePrivileges& operator=(const HivePrivileges&) = delete;
+    ~HivePrivileges()
+    {
+        for (std::size_t i = 0; i < kCount; ++i) {
+            if (enabledHere_[i])
+                setPrivilege(token_.get(), kNames[i], false);
+        }
+    }
+    bool held() const noexcept
+    {
+        return held_;
+    }
+
+  private:
+    static constexpr std::size_t kCount = 2;
+    static constexpr const wchar_t* kNames[kCount] = {L"SeBackupPrivilege", L"SeRestorePrivilege"};
+    KernelHandle token_;
+    bool enabledHere_[kCount] = {};
+    bool held_ = false;
+};
+
+// The names of a key's sub-keys. Read before anything is done with them: loading a hive changes what is enumerated.
+std::vector<wxString> subKeys(HKEY root, const wchar_t* path)
+{
+    std::vector<wxString> names;
+    RegistryKey key;
+    if (RegOpenKeyExW(root, path, 0, KEY_READ, key.out()) != ERROR_SUCCESS)
+        return names;
+    wchar_t name[256];
+    for (DWORD index = 0;; ++index) {
+        DWORD length = 256;
+        const LONG result = RegEnumKeyExW(key.get(), index, name, &length, nullptr, nullptr, nullptr, nullptr);
+        if (result == ERROR_SUCCESS)
+            names.emplace_back(name, length);
+        else if (result != ERROR_MORE_DATA)
+            return names;
+    }
+}
+
+bool readOwner(const wxString& profile, wxString& owner)
+{
+    RegistryKey key;
+    BYTE sid[kMostSidBytes];
+    DWORD size = sizeof(sid);
+    if (RegOpenKeyExW(HKEY_LOCAL_MACHINE, profile.wc_str(), 0, KEY_READ, key.out()) != ERROR_SUCCESS ||
+        RegQueryValueExW(key.get(), L"Sid", nullptr, nullptr, sid, &size) != ERROR_SUCCESS || !IsValidSid(sid))
+        return false;
+    LocalText text;
+    if (!ConvertSidToStringSidW(sid, text.out()))
+        return false;
+    owner = text.get();
+    return true;
+}
+
+void loadHive(const wxString& profile)
+{
+    wxString owner;
+    const auto image = readRegistryText(HKEY_LOCAL_MACHINE, profile, L"ProfileImagePath");
+    if (!image || !readOwner(profile, owner))
+        return;
+    const wxString file = *image + L"\\ntuser.dat";
+    if (GetFileAttributesW(file.wc_str()) == INVALID_FILE_ATTRIBUTES)
+        return;
+    // Not by Format(), which ends the process where memory runs out.
+    const wxString name(L"tavi" + std::to_wstring(hiveCounter));
+    // Recorded first: a loaded hive that is not in the list would never be unloaded.
+    loadedHives.push_back(name);
+    // Fails for a user who is logged on, whose hive the system has loaded.
+    if (RegLoadKeyW(HKEY_USERS, name.wc_str(), file.wc_str()) != ERROR_SUCCESS) {
+        loadedHives.pop_back();
+        return;
+    }
+    ++hiveCounter;
+    hiveOwners[L"HKEY_USERS\\" + name] = owner;
+}
+
+} // namespace
+
+void loadUserHives()
+{
+    if (++loadNesting != 1)
+        return;
+    try {
+        const HivePrivileges privileges;
+        if (!privileges.held())
+            return;
+        for (const wxString& profile : subKeys(HKEY_LOCAL_MACHINE, kProfileList))
+            loadHive(wxString(kProfileList) + L"\\" + profile);
+    } catch (...) {
+        unloadUserHives();
+        throw;
+    }
+}
+
+void unloadUserHives() noexcept
+{
+    if (--loadNesting != 0)
+        return;
+    const HivePrivileges privileges;
+    // The hives stay, and the lists that name them.
+    if (!privileges.held())
+        return;
+    for (const wxString& name : loadedHives) {
+        if (const LONG code = RegUnLoadKeyW(HKEY_USERS, name.wc_str()); code != ERROR_SUCCESS)
+            guarded("hive unload",
+                    [&] { wxLogError("Unable to unload temp reg hive %s: %d", name, static_cast<int>(code)); });
+    }
+    loadedHives.clear();
+    hiveOwners.clear();
+}
+
+std::vector<wxString> shellFolderPaths(const wxString& valueName)
+{
+    std::vector<wxString> paths;
+    for (const wxString& user : subKeys(HKEY_USERS, nullptr)) {
+        const auto value = readRegistryText(HKEY_USERS, user + kShellFolders, valueName);
+        const wxString path = value ? longPath(*value) : wxString();
+        if (path.length() >= 3)
+            paths.push_back(path);
+    }
+    return paths;
+}
+
+wxString longPath(const wxString& path)
+{
+    std::vector<wchar_t> buffer(path.length() + 1);
+    DWORD length = 0;
+    // Once more after growing; a path that changes meanwhile may need it again.
+    while ((length = GetLongPathNameW(path.wc_str(), buffer.data(), static_cast<DWORD>(buffer.size()))) >=
+           buffer.size())
+        buffer.resize(length + 1);
+    if (length >= 2 && buffer[1] == L':' && buffer[0] >= L'a' && buffer[0] <= L'z')
+        buffer[0] = static_cast<wchar_t>(buffer[0] - L'a' + L'A');
+    return wxString(buffer.data(), length);
+}
+
+bool isPrivilegeEnabled(HANDLE token, const wchar_t* privilege) noexcept
+{
+    LUID id{};
+    DWORD size = 0;
+    if (!LookupPrivilegeValueW(nullptr, privilege, &id) ||
+        GetTokenInformation(token, TokenPrivileges, nullptr, 0, &size) || GetLastError() != ERROR_INSUFFICIENT_BUFFER)
+        return false;
+    const std::unique_ptr<BYTE[]> bytes(new (std::nothrow) BYTE[size]);
+    if (!bytes || !GetTokenInformation(token, TokenPrivileges, bytes.get(), size, &size))
+        return false;
+    const auto& list = *reinterpret_cast<const TOKEN_PRIVILEGES*>(bytes.get());
+    for (DWORD i = 0; i < list.PrivilegeCount; ++i) {
+        const LUID_AND_ATTRIBUTES& entry = list.Privileges[i];
+        if (entry.Luid.LowPart == id.LowPart && entry.Luid.HighPart == id.HighPart)
+            return (entry.Attributes & SE_PRIVILEGE_ENABLED) != 0;
+    }
+    return false;
+}
+
+bool setPrivilege(HANDLE token, const wchar_t* privilege, bool enable) noexcept
+{
+    TOKEN_PRIVILEGES change{};
+    change.PrivilegeCount = 1;
+    change.Privileges[0].Attributes = enable ? SE_PRIVILEGE_ENABLED : 0;
+    return LookupPrivilegeValueW(nullptr, privilege, &change.Privileges[0].Luid) &&
+           AdjustTokenPrivileges(token, FALSE, &change, 0, nullptr, nullptr);
+}
+
+} // namespace tavi

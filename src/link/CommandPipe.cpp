@@ -1,0 +1,35 @@
+#include "link/CommandPipe.h"
+
+#include <windows.h>
+#include <wx/log.h>
+
+#include "core/Handles.h"
+#include "link/PipeIo.h"
+
+namespace tavi {
+namespace {
+
+constexpr const wchar_t* kCommandPipe = L"\\\\.\\pipe\\tavibackup";
+constexpr std::uint32_t kCancelRestore = 52;
+
+} // namespace
+
+bool CommandPipe::sendCommand(std::unique_ptr<PipeMessage>& message)
+{
+    const FileHandle pipe(
+        CreateFileW(kCommandPipe, GENERIC_WRITE, 0, nullptr, OPEN_EXISTING, FILE_ATTRIBUTE_NORMAL, nullptr));
+    if (!pipe) {
+        wxLogError("Unable to open command pipe: %d", static_cast<int>(GetLastError()));
+        return false;
+    }
+    const bool written = writeMessage(pipe.get(), message);
+    message.reset();
+    return written;
+}
+
+std::unique_ptr<PipeMessage> CommandPipe::cancelRestore()
+{
+    return std::make_unique<EventMessage>(kCancelRestore);
+}
+
+} // namespace tavi

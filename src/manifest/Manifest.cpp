@@ -1,0 +1,201 @@
+#include "manifest/Manifest.h"
+
+#include "manifest/ManifestParser.h"
+#include "core/Text.h"
+
+namespace tavi {
+namespace {
+
+// What a manifest without a hash line has: the SHA-1 digest of nothing.
+constexpr const char* kEmptyInputHash = "da39a3ee5e6b4b0d3255bfef95601890afd80709";
+
+constexpr wchar_t kFirstLowSurrogate = 0xDC00;
+constexpr wchar_t kLastLowSurrogate = 0xDFFF;
+
+bool isHighSurrogate(wchar_t unit) noexcept
+{
+    return unit >= 0xD800 && unit <= 0xDBFF;
+}
+
+storage::Extra extraOf(std::string_view bytes) noexcept
+{
+    storage::Extra extra{};
+    if (bytes.size() >= sizeof extra)
+        std::memcpy(&extra, bytes.data(), sizeof extra);
+    return extra;
+}
+
+} // namespace
+
+std::int64_t ManifestPatch::aux1() const noexcept
+{
+    return extraOf(extra_).aux1;
+}
+
+std::int64_t ManifestPatch::aux2() const noexcept
+{
+    return extraOf(extra_).aux2;
+}
+
+wxString ManifestPatch::auxText() const
+{
+    if (!extra_.empty())
+        return fromUtf8(extra_.substr(sizeof(storage::Extra)));
+    std::string text;
+    text.reserve(2 * sizeof version_->digest);
+    for (const unsigned char byte : version_->digest) {
+        text.push_back("0123456789abcdef"[byte >> 4]);
+        text.push_back("0123456789abcdef"[byte & 15]);
+    }
+    return fromUtf8(text);
+}
+
+std::optional<std::size_t> ManifestPatchList::decidingAt(std::uint32_t time) const noexcept
+{
+    for (std::size_t i = size(); i-- > 0;) {
+        if (time == 0 || manifest_->versions_[first_ + static_cast<std::uint32_t>(i)].timestamp <= time)
+            return i;
+    }
+    return std::nullopt;
+}
+
+bool ManifestPatchList::existsAt(std::uint32_t time) const noexcept
+{
+    const auto deciding = decidingAt(time);
+    return deciding && !(*this)[*deciding].isDeletion();
+}
+
+Manifest::Manifest() : hash_(kEmptyInputHash) {}
+
+Manifest* Manifest::parse(const wxString& text)
+{
+    // In slices, so that no second copy of the whole text ever stands beside the first. The parser joins what that cuts
+    // apart.
+    constexpr std::size_t kSlice = 16 * 1024;
+    ManifestParser parser;
+    std::string bytes;
+    std::uint32_t units = 0;
+    for (std::wstring_view rest = view(text); !rest.empty();) {
+        const std::size_t length = std::min(rest.size(), kSlice);
+        bytes.clear();
+        appendUtf8(rest.substr(0, length), bytes);
+        units += countUtf16Units(bytes);
+        parser.feed(bytes.data(), bytes.size());
+        rest.remove_prefix(length);
+    }
+    return parser.finish(units);
+}
+
+bool Manifest::isBackedUp(std::wstring_view path, std::uint32_t time) const
+{
+    const std::uint32_t file = findFile(path);
+    return file != storage::NumberTable::kNone && (time == kAnyTime || patches(file).existsAt(time));
+}
+
+bool Manifest::hasBackedUpUnder(std::wstring_view prefix, std::uint32_t time) const
+{
+    bool found = false;
+    forEachUnder(prefix, [&](std::uint32_t file) {
+        found = time == kAnyTime || patches(file).existsAt(time);
+        return !found;
+    });
+    return found;
+}
+
+std::optional<ManifestPatchList> Manifest::findPatches(std::wstring_view path) const
+{
+    const std::uint32_t file = findFile(path);
+    if (file == storage::NumberTable::kNone)
+        return std::nullopt;
+    return patches(file);
+}
+
+wxString Manifest::filePath(std::uint32_t file) const
+{
+    std::string path;
+    appendFilePathUtf8(file, path);
+    return fromUtf8(path);
+}
+
+void Manifest::appendFilePathUtf8(std::uint32_t file, std::string& out) const
+{
+    out += texts_.at(folders_[files_[file].folder].text);
+    out += texts_.at(files_[file].name);
+}
+
+std::size_t Manifest::residentBytes() const noexcept
+{
+    return texts_.bytes() + versions_.bytes() + files_.bytes() + folders_.bytes() + filesByPath_.bytes() +
+           (userText_.capacity() + hash_.capacity()) * sizeof(wchar_t) + sizeof *this;
+}
+
+std::uint32_t Manifest::findFile(std::wstring_view path) const
+{
+    const std::string bytes = toUtf8(path);
+    const SplitPath split = splitPath(bytes);
+    const std::uint32_t hash = storage::hashBytes(storage::hashBytes(0, split.folder), split.name);
+    return filesByPath_.find(hash, [&](std::uint32_t file) {
+        const FileRecord& record = files_[file];
+        return record.hash == hash && texts_.at(record.name) == split.name &&
+               texts_.at(folders_[record.folder].text) == split.folder;
+    });
+}
+
+Manifest::FileRanges Manifest::filesUnder(std::wstring_view prefix) const
+{
+    const auto firstFileOf = [this](std::uint32_t folder) {
+        return folder < folders_.size() ? folders_[folder].firstFile : files_.size();
+    };
+    // Paths from `low` up to but not including `high`, which have everything before `high`'s last character in common:
+    // those in one folder, whose names go on where the text ends, and those in folders that begin with it.
+    const auto between = [&](const std::string& low, const std::string& high, FileRange& names, FileRange& folders) {
+        folders = {firstFileOf(firstFolderFrom(low)), firstFileOf(firstFolderFrom(high))};
+        const SplitPath split = splitPath(low);
+        const std::uint32_t folder = firstFolderFrom(split.folder);
+        if (split.name.empty() || folder == folders_.size() || texts_.at(folders_[folder].text) != split.folder)
+            return;
+        const FileRange files{folders_[folder].firstFile, firstFileOf(folder + 1)};
+        names = {firstNameFrom(files, split.name), firstNameFrom(files, splitPath(high).name)};
+    };
+
+    // No path holds this byte, so it stands behind every continuation of a text.
+    constexpr char kBehindAll = '\xFF';
+    FileRanges found;
+    FileRange(&ranges)[4] = found.ranges;
+    std::string low = toUtf8(prefix);
+    between(low, low + kBehindAll, ranges[0], ranges[2]);
+    if (!prefix.empty() && isHighSurrogate(prefix.back())) {
+        // The prefix ends within a character: every character that begins with this half fits too.
+        const std::wstring whole(prefix);
+        low = toUtf8(whole + kFirstLowSurrogate);
+        between(low, toUtf8(whole + kLastLowSurrogate) + kBehindAll, ranges[1], ranges[3]);
+    }
+    return found;
+}
+
+std::uint32_t Manifest::firstFolderFrom(std::string_view text) const noexcept
+{
+    std::uint32_t low = 0;
+    for (std::uint32_t high = folders_.size(); low < high;) {
+        const std::uint32_t middle = low + (high - low) / 2;
+        if (texts_.at(folders_[middle].text) < text)
+            low = middle + 1;
+        else
+            high = middle;
+    }
+    return low;
+}
+
+std::uint32_t Manifest::firstNameFrom(FileRange files, std::string_view name) const noexcept
+{
+    while (files.first < files.second) {
+        const std::uint32_t middle = files.first + (files.second - files.first) / 2;
+        if (texts_.at(files_[middle].name) < name)
+            files.first = middle + 1;
+        else
+            files.second = middle;
+    }
+    return files.first;
+}
+
+} // namespace tavi

@@ -1,0 +1,65 @@
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <string>
+#include <string_view>
+
+#include "manifest/Manifest.h"
+
+namespace tavi {
+
+// A path cut behind its last separator; the folder keeps the separator.
+struct SplitPath {
+    std::string_view folder;
+    std::string_view name;
+};
+
+inline SplitPath splitPath(std::string_view path) noexcept
+{
+    const std::size_t cut = path.rfind('\\') + 1;
+    return {path.substr(0, cut), path.substr(cut)};
+}
+
+// Packs a text of 40 lower-case hexadecimal digits; nothing else fits.
+bool packDigest(std::string_view text, unsigned char (&digest)[20]) noexcept;
+
+// Fills a manifest entry by entry; one thread.
+class ManifestBuilder {
+  public:
+    ManifestBuilder();
+
+    storage::VersionStore& versions() noexcept
+    {
+        return manifest_->versions_;
+    }
+    // Keeps the version in versions().next(), whose aux values are these.
+    void keepVersion(std::int64_t aux1, std::int64_t aux2, std::string_view auxText);
+    // The file of every version kept since `firstVersion`; replaces an earlier file of the same path.
+    void addFile(std::string_view path, std::uint32_t firstVersion);
+    void setUserText(const wxString& text);
+    void setHash(const wxString& hash);
+
+    // Gives the manifest away; only destroying the builder may follow.
+    Manifest* finish(std::uint32_t textLength);
+
+  private:
+    struct LoadedFolder {
+        storage::ByteArena::Ref text;
+        std::uint32_t hash;
+        std::uint32_t files;
+    };
+
+    std::uint32_t internFolder(std::string_view folder);
+    void orderFolders();
+    void orderFiles();
+
+    std::unique_ptr<Manifest> manifest_;
+    storage::BlockArray<Manifest::FileRecord, 15> files_;
+    storage::BlockArray<LoadedFolder, 15> folders_;
+    storage::NumberTable foldersByText_;
+    std::string extra_;
+    std::uint32_t lastFolder_ = storage::NumberTable::kNone;
+};
+
+} // namespace tavi

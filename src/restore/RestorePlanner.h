@@ -1,0 +1,82 @@
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <string>
+
+#include <wx/string.h>
+
+#include "manifest/Manifest.h"
+#include "manifest/ManifestStorage.h"
+#include "core/PathSet.h"
+
+namespace tavi {
+
+// What the user asked for.
+struct RestoreRequest {
+    PathSet selectedPaths;
+    // Seconds since 1970 UTC: each file is restored as it was then.
+    std::uint32_t cutoffTime = 0;
+    // Taken off the paths that go into the destination folder. Without such a folder the restore is in place.
+    wxString sourcePrefix;
+    wxString destinationFolder;
+    bool overwrite = false;
+    // Empty for this machine's own backup and the service's own key.
+    wxString machineId;
+    wxString machineAlias;
+    wxString encryptionKey;
+};
+
+// One version to restore; the paths in UTF-8, as the database takes them.
+struct RestoreFileEntry {
+    std::string manifestPath;
+    std::string targetPath;
+    std::int64_t fileSize = 0;
+    bool overwrite = false;
+    std::uint32_t ctime = 0;
+    std::uint32_t timestamp = 0;
+    std::uint32_t attributes = 0;
+};
+
+// Tells whether something exists at a path, given in UTF-8.
+using PathProbe = std::function<bool(const std::string& path)>;
+
+// The files of one request in the order of their rows. Keeps numbers only, so that a million of them fit beside the
+// manifest; the manifest must be held for as long as the plan lives.
+class RestorePlan {
+  public:
+    std::uint32_t size() const noexcept
+    {
+        return rows_.size();
+    }
+    // Fills `entry`, whose texts keep their room from call to call.
+    void readEntry(std::uint32_t row, RestoreFileEntry& entry) const;
+
+  private:
+    friend RestorePlan planRestore(const RestoreRequest& request, const Manifest& manifest, const PathProbe& exists);
+
+    struct Row {
+        std::uint32_t file;
+        std::uint32_t patch;
+        // The number in the target's name, 0 for none.
+        std::uint32_t freeName;
+    };
+
+    RestorePlan(const RestoreRequest& request, const Manifest& manifest);
+    void plan(std::uint32_t file, const RestoreRequest& request, const PathProbe& exists);
+    void buildTarget(const std::string& manifestPath, std::uint32_t freeName, std::string& target) const;
+
+    const Manifest* manifest_;
+    std::string destination_;
+    std::size_t removedUnits_ = 0;
+    bool overwrite_;
+    storage::BlockArray<Row, 15> rows_;
+    std::string manifestPath_;
+    std::string target_;
+};
+
+// Chooses, for every selected path and every file of the manifest whose path begins with it, the version and the
+// target. `exists` is asked only when existing files are to be kept.
+RestorePlan planRestore(const RestoreRequest& request, const Manifest& manifest, const PathProbe& exists);
+
+} // namespace tavi

@@ -1,0 +1,169 @@
+#include "ui/ContextMenu.h"
+
+#include <algorithm>
+#include <string>
+#include <utility>
+
+#include <wx/intl.h>
+
+#include "manifest/CurrentManifest.h"
+#include "ui/ActivationScope.h"
+#include "ui/MenuBitmap.h"
+#include "ui/Texts.h"
+#include "ui/VersionsDialog.h"
+#include "ui/resource.h"
+
+namespace tavi {
+namespace {
+
+enum CommandOffset : UINT { kRestore, kBackup, kDontBackup };
+
+struct Wording {
+    const char* oneFile;
+    const char* oneFolder;
+    const char* severalFiles;
+    const char* severalFolders;
+
+    // The single-item forms hold the place of the item's name.
+    wxString text(const Selection& selection) const
+    {
+        const wxString& name = selection.displayName;
+        if (name.empty())
+            return wxGetTranslation(selection.isFolder ? severalFolders : severalFiles);
+        return withName(wxGetTranslation(selection.isFolder ? oneFolder : oneFile), name);
+    }
+};
+
+struct Command {
+    const wchar_t* verb;
+    bool onMenu;
+    Wording label;
+    Wording help;
+};
+
+// In the order of the command offsets.
+const Command kCommands[] = {
+    {L"TaviRestore",
+     true,
+     {wxTRANSLATE("Restore Previous Version"), wxTRANSLATE("Restore Files in Folder"),
+      wxTRANSLATE("Restore Previous Versions"), wxTRANSLATE("Restore Files")},
+     {wxTRANSLATE("Restore an older version of %s from the Tavi servers."),
+      wxTRANSLATE("Restore files in %s from the Tavi servers."),
+      wxTRANSLATE("Restore older versions of the selected files."),
+      wxTRANSLATE("Restore older versions of the selected files.")}},
+    {L"TaviBackup",
+     false,
+     {wxTRANSLATE("&Backup %s"), wxTRANSLATE("&Backup %s"), wxTRANSLATE("&Backup Selected Items"),
+      wxTRANSLATE("&Backup Selected Items")},
+     {wxTRANSLATE("Marks %s to be backed up with Tavi Remote Backup."),
+      wxTRANSLATE("Marks %s to be backed up with Tavi Remote Backup."),
+      wxTRANSLATE("Marks the selected items to be backed up with Tavi Remote Backup."),
+      wxTRANSLATE("Marks the selected items to be backed up with Tavi Remote Backup.")}},
+    {L"TaviDontBackup",
+     false,
+     {wxTRANSLATE("&Don't Backup %s"), wxTRANSLATE("&Don't Backup %s"), wxTRANSLATE("&Don't Backup Selected Items"),
+      wxTRANSLATE("&Don't Backup Selected Items")},
+     {wxTRANSLATE("Removes %s from the Tavi Remote Backup configuration."),
+      wxTRANSLATE("Removes %s from the Tavi Remote Backup configuration."),
+      wxTRANSLATE("Removes the selected items from the Tavi Remote Backup configuration."),
+      wxTRANSLATE("Removes the selected items from the Tavi Remote Backup configuration.")}},
+};
+
+// A copy that always ends in a terminator and says when it had to cut.
+template <class Char>
+HRESULT copyBounded(const std::basic_string<Char>& text, Char* buffer, UINT size)
+{
+    constexpr std::size_t longest = 0x7FFFFFFF;
+    if (!buffer || size == 0 || size > longest || text.length() > longest)
+        return E_INVALIDARG;
+    const std::size_t copied = std::min<std::size_t>(text.length(), size - 1);
+    std::copy_n(text.data(), copied, buffer);
+    buffer[copied] = Char();
+    return copied == text.length() ? S_OK : HRESULT_FROM_WIN32(ERROR_INSUFFICIENT_BUFFER);
+}
+
+std::string toAnsi(const std::wstring& text)
+{
+    const int length = static_cast<int>(text.length());
+    std::string ansi(
+        static_cast<std::size_t>(WideCharToMultiByte(CP_ACP, 0, text.data(), length, nullptr, 0, nullptr, nullptr)),
+        '\0');
+    WideCharToMultiByte(CP_ACP, 0, text.data(), length, ansi.data(), static_cast<int>(ansi.length()), nullptr, nullptr);
+    return ansi;
+}
+
+void insertRestoreItem(HMENU menu, UINT position, UINT id, const wxString& label)
+{
+    if (!InsertMenuW(menu, position, MF_BYPOSITION | MF_STRING, id, label.wc_str()))
+        return;
+    if (const HBITMAP bitmap = menuBitmap(TAVI_ICON_MENU, GetSysColor(COLOR_MENU)))
+        SetMenuItemBitmaps(menu, position, MF_BYPOSITION, bitmap, bitmap);
+}
+
+} // namespace
+
+UINT insertMenuItems(HMENU menu, UINT indexMenu, UINT idCmdFirst, UINT flags, const Selection& selection)
+{
+    // Called for its effect: the watcher starts, and the manifest that the newest menu was built from outlives a reload
+    // for the command that the user may pick from that menu.
+    holdManifestForMenu();
+    if (flags & (CMF_DEFAULTONLY | CMF_NOVERBS))
+        return 0;
+
+    const ActivationScope activation;
+    InsertMenuW(menu, indexMenu, MF_BYPOSITION | MF_SEPARATOR, 0, nullptr);
+    UINT used = 0;
+    for (const Command& command : kCommands) {
+        const wxString label = command.label.text(selection);
+        if (!command.onMenu || selection.restoreMode == 0)
+            continue;
+        insertRestoreItem(menu, indexMenu + 1, idCmdFirst, label);
+        ++used;
+    }
+    return used;
+}
+
+HRESULT commandString(UINT_PTR offset, UINT type, LPSTR buffer, UINT size, const Selection& selection)
+{
+    if (offset >= std::size(kCommands))
+        return E_INVALIDARG;
+    const Command& command = kCommands[offset];
+    std::wstring text;
+    switch (type) {
+    case GCS_VERBA:
+    case GCS_VERBW:
+        text = command.verb;
+        break;
+    case GCS_HELPTEXTA:
+    case GCS_HELPTEXTW:
+        text = command.help.text(selection).ToStdWstring();
+        break;
+    default:
+        return S_OK;
+    }
+    if (type & GCS_UNICODE)
+        return copyBounded(text, reinterpret_cast<wchar_t*>(buffer), size);
+    return copyBounded(toAnsi(text), buffer, size);
+}
+
+HRESULT invokeCommand(const CMINVOKECOMMANDINFO& info, const Selection& selection)
+{
+    if (!IS_INTRESOURCE(info.lpVerb))
+        return E_INVALIDARG;
+    switch (reinterpret_cast<UINT_PTR>(info.lpVerb)) {
+    case kRestore: {
+        ManifestRef manifest(getCurrentManifest());
+        // The object keeps its selection: the host may invoke the command again.
+        if (manifest)
+            startVersionsDialog(Selection(selection), std::move(manifest), info.hwnd);
+        return S_OK;
+    }
+    case kBackup:
+    case kDontBackup:
+        return S_OK;
+    default:
+        return E_INVALIDARG;
+    }
+}
+
+} // namespace tavi

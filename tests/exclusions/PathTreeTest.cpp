@@ -1,0 +1,64 @@
+#include <map>
+#include <random>
+
+#include <gtest/gtest.h>
+
+#include "core/Reference.h"
+#include "fuzz/PathTreeModel.h"
+
+namespace tavi {
+namespace {
+
+TEST(PathTree, AnswersAsAnObviousModelDoes)
+{
+    std::mt19937 random(20260714);
+    std::vector<std::wstring> paths = {L"a", L"b", L"c"};
+    for (std::size_t i = 0; i < 40; ++i) {
+        for (const wchar_t* const name : {L"\\a", L"\\b", L"\\c"})
+            paths.push_back(paths[i] + name);
+    }
+    for (int set = 0; set < 6000; ++set) {
+        // How many entries a folder has: none at all, fewer than there are names, as many, or more.
+        const std::size_t seed = random();
+        const EntryCounter counter = [seed](const wxString& folder, bool) {
+            return static_cast<std::uint32_t>((std::hash<std::wstring>()(folder.ToStdWstring()) ^ seed) % 1009 % 5);
+        };
+        const Reference<PathTree> tree(PathTree::create(false, counter));
+        test::PathTreeModel model(counter);
+        for (unsigned rule = 0, count = random() % 12 + 1; rule < count; ++rule) {
+            const std::wstring& path = paths[random() % paths.size()];
+            const PathState state = random() % 3 == 0 ? random() % 10 : random() % 2 * 7;
+            tree->insert(path, state);
+            model.insert(path, state);
+        }
+        for (const std::wstring& path : paths)
+            ASSERT_EQ(tree->lookup(path), model.lookup(path)) << wxString(path).utf8_string() << " of set " << set;
+    }
+}
+
+// Where the model has no say.
+TEST(PathTree, TakesOddPathsAsTheyAreAndCountsAFolderOnce)
+{
+    std::map<wxString, int> counted;
+    const Reference<PathTree> tree(PathTree::create(true, [&](const wxString& folder, bool foldersOnly) {
+        EXPECT_TRUE(foldersOnly);
+        ++counted[folder];
+        return 5u;
+    }));
+    for (const wchar_t* const path : {L"C:\\A", L"C:\\B", L"C:\\B\\x", L""})
+        tree->insert(path, 7);
+    const std::pair<const wchar_t*, PathState> answers[] = {
+        {L"", 0}, {L"x", 8}, {L"\\x", 7}, {L"C:\\", 2}, {L"c:\\A", 8}};
+    for (const auto& [path, state] : answers)
+        EXPECT_EQ(tree->lookup(path), state) << wxString(path).utf8_string();
+    EXPECT_EQ(counted, (std::map<wxString, int>{{L"C:", 1}, {L"C:\\B", 1}}));
+    // As deep as a path can be: neither filling nor freeing goes by recursion.
+    const Reference<PathTree> deep(PathTree::create(false, [](const wxString&, bool) { return 0u; }));
+    std::wstring path(60000, L'\\');
+    path[0] = L'x';
+    deep->insert(path.substr(0, 2000), 7);
+    EXPECT_EQ(deep->lookup(path), 7u);
+}
+
+} // namespace
+} // namespace tavi

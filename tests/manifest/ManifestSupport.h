@@ -1,0 +1,66 @@
+#pragma once
+
+#include <sstream>
+#include <string>
+
+#include <wx/mstream.h>
+#include <wx/zstream.h>
+
+#include "manifest/ManifestParser.h"
+#include "manifest/StoredManifest.h"
+#include "core/Text.h"
+
+namespace tavi::test {
+
+inline std::string packed(const std::string& text, int format = wxZLIB_ZLIB)
+{
+    wxMemoryOutputStream blob;
+    wxZlibOutputStream(blob, 1, format).Write(text.data(), text.size());
+    const auto* start = static_cast<const char*>(blob.GetOutputStreamBuffer()->GetBufferStart());
+    return {start, static_cast<std::size_t>(blob.GetLength())};
+}
+
+inline ManifestRef held(const Manifest* manifest)
+{
+    if (manifest)
+        manifest->AddRef();
+    return ManifestRef(manifest);
+}
+
+inline ManifestRef stored(const std::string& blob)
+{
+    return held(parseStoredManifest(blob.data(), blob.size()));
+}
+
+inline std::string utf8(const wxString& text)
+{
+    return toUtf8(view(text));
+}
+
+// The versions as the fields of the longest layout, attributes in octal.
+inline std::string dump(const ManifestPatchList& patches)
+{
+    std::ostringstream out;
+    for (std::size_t i = 0; i < patches.size(); ++i) {
+        const ManifestPatch patch = patches[i];
+        out << std::dec << patch.timestamp() << ':' << patch.modifiedTime() << ':' << patch.ctime() << ':'
+            << patch.fileSize() << ':' << patch.aux1() << ':' << utf8(patch.auxText()) << ':' << patch.aux2() << ':'
+            << std::oct << static_cast<unsigned>(patch.attributes()) << ' ';
+    }
+    return out.str();
+}
+
+// "hash[user]" if either is not the initial one, then each file and its versions.
+inline std::string dump(const ManifestRef& manifest)
+{
+    if (!manifest)
+        return "none";
+    std::string out;
+    if (manifest->hash() != "da39a3ee5e6b4b0d3255bfef95601890afd80709" || !manifest->userText().empty())
+        out = utf8(manifest->hash()) + '[' + utf8(manifest->userText()) + "] ";
+    for (std::uint32_t file = 0; file < manifest->fileCount(); ++file)
+        out += utf8(manifest->filePath(file)) + " = " + dump(manifest->patches(file));
+    return out;
+}
+
+} // namespace tavi::test

@@ -1,0 +1,119 @@
+#include "restore/RestoreRequest.h"
+
+#include <ctime>
+
+#include <gtest/gtest.h>
+
+#include "tests/manifest/ManifestSupport.h"
+#include "tests/support/Allocations.h"
+#include "tests/support/LogCapture.h"
+#include "tests/support/Registry.h"
+
+namespace tavi {
+namespace {
+
+class RestoreRequests : public testing::Test {
+  protected:
+    RestoreRequests()
+    {
+        database_.open(service_.file(L"tavistate.dat"));
+        database_.execDML("CREATE TABLE restores(request_time INTEGER, machine_id TEXT, machine_alias TEXT, "
+                          "encryption_key TEXT);"
+                          "CREATE TABLE restore_files(restore_id, manifest_path, file_size, timestamp, ctime, "
+                          "attributes, target_path, overwrite)");
+    }
+    // Returns what was logged.
+    std::string perform(const wchar_t* selected)
+    {
+        RestoreRequest request{{selected}, 100, L"", L"", true, L"id", L"alias", L"key"};
+        performRestore(request, *manifest_);
+        EXPECT_TRUE(request.selectedPaths.empty());
+        return log_.takeText();
+    }
+    // By default of all rows.
+    int count(const char* sql = "SELECT (SELECT count(*) FROM restores)+(SELECT count(*) FROM restore_files)")
+    {
+        DbQuery rows = database_.execQuery(sql);
+        return rows.nextRow() ? rows.fieldInt(0, -1) : -2;
+    }
+
+    test::LogCapture log_;
+    test::InstalledService service_;
+    DbConnection database_;
+    const ManifestRef manifest_ = test::held(
+        Manifest::parse(L"FILES\nC:\\one\\a.txt\n100:1:4000000000:5:0:x:0:40\n\nC:\\one\\b.txt\n100:1:2:6:0:x:0:41\n\n"
+                        L"C:\\gone\\c\n100:1:2:6:0:x:0:41"));
+};
+
+TEST_F(RestoreRequests, StandInTheDatabaseAsOneTransaction)
+{
+    const auto start = static_cast<int>(std::time(nullptr));
+    EXPECT_EQ(perform(L"C:\\one"), "");
+    EXPECT_EQ(perform(L"C:\\nothing there"), "");
+    EXPECT_EQ(count(), 2 + 2); // a request without files is stored as well
+    // The time of writing, not of the version.
+    EXPECT_GE(count("SELECT min(request_time) FROM restores"), start);
+    // Times are bound as signed 32-bit numbers, attributes are octal in the manifest.
+    EXPECT_EQ(count("SELECT count(*) FROM restores JOIN restore_files ON restores.rowid=restore_id WHERE "
+                    "machine_id='id' AND machine_alias='alias' AND encryption_key='key' AND "
+                    "manifest_path='C:\\one\\a.txt' AND file_size=5 AND timestamp=100 AND ctime=-294967296 AND "
+                    "attributes=32 AND target_path='C:\\one\\a.txt' AND overwrite=1"),
+              1);
+}
+
+TEST_F(RestoreRequests, AFailureLeavesNothingHalfWrittenAndOneLine)
+{
+    // After the second SQLite has rolled back by itself.
+    for (const char* const failure : {"ABORT", "ROLLBACK"}) {
+        database_.execDML("CREATE TRIGGER t BEFORE INSERT ON restore_files WHEN new.manifest_path LIKE '%b.txt' "
+                          "BEGIN SELECT RAISE(" +
+                          wxString(failure) + ",'no'); END");
+        EXPECT_EQ(perform(L"C:\\one"), "1: Error: Error requesting restore: DB_CONSTRAINT[19]: no");
+        database_.execDML("DROP TRIGGER t");
+        EXPECT_EQ(count(), 0) << failure;
+    }
+    // Another transaction in the way, for a minute: a reader of the commit, a writer of the first row.
+    static int waited;
+    sqlite3_vfs* const system = sqlite3_vfs_find(nullptr);
+    const auto sleep = std::exchange(system->xSleep, [](sqlite3_vfs*, int microseconds) {
+        waited += microseconds;
+        return microseconds;
+    });
+    for (const int mode : {0, 2}) {
+        database_.beginTransaction(mode);
+        EXPECT_EQ(count(), 0);
+        waited = 0;
+        EXPECT_EQ(perform(L"C:\\one"), "1: Error: Error requesting restore: DB_BUSY[5]: database is locked");
+        EXPECT_EQ(waited, 60000000);
+        database_.commitTransaction();
+        EXPECT_EQ(count(), 0) << mode;
+    }
+    system->xSleep = sleep;
+    service_.install().SetValue(L"DataPath", wxString(L"C:\\no such folder"));
+    EXPECT_EQ(perform(L"C:\\one"),
+              "1: Error: Failed to open state db for restores: DB_CANTOPEN[14]: unable to open database file");
+}
+
+// SQLite's memory runs out at each point in turn and is back at once, somewhat later or never.
+TEST_F(RestoreRequests, AreWholeOrAbsentWhereMemoryRunsOut)
+{
+    std::set<std::string> logged;
+    for (const int failures : {1, 4, 1 << 30}) {
+        std::string line;
+        for (int point = 0; point < 300; ++point) {
+            {
+                const test::FailingAllocations failing(point, test::Heap::sqlite, failures);
+                line = perform(L"C:\\one");
+            }
+            logged.insert(line.substr(0, line.find("[7]")));
+            ASSERT_EQ(count() % 3, 0) << point << " " << failures << " " << line;
+        }
+        EXPECT_EQ(line, "") << "all points were reached";
+    }
+    EXPECT_EQ(logged, (std::set<std::string>{"", "1: Error: Failed to open state db for restores: DB_NOMEM",
+                                             "1: Error: Error requesting restore: DB_NOMEM",
+                                             "1: Error: Error committing restore information: DB_NOMEM"}));
+}
+
+} // namespace
+} // namespace tavi
