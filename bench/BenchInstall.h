@@ -7,7 +7,7 @@
 #include <wx/msw/registry.h>
 
 #include "core/InstallPaths.h"
-#include "core/Text.h"
+#include "core/Utf8.h"
 #include "statedb/Database.h"
 
 namespace tavi::bench {

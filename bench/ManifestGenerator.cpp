@@ -159,15 +159,13 @@ std::vector<char> readBlob(const std::string& file)
     return blob;
 }
 
-ManifestRef whole(const Manifest* manifest, std::uint32_t files)
+ManifestRef whole(ManifestRef manifest, std::uint32_t files)
 {
     if (!manifest)
         throw std::runtime_error("the bench set is no manifest");
-    manifest->AddRef();
-    ManifestRef held(manifest);
     if (manifest->fileCount() != files)
         throw std::runtime_error("the manifest lacks files");
-    return held;
+    return manifest;
 }
 
 ManifestRef loadSet(const std::string& file, std::uint32_t files)

@@ -26,8 +26,8 @@ std::string generatedPath(std::uint32_t number);
 // The compressed text in the data folder, made there if it is not there yet.
 StoredText storedText(const std::string& dataFolder, std::uint32_t files, FileOrder order);
 std::vector<char> readBlob(const std::string& file);
-// Takes a reference to a manifest that was just read. Throws unless it holds all `files` of the set.
-ManifestRef whole(const Manifest* manifest, std::uint32_t files);
+// Returns the manifest. Throws unless it holds all `files` of the set.
+ManifestRef whole(ManifestRef manifest, std::uint32_t files);
 ManifestRef loadSet(const std::string& file, std::uint32_t files);
 
 // What no reader of a blob can do without: it is inflated into 64 KB and forgotten. Throws unless `expected` bytes came

@@ -4,6 +4,7 @@
 #include <sddl.h>
 
 #include "exclusions/Graylist.h"
+#include "core/Privileges.h"
 #include "exclusions/UserProfiles.h"
 #include "bench/Bench.h"
 #include "bench/BenchInstall.h"

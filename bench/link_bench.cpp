@@ -29,7 +29,7 @@ Bytes streamOf(unsigned messages)
     for (unsigned i = 0; i < messages; ++i) {
         constexpr std::uint32_t kTypes[] = {54, 56, 56, 55};
         const std::uint32_t type = i == 0 ? 51 : i == 1 ? 53 : kTypes[i % 4];
-        const HeldBuffer frame;
+        const auto frame = MessageBuffer::create();
         EventMessage(type, 0, type == 53 ? 1u << 30 : 65536, 0, type == 54 ? path : none).serialise(*frame);
         stream.insert(stream.end(), frame->data(), frame->data() + frame->length());
     }
@@ -260,7 +260,7 @@ void barePolling()
 class Services final : public WatcherServices {
   public:
     explicit Services(unsigned rounds) : inTime_(rounds == 0), left_(rounds) {}
-    const Manifest* loadManifest() override
+    ManifestRef loadManifest() override
     {
         return Manifest::parse(wxString());
     }
@@ -297,7 +297,7 @@ void runWatcher(unsigned rounds)
     WatcherState state;
     Services services(rounds);
     runManifestWatcher(state, services);
-    state.manifest.replace(nullptr);
+    state.manifest.replace({});
 }
 
 void watch()

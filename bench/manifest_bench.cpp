@@ -6,7 +6,7 @@
 #include "manifest/StoredManifest.h"
 #include "bench/Bench.h"
 #include "bench/ManifestGenerator.h"
-#include "core/Text.h"
+#include "core/Utf8.h"
 
 namespace tavi::bench {
 namespace {

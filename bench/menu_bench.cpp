@@ -32,7 +32,7 @@ class BenchFolder {
         LPITEMIDLIST list = nullptr;
         if (FAILED(SHParseDisplayName(path_.c_str(), nullptr, &list, 0, nullptr)))
             throw std::runtime_error("no item list of the folder");
-        ComPtr<IShellFolder> desktop;
+        RefPtr<IShellFolder> desktop;
         SHGetDesktopFolder(desktop.out());
         desktop->BindToObject(list, nullptr, IID_IShellFolder, folder_.outVoid());
         ILFree(list);
@@ -69,9 +69,9 @@ class BenchFolder {
     {
         return path_ + L"\\file " + std::to_wstring(10000 + i) + L".txt";
     }
-    ComPtr<IDataObject> data(unsigned items) const
+    RefPtr<IDataObject> data(unsigned items) const
     {
-        ComPtr<IDataObject> data;
+        RefPtr<IDataObject> data;
         if (FAILED(folder_->GetUIObjectOf(nullptr, items, const_cast<LPCITEMIDLIST*>(items_.data()), IID_IDataObject,
                                           nullptr, data.outVoid())))
             throw std::runtime_error("no data object");
@@ -109,7 +109,7 @@ class BenchFolder {
   private:
     std::wstring path_;
     unsigned files_;
-    ComPtr<IShellFolder> folder_;
+    RefPtr<IShellFolder> folder_;
     std::vector<LPITEMIDLIST> items_;
 };
 
@@ -124,11 +124,11 @@ void menuBench(Bench& bench)
     OleInitialize(nullptr);
     {
         const BenchFolder folder(std::wstring(temporary) + L"tavi-menu-bench", kFiles);
-        const ComPtr<IDataObject> some = folder.data(kFiles), many = folder.data(kManyItems);
+        const RefPtr<IDataObject> some = folder.data(kFiles), many = folder.data(kManyItems);
         FolderStateTable states;
         setModuleInstance(GetModuleHandleW(nullptr));
         // The watcher loads the empty manifest first, so that the versions of every file are asked for.
-        for (int i = 0; i < 500 && !ManifestRef(getCurrentManifest()); ++i)
+        for (int i = 0; i < 500 && !getCurrentManifest(); ++i)
             Sleep(10);
         sqlite3* database = nullptr;
         sqlite3_stmt* bare = nullptr;

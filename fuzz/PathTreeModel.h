@@ -1,5 +1,6 @@
 #pragma once
 
+#include <cstdint>
 #include <map>
 #include <string>
 
@@ -10,15 +11,18 @@ namespace tavi::test {
 // The same rules over a flat list of full paths, with every question answered by looking through all of it.
 class PathTreeModel {
   public:
+    // The number of a FolderState.
+    using State = std::uint32_t;
+
     explicit PathTreeModel(EntryCounter counter) : counter_(std::move(counter)) {}
 
-    void insert(const std::wstring& path, PathState state)
+    void insert(const std::wstring& path, State state)
     {
         for (std::size_t end = path.find(L'\\');; end = path.find(L'\\', end + 1)) {
             const std::wstring here = path.substr(0, end), above = parent(here);
-            const PathState inherited = above.empty() ? 0 : nodes_[above];
+            const State inherits = above.empty() ? 0 : nodes_[above];
             const bool last = end == std::wstring::npos;
-            const bool changes = nodes_.count(here) != 0 || inherited != 0 || state != 0;
+            const bool changes = nodes_.count(here) != 0 || inherits != 0 || state != 0;
             if (last && changes) {
                 for (auto node = nodes_.begin(); node != nodes_.end();)
                     node = node->first.rfind(here + L"\\", 0) == 0 ? nodes_.erase(node) : std::next(node);
@@ -26,14 +30,14 @@ class PathTreeModel {
             }
             if (last || !changes)
                 return summarize(above);
-            nodes_.emplace(here, inherited);
+            nodes_.emplace(here, inherits);
         }
     }
-    PathState lookup(const std::wstring& path) const
+    State lookup(const std::wstring& path) const
     {
         for (std::wstring at = path; !at.empty(); at = parent(at)) {
             if (const auto node = nodes_.find(at); node != nodes_.end())
-                return at == path ? node->second : static_cast<PathState>("8787476789"[node->second] - '0');
+                return at == path ? node->second : static_cast<State>("8787476789"[node->second] - '0');
         }
         return 8;
     }
@@ -62,14 +66,14 @@ class PathTreeModel {
                                                  "75755555", "64644444", "75755555", "00222222", "00000000"};
             static const char* const whole[] = {"00622222", "11733333", "00622222", "11733333", "00622222",
                                                 "11733333", "00622222", "11733333", "00622222", "00000000"};
-            PathState& own = nodes_[path];
+            State& own = nodes_[path];
             if (entries > 0)
-                own = static_cast<PathState>((children == entries ? whole : others)[own][column] - '0');
+                own = static_cast<State>((children == entries ? whole : others)[own][column] - '0');
         }
     }
 
     EntryCounter counter_;
-    std::map<std::wstring, PathState> nodes_;
+    std::map<std::wstring, State> nodes_;
 };
 
 } // namespace tavi::test

@@ -61,7 +61,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t len
         (void)status.barPosition();
         (void)status.restoreSpeed();
         (void)status.restoreText.get();
-        const HeldBuffer once, again, payload;
+        const auto once = MessageBuffer::create(), again = MessageBuffer::create(), payload = MessageBuffer::create();
         message->clone()->serialise(*once);
         payload->ensure(once->length());
         payload->setLength(once->length() - kFrameHeaderSize);

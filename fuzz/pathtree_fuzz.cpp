@@ -50,8 +50,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t len
             sum = sum * 31 + static_cast<std::size_t>(character);
         return static_cast<std::uint32_t>(sum % 1009 % 5);
     };
-    PathTree* const tree = PathTree::create(false, counter);
-    tree->AddRef();
+    const RefPtr<PathTree> tree = PathTree::create(false, counter);
     test::PathTreeModel model(counter);
     std::set<std::wstring> asked;
     for (std::size_t rule = 0; rule < kMostRules && !input.empty(); ++rule) {
@@ -62,13 +61,12 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t len
             path += static_cast<wchar_t>(kNames[input.next() % 3]);
             asked.insert({path, path + L"\\a", path + L"\\c\\b"});
         }
-        tree->insert(path, head % kStates);
+        tree->insert(path, FolderState{head % kStates});
         model.insert(path, head % kStates);
     }
     for (const std::wstring& question : asked) {
-        if (tree->lookup(question) != model.lookup(question))
+        if (tree->lookup(question) != FolderState{model.lookup(question)})
             std::abort();
     }
-    tree->Release();
     return 0;
 }

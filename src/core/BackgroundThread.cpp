@@ -1,7 +1,7 @@
 #include "core/BackgroundThread.h"
 
 #include "core/Boundary.h"
-#include "core/Module.h"
+#include "core/ModuleThread.h"
 
 namespace tavi {
 

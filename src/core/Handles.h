@@ -4,9 +4,9 @@
 
 #include <windows.h>
 #include <objbase.h>
+#include <shtypes.h>
 
-// One owning type per kind of system handle. Each frees what it holds when it goes, and nothing else; none is shared
-// between threads.
+// One owning type per kind of system handle. An object of these types belongs to one thread at a time.
 namespace tavi {
 
 template <class Traits>
@@ -56,7 +56,7 @@ class UniqueHandle {
     Handle handle_ = Traits::none();
 };
 
-// What stands for no handle differs from kind to kind.
+// The value that means "no handle" differs from kind to kind.
 template <class Type>
 struct NullIsNone {
     using Handle = Type;
@@ -131,54 +131,46 @@ struct MemoryDcTraits : NullIsNone<HDC> {
 };
 using MemoryDc = UniqueHandle<MemoryDcTraits>;
 
-// One reference to a COM object.
-template <class Interface>
-class ComPtr {
-  public:
-    ComPtr() noexcept = default;
-    // Adopts the caller's reference.
-    explicit ComPtr(Interface* object) noexcept : object_(object) {}
-    ComPtr(const ComPtr& other) noexcept : object_(other.object_)
+struct ScreenDcTraits : NullIsNone<HDC> {
+    static void free(Handle dc) noexcept
     {
-        if (object_)
-            object_->AddRef();
+        ReleaseDC(nullptr, dc);
     }
-    ComPtr(ComPtr&& other) noexcept : object_(std::exchange(other.object_, nullptr)) {}
-    ComPtr& operator=(ComPtr other) noexcept
-    {
-        std::swap(object_, other.object_);
-        return *this;
-    }
-    ~ComPtr()
-    {
-        if (object_)
-            object_->Release();
-    }
-
-    Interface* get() const noexcept
-    {
-        return object_;
-    }
-    Interface* operator->() const noexcept
-    {
-        return object_;
-    }
-    explicit operator bool() const noexcept
-    {
-        return object_ != nullptr;
-    }
-    Interface** out() noexcept
-    {
-        *this = ComPtr();
-        return &object_;
-    }
-    void** outVoid() noexcept
-    {
-        return reinterpret_cast<void**>(out());
-    }
-
-  private:
-    Interface* object_ = nullptr;
 };
+using ScreenDc = UniqueHandle<ScreenDcTraits>;
+
+// A window of the thread that owns this object. The window may be destroyed earlier by other means.
+struct WindowTraits : NullIsNone<HWND> {
+    static void free(Handle window) noexcept
+    {
+        if (IsWindow(window))
+            DestroyWindow(window);
+    }
+};
+using WindowHandle = UniqueHandle<WindowTraits>;
+
+struct FindTraits : InvalidIsNone {
+    static void free(Handle find) noexcept
+    {
+        FindClose(find);
+    }
+};
+using FindHandle = UniqueHandle<FindTraits>;
+
+// An item id list of the shell's allocator.
+struct ItemIdListTraits : NullIsNone<LPITEMIDLIST> {
+    static void free(Handle list) noexcept
+    {
+        CoTaskMemFree(list);
+    }
+};
+using ItemIdList = UniqueHandle<ItemIdListTraits>;
+
+// Stores the address of an exported function, or null if the library has none of that name.
+template <class Function>
+void findFunction(HMODULE library, const char* name, Function& function) noexcept
+{
+    function = reinterpret_cast<Function>(reinterpret_cast<void*>(GetProcAddress(library, name)));
+}
 
 } // namespace tavi

@@ -3,18 +3,20 @@
 #include <atomic>
 #include <cstdint>
 
+#include "core/RefCounted.h"
+
 namespace tavi {
 
 // One reference-counted object that any thread may take a reference to while another replaces it: a reader gets the old
 // or the new object whole, never waits, and never touches one that has been freed.
 //
-// A plain pointer cannot do that: between reading it and counting up, the object may die. So the word holds the pointer
-// and the number of readers that are between those two steps. Who replaces the object adds that number to the object's
-// own count before dropping the word's reference; a reader that finds its pointer replaced gives back the reference it
-// was given that way. It may do so before it was given: a published object therefore holds a reserve of references
-// until it has been replaced.
+// A plain pointer cannot do that: the object may be destroyed between the load of the pointer and the AddRef. So the
+// word holds the pointer and the number of readers that are between those two steps. The thread that replaces the
+// object adds that number to the object's own count before it releases the word's reference; a reader that finds its
+// pointer replaced releases the reference that was added for it. The reader may do so before the other thread has added
+// it: a published object therefore holds a reserve of references until it has been replaced.
 //
-// Object needs AddRef(), addRefs(int) and Release(), all atomic. An object may be published once only.
+// Object is a RefCounted with an atomic count. An object may be published once only.
 template <class Object>
 class PublishedPointer {
   public:
@@ -23,16 +25,16 @@ class PublishedPointer {
     PublishedPointer& operator=(const PublishedPointer&) = delete;
     ~PublishedPointer()
     {
-        replace(nullptr);
+        replace({});
     }
 
-    // The current object with one reference for the caller, or null.
-    Object* acquire() noexcept
+    // Returns the current object, or null.
+    RefPtr<Object> acquire() noexcept
     {
         Word word = word_.load(std::memory_order_relaxed);
         do {
             if (!object(word))
-                return nullptr;
+                return {};
         } while (!word_.compare_exchange_weak(word, word + 1, std::memory_order_acq_rel, std::memory_order_relaxed));
         Object* const taken = object(word);
         taken->AddRef();
@@ -40,29 +42,23 @@ class PublishedPointer {
         word = word_.load(std::memory_order_relaxed);
         while (object(word) == taken) {
             if (word_.compare_exchange_weak(word, word - 1, std::memory_order_acq_rel, std::memory_order_relaxed))
-                return taken;
+                return RefPtr<Object>::adopt(taken);
         }
         taken->Release();
         // NOLINTNEXTLINE(clang-analyzer-cplusplus.NewDelete): the checker does not count references.
-        return taken;
+        return RefPtr<Object>::adopt(taken);
     }
 
-    // Publishes `next`, whose caller's reference passes to the word, and drops the word's reference to the object
-    // before it.
-    void replace(Object* next) noexcept
+    // Publishes `next`, which may be null, and releases the object before it.
+    void replace(RefPtr<Object> next) noexcept
     {
         if (next)
             next->addRefs(kReserve);
-        const Word before = word_.exchange(pack(next), std::memory_order_acq_rel);
+        const Word before = word_.exchange(pack(next.release()), std::memory_order_acq_rel);
         if (Object* const old = object(before)) {
             old->addRefs(static_cast<int>(before & kReaders) - kReserve);
             old->Release();
         }
-    }
-
-    bool isSet() const noexcept
-    {
-        return object(word_.load(std::memory_order_relaxed)) != nullptr;
     }
 
   private:

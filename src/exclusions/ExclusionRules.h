@@ -35,10 +35,10 @@ class ExclusionSources {
     virtual bool keepsUserPlaces() = 0;
 };
 
-constexpr PathState kGrayed = 7;
-constexpr PathState kCarvedOut = 0;
+constexpr FolderState kGrayed = FolderState::allOn;
+constexpr FolderState kCarvedOut = FolderState::off;
 
-using RuleSink = std::function<void(const wxString& path, PathState state)>;
+using RuleSink = std::function<void(const wxString& path, FolderState state)>;
 
 // The order is part of the result: a later rule replaces those below it.
 void addMachineRules(ExclusionSources& sources, const RuleSink& add);

@@ -26,7 +26,4 @@ bool isUserData(const wxString& path);
 // Detach only.
 void dropGraylist() noexcept;
 
-// How many folders the last build listed.
-std::uint32_t graylistListings() noexcept;
-
 } // namespace tavi

@@ -10,57 +10,46 @@ constexpr wchar_t kSeparator = L'\\';
 
 // What the states of a node's children say together.
 struct Summary {
-    bool plain = false;  // some are 0, 1 or 8
-    bool marked = false; // some are 2 to 7
-    bool mixed = false;  // some are 2 to 5
+    bool plain = false;  // nothing beneath some of them is on
+    bool marked = false; // something beneath some of them is on
+    bool mixed = false;  // something, but not everything, beneath some of them is on
 };
 
-// Some entries on disk have no node: they take after the node's own state.
-PathState withOthers(PathState own, Summary children) noexcept
+// Returns the new state of a node if some entries on disk have no node of their own: those inherit the node's state.
+FolderState withOthers(FolderState own, Summary children) noexcept
 {
     switch (own) {
-    case 0:
-    case 2:
-    case 8:
-        return children.marked || children.mixed ? 2 : 0;
-    case 1:
-    case 3:
-        return !children.mixed && !children.plain ? 7 : children.marked ? 3 : 5;
-    case 4:
-    case 6:
-        return children.mixed || children.plain ? 4 : 6;
-    case 5:
-    case 7:
-        return children.mixed || children.plain ? 5 : 7;
+    case FolderState::off:
+    case FolderState::offSomeOn:
+    case FolderState::allOff:
+        return children.marked || children.mixed ? FolderState::offSomeOn : FolderState::off;
+    case FolderState::on:
+    case FolderState::onSomeOn:
+        return !children.mixed && !children.plain ? FolderState::allOn
+               : children.marked                  ? FolderState::onSomeOn
+                                                  : FolderState::onMostOn;
+    case FolderState::offMostOn:
+    case FolderState::offAllOn:
+        return children.mixed || children.plain ? FolderState::offMostOn : FolderState::offAllOn;
+    case FolderState::onMostOn:
+    case FolderState::allOn:
+        return children.mixed || children.plain ? FolderState::onMostOn : FolderState::allOn;
     default:
-        return 0;
+        return FolderState::off;
     }
 }
 
-// Every entry on disk has its node.
-PathState withoutOthers(PathState own, Summary children) noexcept
+// Returns the new state of a node if every entry on disk has a node of its own.
+FolderState withoutOthers(FolderState own, Summary children) noexcept
 {
-    if (own > 8)
-        return 0;
-    const PathState odd = own % 2;
-    if (children.marked)
-        return (children.mixed || children.plain ? 2 : 6) + odd;
-    return (children.mixed ? 2 : 0) + odd;
-}
-
-PathState inherited(PathState state) noexcept
-{
-    switch (state) {
-    case 0:
-    case 2:
-        return 8;
-    case 1:
-    case 3:
-    case 5:
-        return 7;
-    default:
-        return state;
-    }
+    if (own > FolderState::allOff)
+        return FolderState::off;
+    const bool isOn = isRuleOn(own);
+    if (children.marked && !children.mixed && !children.plain)
+        return isOn ? FolderState::allOn : FolderState::offAllOn;
+    if (children.marked || children.mixed)
+        return isOn ? FolderState::onSomeOn : FolderState::offSomeOn;
+    return isOn ? FolderState::on : FolderState::off;
 }
 
 // The first component of `rest`, which keeps what follows the separator; `last` when nothing does.
@@ -80,20 +69,14 @@ wxString text(std::wstring_view component)
 
 } // namespace
 
-PathTree* PathTree::create(bool foldersOnly, EntryCounter counter)
+RefPtr<PathTree> PathTree::create(bool foldersOnly, EntryCounter counter)
 {
-    return new PathTree(foldersOnly, std::move(counter));
+    return RefPtr<PathTree>(new PathTree(foldersOnly, std::move(counter)));
 }
 
 PathTree::PathTree(bool foldersOnly, EntryCounter counter) : counter_(std::move(counter))
 {
     root_.foldersOnly = foldersOnly;
-}
-
-void PathTree::Release() const noexcept
-{
-    if (--refs_ < 1)
-        delete this;
 }
 
 PathTree::~PathTree()
@@ -114,7 +97,7 @@ void PathTree::removeChildren(Node& node) noexcept
     }
 }
 
-PathTree::Node& PathTree::makeChild(Node& parent, const wxString& name, PathState state)
+PathTree::Node& PathTree::makeChild(Node& parent, const wxString& name, FolderState state)
 {
     auto child = std::make_unique<Node>();
     child->parent = &parent;
@@ -128,7 +111,7 @@ PathTree::Node& PathTree::makeChild(Node& parent, const wxString& name, PathStat
     return *(parent.children[name] = std::move(child));
 }
 
-void PathTree::insert(std::wstring_view path, PathState state)
+void PathTree::insert(std::wstring_view path, FolderState state)
 {
     std::vector<Node*> way = {&root_};
     for (bool last = false; !last;) {
@@ -142,7 +125,7 @@ void PathTree::insert(std::wstring_view path, PathState state)
             } else {
                 way.push_back(found->second.get());
             }
-        } else if (node.state == 0 && state == 0) {
+        } else if (node.state == FolderState::off && state == FolderState::off) {
             // The rule would change nothing.
             last = true;
         } else {
@@ -156,7 +139,7 @@ void PathTree::insert(std::wstring_view path, PathState state)
         recompute(**node);
 }
 
-void PathTree::insertAll(const std::vector<wxString>& paths, PathState state)
+void PathTree::insertAll(const std::vector<wxString>& paths, FolderState state)
 {
     for (const wxString& path : paths)
         insert(view(path), state);
@@ -166,9 +149,10 @@ void PathTree::recompute(Node& node) const
 {
     Summary summary;
     for (const auto& [name, child] : node.children) {
-        summary.plain |= child->state <= 1 || child->state == 8;
-        summary.marked |= child->state >= 2 && child->state <= 7;
-        summary.mixed |= child->state >= 2 && child->state <= 5;
+        const FolderState state = child->state;
+        summary.plain |= state <= FolderState::on || state == FolderState::allOff;
+        summary.marked |= state >= FolderState::offSomeOn && state <= FolderState::allOn;
+        summary.mixed |= state >= FolderState::offSomeOn && state <= FolderState::onMostOn;
     }
     if (node.entryCount == Node::kNotCounted)
         node.entryCount = node.fullPath.empty() ? 0 : counter_(node.fullPath, node.foldersOnly);
@@ -179,7 +163,7 @@ void PathTree::recompute(Node& node) const
         node.children.size() == node.entryCount ? withoutOthers(node.state, summary) : withOthers(node.state, summary);
 }
 
-PathState PathTree::lookup(std::wstring_view path) const
+FolderState PathTree::lookup(std::wstring_view path) const
 {
     const Node* node = &root_;
     while (!path.empty()) {
@@ -192,7 +176,7 @@ PathState PathTree::lookup(std::wstring_view path) const
     return node->state;
 }
 
-void PathTree::forEach(const std::function<void(const wxString& path, PathState state)>& visit) const
+void PathTree::forEach(const std::function<void(const wxString& path, FolderState state)>& visit) const
 {
     std::vector<const Node*> waiting = {&root_};
     while (!waiting.empty()) {

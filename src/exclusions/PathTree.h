@@ -1,6 +1,5 @@
 #pragma once
 
-#include <atomic>
 #include <cstdint>
 #include <functional>
 #include <memory>
@@ -10,13 +9,11 @@
 
 #include <wx/string.h>
 
-#include "core/PathSet.h"
+#include "core/FolderState.h"
+#include "core/Paths.h"
+#include "core/RefCounted.h"
 
 namespace tavi {
-
-// 0 to 8. Odd: the rule of the node is on. 7 and 8: on or off for the node and everything beneath it; the others sum up
-// nodes with mixed contents.
-using PathState = std::uint32_t;
 
 // How many entries a folder has, hidden ones included; 0 also when it cannot be listed. With `foldersOnly` only
 // sub-folders count.
@@ -24,36 +21,24 @@ using EntryCounter = std::function<std::uint32_t(const wxString& folder, bool fo
 
 // Rules by full path, and the state that applies to any path: its own rule, or what it inherits from the nearest folder
 // that has one. Names are compared exactly. Filled by one thread, then published and never changed again; lookups need
-// no lock. Counted by AddRef and Release, from any thread.
-class PathTree {
+// no lock.
+class PathTree : public RefCounted<PathTree> {
   public:
-    // With no reference yet. The counter is used while rules are inserted, at most once for a node.
-    static PathTree* create(bool foldersOnly, EntryCounter counter);
-    PathTree(const PathTree&) = delete;
-    PathTree& operator=(const PathTree&) = delete;
+    // The counter is used while rules are inserted, at most once for a node.
+    static RefPtr<PathTree> create(bool foldersOnly, EntryCounter counter);
 
     // A rule on a folder replaces every rule below it.
-    void insert(std::wstring_view path, PathState state);
-    void insertAll(const std::vector<wxString>& paths, PathState state);
+    void insert(std::wstring_view path, FolderState state);
+    void insertAll(const std::vector<wxString>& paths, FolderState state);
     // No rule comes any more: the counter goes.
     void finish() noexcept
     {
         counter_ = nullptr;
     }
-    PathState lookup(std::wstring_view path) const;
-
-    void AddRef() const noexcept
-    {
-        addRefs(1);
-    }
-    void addRefs(int count) const noexcept
-    {
-        refs_ += count;
-    }
-    void Release() const noexcept;
+    FolderState lookup(std::wstring_view path) const;
 
     // Every node but the root, parents first, names in order.
-    void forEach(const std::function<void(const wxString& path, PathState state)>& visit) const;
+    void forEach(const std::function<void(const wxString& path, FolderState state)>& visit) const;
 
   private:
     struct Node {
@@ -61,7 +46,7 @@ class PathTree {
         Node* parent = nullptr;
         wxString name;
         wxString fullPath;
-        PathState state = 0;
+        FolderState state = FolderState::off;
         bool foldersOnly = false;
         static constexpr std::uint32_t kNotCounted = UINT32_MAX;
         std::uint32_t entryCount = kNotCounted;
@@ -69,11 +54,11 @@ class PathTree {
 
     PathTree(bool foldersOnly, EntryCounter counter);
     ~PathTree();
-    Node& makeChild(Node& parent, const wxString& name, PathState state);
+    friend class RefCounted<PathTree>;
+    Node& makeChild(Node& parent, const wxString& name, FolderState state);
     void recompute(Node& node) const;
     static void removeChildren(Node& node) noexcept;
 
-    mutable std::atomic<std::int32_t> refs_{0};
     Node root_;
     EntryCounter counter_;
 };

@@ -1,16 +1,17 @@
 #include "exclusions/UserProfiles.h"
 
 #include <map>
-#include <memory>
-#include <new>
 #include <string>
 
+#include <windows.h>
 #include <sddl.h>
 #include <wx/log.h>
 
 #include "core/Boundary.h"
 #include "core/Handles.h"
-#include "core/RegistryText.h"
+#include "core/Paths.h"
+#include "core/Privileges.h"
+#include "core/Registry.h"
 
 namespace tavi {
 namespace {
@@ -164,47 +165,6 @@ std::vector<wxString> shellFolderPaths(const wxString& valueName)
             paths.push_back(path);
     }
     return paths;
-}
-
-wxString longPath(const wxString& path)
-{
-    std::vector<wchar_t> buffer(path.length() + 1);
-    DWORD length = 0;
-    // Once more after growing; a path that changes meanwhile may need it again.
-    while ((length = GetLongPathNameW(path.wc_str(), buffer.data(), static_cast<DWORD>(buffer.size()))) >=
-           buffer.size())
-        buffer.resize(length + 1);
-    if (length >= 2 && buffer[1] == L':' && buffer[0] >= L'a' && buffer[0] <= L'z')
-        buffer[0] = static_cast<wchar_t>(buffer[0] - L'a' + L'A');
-    return wxString(buffer.data(), length);
-}
-
-bool isPrivilegeEnabled(HANDLE token, const wchar_t* privilege) noexcept
-{
-    LUID id{};
-    DWORD size = 0;
-    if (!LookupPrivilegeValueW(nullptr, privilege, &id) ||
-        GetTokenInformation(token, TokenPrivileges, nullptr, 0, &size) || GetLastError() != ERROR_INSUFFICIENT_BUFFER)
-        return false;
-    const std::unique_ptr<BYTE[]> bytes(new (std::nothrow) BYTE[size]);
-    if (!bytes || !GetTokenInformation(token, TokenPrivileges, bytes.get(), size, &size))
-        return false;
-    const auto& list = *reinterpret_cast<const TOKEN_PRIVILEGES*>(bytes.get());
-    for (DWORD i = 0; i < list.PrivilegeCount; ++i) {
-        const LUID_AND_ATTRIBUTES& entry = list.Privileges[i];
-        if (entry.Luid.LowPart == id.LowPart && entry.Luid.HighPart == id.HighPart)
-            return (entry.Attributes & SE_PRIVILEGE_ENABLED) != 0;
-    }
-    return false;
-}
-
-bool setPrivilege(HANDLE token, const wchar_t* privilege, bool enable) noexcept
-{
-    TOKEN_PRIVILEGES change{};
-    change.PrivilegeCount = 1;
-    change.Privileges[0].Attributes = enable ? SE_PRIVILEGE_ENABLED : 0;
-    return LookupPrivilegeValueW(nullptr, privilege, &change.Privileges[0].Luid) &&
-           AdjustTokenPrivileges(token, FALSE, &change, 0, nullptr, nullptr);
 }
 
 } // namespace tavi

@@ -2,7 +2,6 @@
 
 #include <vector>
 
-#include <windows.h>
 #include <wx/string.h>
 
 // The registry hives of all users of the machine, for as long as the list of default exclusions is built. Callers
@@ -19,12 +18,5 @@ void unloadUserHives() noexcept;
 // The named value of every user's "Shell Folders" key, in long form and in the order of the hives; without those that
 // do not exist. A user whose hive can be reached twice contributes twice.
 std::vector<wxString> shellFolderPaths(const wxString& valueName);
-
-// The long form of an existing path, with an upper-case drive letter; empty when it does not exist. Any thread.
-wxString longPath(const wxString& path);
-
-// Any failure answers false. Any thread.
-bool isPrivilegeEnabled(HANDLE token, const wchar_t* privilege) noexcept;
-bool setPrivilege(HANDLE token, const wchar_t* privilege, bool enable) noexcept;
 
 } // namespace tavi

@@ -7,7 +7,7 @@
 
 #include <wx/log.h>
 
-#include "core/ModuleFunction.h"
+#include "core/Handles.h"
 
 namespace tavi {
 namespace {

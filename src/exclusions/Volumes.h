@@ -10,7 +10,7 @@
 #include <wx/string.h>
 
 #include "core/CriticalSection.h"
-#include "core/PathSet.h"
+#include "core/Paths.h"
 
 namespace tavi {
 

@@ -21,12 +21,6 @@ MessageBuffer::~MessageBuffer()
     std::free(data_);
 }
 
-void MessageBuffer::Release() noexcept
-{
-    if (--refs_ == 0)
-        delete this;
-}
-
 void MessageBuffer::ensure(std::uint32_t size) noexcept
 {
     if (size > capacity_)

@@ -2,22 +2,17 @@
 
 #include <cstdint>
 
+#include "core/RefCounted.h"
+
 namespace tavi {
 
-// The growable block that carries one frame. Counted without atomics: a buffer never leaves the thread that made it.
-class MessageBuffer {
+// The growable block that carries one frame. The count is plain: a buffer never leaves the thread that created it.
+class MessageBuffer : public RefCounted<MessageBuffer, std::uint32_t> {
   public:
-    // Made with no reference; its first holder takes one at once.
-    MessageBuffer() noexcept;
-    MessageBuffer(const MessageBuffer&) = delete;
-    MessageBuffer& operator=(const MessageBuffer&) = delete;
-
-    void AddRef() noexcept
+    static RefPtr<MessageBuffer> create()
     {
-        ++refs_;
+        return RefPtr<MessageBuffer>(new MessageBuffer);
     }
-    // Frees block and buffer with the last reference.
-    void Release() noexcept;
 
     // Makes room for `size` bytes. When that fails the old block is gone too and data() is null.
     void ensure(std::uint32_t size) noexcept;
@@ -42,39 +37,14 @@ class MessageBuffer {
     }
 
   private:
+    friend class RefCounted<MessageBuffer, std::uint32_t>;
+    MessageBuffer() noexcept;
     ~MessageBuffer();
     void grow(std::uint32_t capacity) noexcept;
 
     unsigned char* data_ = nullptr;
     std::uint32_t capacity_ = 0;
     std::uint32_t length_ = 0;
-    std::uint32_t refs_ = 0;
-};
-
-// A new buffer and the first reference to it.
-class HeldBuffer {
-  public:
-    HeldBuffer() : buffer_(new MessageBuffer)
-    {
-        buffer_->AddRef();
-    }
-    HeldBuffer(const HeldBuffer&) = delete;
-    HeldBuffer& operator=(const HeldBuffer&) = delete;
-    ~HeldBuffer()
-    {
-        buffer_->Release();
-    }
-    MessageBuffer& operator*() const noexcept
-    {
-        return *buffer_;
-    }
-    MessageBuffer* operator->() const noexcept
-    {
-        return buffer_;
-    }
-
-  private:
-    MessageBuffer* buffer_;
 };
 
 } // namespace tavi

@@ -15,7 +15,7 @@ std::uint32_t u32At(const unsigned char* bytes) noexcept
 std::unique_ptr<PipeMessage> readFrame(ByteSource& source, const StopCheck& stopCheck)
 {
     const auto stopped = [&] { return stopCheck && stopCheck(); };
-    const HeldBuffer buffer;
+    const auto buffer = MessageBuffer::create();
 
     // One pause even when bytes are there already: it also limits how fast a peer can make the reader work.
     std::uint32_t available = 0;

@@ -67,7 +67,7 @@ bool writeMessage(HANDLE pipe, std::unique_ptr<PipeMessage>& message)
 {
     if (!message || !isUsable(pipe))
         return false;
-    const HeldBuffer buffer;
+    const auto buffer = MessageBuffer::create();
     message->serialise(*buffer);
     DWORD written = 0;
     if (!buffer->data() || !WriteFile(pipe, buffer->data(), buffer->length(), &written, nullptr))

@@ -7,7 +7,7 @@
 #include <string>
 #include <string_view>
 
-#include "core/Text.h"
+#include "core/Utf8.h"
 
 namespace tavi {
 namespace {

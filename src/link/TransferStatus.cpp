@@ -4,8 +4,6 @@
 #include <cmath>
 #include <limits>
 
-#include "core/Reference.h"
-
 namespace tavi {
 namespace {
 
@@ -58,13 +56,13 @@ Integer truncated(double value) noexcept
 
 void PublishedText::set(const wxString& text)
 {
-    text_.replace(new Shared(text));
+    text_.replace(RefPtr<Shared>(new Shared(text)));
 }
 
 wxString PublishedText::get() const
 {
-    const Reference<Shared> shared(text_.acquire());
-    return shared ? shared->text() : wxString();
+    const RefPtr<Shared> shared = text_.acquire();
+    return shared ? shared->text : wxString();
 }
 
 TransferStatus::TransferStatus(bool samplingOn, TickSource clock)

@@ -18,35 +18,14 @@ class PublishedText {
     void set(const wxString& text);
     void clear()
     {
-        text_.replace(nullptr);
+        text_.replace({});
     }
     wxString get() const;
 
   private:
-    class Shared {
-      public:
-        explicit Shared(const wxString& text) : text_(text) {}
-        void AddRef() noexcept
-        {
-            addRefs(1);
-        }
-        void addRefs(int count) noexcept
-        {
-            refs_ += count;
-        }
-        void Release() noexcept
-        {
-            if (--refs_ < 1)
-                delete this;
-        }
-        const wxString& text() const noexcept
-        {
-            return text_;
-        }
-
-      private:
-        std::atomic<int> refs_{1};
-        const wxString text_;
+    struct Shared : RefCounted<Shared> {
+        explicit Shared(const wxString& newText) : text(newText) {}
+        const wxString text;
     };
 
     mutable PublishedPointer<Shared> text_;

@@ -31,7 +31,7 @@ const KernelHandle manifestMutex(CreateMutexW(nullptr, FALSE, nullptr));
 class SystemServices : public WatcherServices {
   public:
     explicit SystemServices(const BackgroundThread& thread) : thread_(thread) {}
-    const Manifest* loadManifest() override
+    ManifestRef loadManifest() override
     {
         return readStoredManifest();
     }
@@ -70,13 +70,13 @@ BackgroundThread watcherThread("manifest watcher", [](const BackgroundThread& se
 
 } // namespace
 
-const Manifest* getCurrentManifest() noexcept
+ManifestRef getCurrentManifest() noexcept
 {
-    if (const Manifest* manifest = watcher.manifest.acquire())
+    if (ManifestRef manifest = watcher.manifest.acquire())
         return manifest;
     const DWORD wait = WaitForSingleObject(manifestMutex.get(), 0);
     if (wait == WAIT_OBJECT_0 || wait == WAIT_ABANDONED) {
-        if (const Manifest* manifest = watcher.manifest.acquire()) {
+        if (ManifestRef manifest = watcher.manifest.acquire()) {
             ReleaseMutex(manifestMutex.get());
             return manifest;
         }
@@ -89,7 +89,7 @@ const Manifest* getCurrentManifest() noexcept
 
 void holdManifestForMenu() noexcept
 {
-    const Manifest* const current = getCurrentManifest();
+    const Manifest* const current = getCurrentManifest().release();
     const Manifest* const previous = menuManifest.exchange(current);
     if (previous == current && previous)
         previous->Release();
@@ -120,7 +120,7 @@ void stopManifestWatcher() noexcept
         WaitForSingleObject(manifestMutex.get(), INFINITE);
     if (const HANDLE thread = watcherThread.releaseHandle())
         CloseHandle(thread);
-    watcher.manifest.replace(nullptr);
+    watcher.manifest.replace({});
     replaceReference(menuManifest, nullptr);
     replaceReference(retiredManifest, nullptr);
     dropGraylist();

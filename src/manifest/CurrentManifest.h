@@ -5,9 +5,9 @@
 // The manifest in force and the thread that keeps it so.
 namespace tavi {
 
-// The current manifest with one reference for the caller, or null while none has been loaded. The first call starts the
-// watcher. Never waits; any thread.
-const Manifest* getCurrentManifest() noexcept;
+// Returns the current manifest, or null while none has been loaded. The first call starts the watcher. Never waits; any
+// thread.
+ManifestRef getCurrentManifest() noexcept;
 
 // Starts the watcher like getCurrentManifest. The manifest in force stays referenced until the next menu asks or the
 // module is unmapped, whatever is loaded meanwhile. Any thread.

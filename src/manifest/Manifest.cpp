@@ -1,7 +1,7 @@
 #include "manifest/Manifest.h"
 
 #include "manifest/ManifestParser.h"
-#include "core/Text.h"
+#include "core/Utf8.h"
 
 namespace tavi {
 namespace {
@@ -11,11 +11,6 @@ constexpr const char* kEmptyInputHash = "da39a3ee5e6b4b0d3255bfef95601890afd8070
 
 constexpr wchar_t kFirstLowSurrogate = 0xDC00;
 constexpr wchar_t kLastLowSurrogate = 0xDFFF;
-
-bool isHighSurrogate(wchar_t unit) noexcept
-{
-    return unit >= 0xD800 && unit <= 0xDBFF;
-}
 
 storage::Extra extraOf(std::string_view bytes) noexcept
 {
@@ -67,7 +62,7 @@ bool ManifestPatchList::existsAt(std::uint32_t time) const noexcept
 
 Manifest::Manifest() : hash_(kEmptyInputHash) {}
 
-Manifest* Manifest::parse(const wxString& text)
+ManifestRef Manifest::parse(const wxString& text)
 {
     // In slices, so that no second copy of the whole text ever stands beside the first. The parser joins what that cuts
     // apart.

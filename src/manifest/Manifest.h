@@ -1,6 +1,5 @@
 #pragma once
 
-#include <atomic>
 #include <cstddef>
 #include <cstdint>
 #include <optional>
@@ -11,13 +10,14 @@
 #include <wx/string.h>
 
 #include "manifest/ManifestStorage.h"
-#include "core/Reference.h"
+#include "core/RefCounted.h"
 
 // The parsed backup set. A manifest never changes once parsed: any thread that holds a reference reads it without a
 // lock.
 namespace tavi {
 
 class Manifest;
+using ManifestRef = RefPtr<const Manifest>;
 
 // The time that means "at any time".
 constexpr std::uint32_t kAnyTime = 0xFFFFFFFF;
@@ -95,28 +95,10 @@ class ManifestPatchList {
     std::uint32_t count_;
 };
 
-class Manifest {
+class Manifest : public RefCounted<Manifest> {
   public:
-    Manifest(const Manifest&) = delete;
-    Manifest& operator=(const Manifest&) = delete;
-
-    // A manifest without references yet, or null for a text with an invalid line, which is logged.
-    static Manifest* parse(const wxString& text);
-
-    void AddRef() const noexcept
-    {
-        addRefs(1);
-    }
-    void addRefs(int count) const noexcept
-    {
-        references_.fetch_add(count, std::memory_order_relaxed);
-    }
-    // Destroys the manifest when the count falls below 1.
-    void Release() const noexcept
-    {
-        if (references_.fetch_sub(1, std::memory_order_acq_rel) <= 1)
-            delete this;
-    }
+    // Returns null for a text with an invalid line, which is logged.
+    static ManifestRef parse(const wxString& text);
 
     bool isBackedUp(std::wstring_view path, std::uint32_t time) const;
     // Whether a path that begins with exactly these characters is backed up; no separator is added.
@@ -187,26 +169,22 @@ class Manifest {
 
     Manifest();
     ~Manifest() = default;
-    friend struct std::default_delete<Manifest>;
+    friend class RefCounted<Manifest>;
 
     std::uint32_t findFile(std::wstring_view path) const;
     FileRanges filesUnder(std::wstring_view prefix) const;
     std::uint32_t firstFolderFrom(std::string_view text) const noexcept;
     std::uint32_t firstNameFrom(FileRange files, std::string_view name) const noexcept;
 
-    mutable std::atomic<std::int32_t> references_{0};
     std::uint32_t textLength_ = 1;
     wxString userText_;
     wxString hash_;
     storage::ByteArena texts_;
     storage::VersionStore versions_;
-    storage::BlockArray<FileRecord, 15> files_;
-    storage::BlockArray<FolderRecord, 16> folders_;
+    BlockArray<FileRecord, 15> files_;
+    BlockArray<FolderRecord, 16> folders_;
     storage::NumberTable filesByPath_;
 };
-
-// Holds one reference.
-using ManifestRef = Reference<const Manifest>;
 
 inline ManifestPatch ManifestPatchList::operator[](std::size_t i) const noexcept
 {

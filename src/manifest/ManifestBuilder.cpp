@@ -2,6 +2,7 @@
 
 #include <array>
 #include <numeric>
+#include <utility>
 #include <vector>
 
 namespace tavi {
@@ -97,7 +98,7 @@ std::uint32_t ManifestBuilder::internFolder(std::string_view folder)
     return lastFolder_;
 }
 
-Manifest* ManifestBuilder::finish(std::uint32_t textLength)
+ManifestRef ManifestBuilder::finish(std::uint32_t textLength)
 {
     manifest_->textLength_ = textLength;
     foldersByText_ = {};
@@ -108,7 +109,7 @@ Manifest* ManifestBuilder::finish(std::uint32_t textLength)
     manifest_->filesByPath_.allocate(files.size());
     for (std::uint32_t file = 0; file < files.size(); ++file)
         manifest_->filesByPath_.insert(files[file].hash, file);
-    return manifest_.release();
+    return std::move(manifest_);
 }
 
 // Sorts the folders and puts each file into the part of the array that is its folder's, in the order of the text.

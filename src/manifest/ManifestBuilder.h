@@ -1,7 +1,6 @@
 #pragma once
 
 #include <cstdint>
-#include <memory>
 #include <string>
 #include <string_view>
 
@@ -40,8 +39,8 @@ class ManifestBuilder {
     void setUserText(const wxString& text);
     void setHash(const wxString& hash);
 
-    // Gives the manifest away; only destroying the builder may follow.
-    Manifest* finish(std::uint32_t textLength);
+    // Returns the manifest; afterwards the builder may only be destroyed.
+    ManifestRef finish(std::uint32_t textLength);
 
   private:
     struct LoadedFolder {
@@ -54,9 +53,9 @@ class ManifestBuilder {
     void orderFolders();
     void orderFiles();
 
-    std::unique_ptr<Manifest> manifest_;
-    storage::BlockArray<Manifest::FileRecord, 15> files_;
-    storage::BlockArray<LoadedFolder, 15> folders_;
+    RefPtr<Manifest> manifest_;
+    BlockArray<Manifest::FileRecord, 15> files_;
+    BlockArray<LoadedFolder, 15> folders_;
     storage::NumberTable foldersByText_;
     std::string extra_;
     std::uint32_t lastFolder_ = storage::NumberTable::kNone;

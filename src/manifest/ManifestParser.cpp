@@ -7,7 +7,7 @@
 
 #include <wx/log.h>
 
-#include "core/Text.h"
+#include "core/Utf8.h"
 
 namespace tavi {
 namespace {
@@ -100,17 +100,6 @@ bool readZero(const char*& at) noexcept
 }
 
 } // namespace
-
-std::uint32_t countUtf16Units(std::string_view text) noexcept
-{
-    std::uint32_t units = 0;
-    for (const char c : text) {
-        const auto byte = static_cast<unsigned char>(c);
-        units += (byte & 0xC0) != 0x80 ? 1u : 0u;
-        units += byte >= 0xF0 ? 1u : 0u;
-    }
-    return units;
-}
 
 ManifestParser::ManifestParser() : builder_(std::in_place) {}
 
@@ -302,14 +291,14 @@ void ManifestParser::flushFile()
     hasPath_ = false;
 }
 
-Manifest* ManifestParser::finish(std::uint32_t units)
+ManifestRef ManifestParser::finish(std::uint32_t units)
 {
     if (builder_ && section_ == Section::kUser)
         userText_ += carry_;
     if (builder_ && section_ == Section::kFiles)
         fileLine(carry_, true);
     if (!builder_)
-        return nullptr;
+        return {};
     endSection();
     return builder_->finish(units + 1);
 }

@@ -23,9 +23,8 @@ class ManifestParser {
     {
         return !builder_;
     }
-    // The text is complete and has this many UTF-16 units. A manifest without references, or null if a line was
-    // invalid.
-    Manifest* finish(std::uint32_t units);
+    // The text is complete and has this many UTF-16 units. Returns null if a line was invalid.
+    ManifestRef finish(std::uint32_t units);
 
   private:
     enum class Section { kHeader, kUser, kFiles, kSkipped };
@@ -51,8 +50,5 @@ class ManifestParser {
     bool hasPath_ = false;
     std::uint32_t firstVersion_ = 0;
 };
-
-// UTF-16 units of well-formed UTF-8.
-std::uint32_t countUtf16Units(std::string_view text) noexcept;
 
 } // namespace tavi

@@ -1,5 +1,7 @@
 #include "manifest/ManifestWatcher.h"
 
+#include <utility>
+
 #include <wx/log.h>
 
 #include "manifest/StoredManifest.h"
@@ -16,17 +18,15 @@ constexpr std::uint32_t kCyclesPerExclusionBuild = 18;
 
 // A null result, from an invalid text, leaves the manifest in force where it is: its readers lose nothing by a text
 // that the service is about to replace.
-void publish(WatcherState& state, const Manifest* manifest)
+void publish(WatcherState& state, ManifestRef manifest)
 {
-    if (!manifest)
-        return;
-    manifest->AddRef();
-    state.manifest.replace(manifest);
+    if (manifest)
+        state.manifest.replace(std::move(manifest));
 }
 
 } // namespace
 
-const Manifest* readStoredManifest()
+ManifestRef readStoredManifest()
 {
     try {
         DbConnection database;
@@ -60,7 +60,7 @@ void runManifestWatcher(WatcherState& state, WatcherServices& services)
 
     guarded("exclusion build", [&] { services.buildExclusions(true); });
     // A watcher that starts again while the host keeps the module finds the manifest of the one before it.
-    if (state.manifest.isSet())
+    if (state.manifest.acquire())
         loadIfChanged();
     else
         load();

@@ -18,8 +18,8 @@ struct WatcherState {
 class WatcherServices {
   public:
     virtual ~WatcherServices() = default;
-    // A manifest without references yet, or null for a stored text that is no manifest.
-    virtual const Manifest* loadManifest() = 0;
+    // Returns null for a stored text that is no manifest.
+    virtual ManifestRef loadManifest() = 0;
     // The service's time of the stored manifest and the clock it is compared with: milliseconds since 1970, or false.
     virtual bool manifestTime(std::int64_t& milliseconds) = 0;
     virtual std::int64_t now() = 0;
@@ -35,6 +35,6 @@ void runManifestWatcher(WatcherState& state, WatcherServices& services);
 
 // The stored manifest, parsed: an empty one when there is none or the database fails, which is logged; null for an
 // invalid text.
-const Manifest* readStoredManifest();
+ManifestRef readStoredManifest();
 
 } // namespace tavi

@@ -131,7 +131,7 @@ void TextDecoder::pass(char* begin, char* end)
 
 } // namespace
 
-Manifest* parseStoredManifest(const void* bytes, std::size_t length)
+ManifestRef parseStoredManifest(const void* bytes, std::size_t length)
 {
     ManifestParser parser;
     TextDecoder decoder(parser);

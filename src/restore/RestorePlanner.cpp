@@ -4,7 +4,7 @@
 #include <optional>
 #include <vector>
 
-#include "core/Text.h"
+#include "core/Utf8.h"
 
 namespace tavi {
 namespace {
@@ -23,19 +23,6 @@ std::optional<std::uint32_t> versionAt(const ManifestPatchList& patches, std::ui
         }
     }
     return std::nullopt;
-}
-
-// How many bytes the first `units` characters of a wide string take in UTF-8.
-std::size_t bytesOfUnits(const std::string& text, std::size_t units)
-{
-    std::size_t at = 0;
-    while (at < text.size() && units > 0) {
-        const auto lead = static_cast<unsigned char>(text[at]);
-        const std::size_t length = lead < 0x80 ? 1 : lead < 0xE0 ? 2 : lead < 0xF0 ? 3 : 4;
-        units -= std::min<std::size_t>(units, length == 4 && sizeof(wchar_t) == 2 ? 2 : 1);
-        at += length;
-    }
-    return std::min(at, text.size());
 }
 
 // Puts " (n)" before the extension. A name without one gets it at its end; one that begins with its
@@ -64,7 +51,7 @@ RestorePlan::RestorePlan(const RestoreRequest& request, const Manifest& manifest
 void RestorePlan::buildTarget(const std::string& manifestPath, std::uint32_t freeName, std::string& target) const
 {
     target = destination_;
-    target.append(manifestPath, bytesOfUnits(manifestPath, removedUnits_), std::string::npos);
+    target.append(manifestPath, utf8PrefixLength(manifestPath, removedUnits_), std::string::npos);
     if (freeName != 0)
         insertFreeName(target, freeName);
 }

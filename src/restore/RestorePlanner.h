@@ -7,8 +7,8 @@
 #include <wx/string.h>
 
 #include "manifest/Manifest.h"
-#include "manifest/ManifestStorage.h"
-#include "core/PathSet.h"
+#include "core/BlockArray.h"
+#include "core/Paths.h"
 
 namespace tavi {
 
@@ -70,7 +70,7 @@ class RestorePlan {
     std::string destination_;
     std::size_t removedUnits_ = 0;
     bool overwrite_;
-    storage::BlockArray<Row, 15> rows_;
+    BlockArray<Row, 15> rows_;
     std::string manifestPath_;
     std::string target_;
 };

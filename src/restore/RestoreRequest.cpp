@@ -8,7 +8,7 @@
 #include <wx/log.h>
 
 #include "core/InstallPaths.h"
-#include "core/Text.h"
+#include "core/Utf8.h"
 
 namespace tavi {
 namespace {

@@ -2,8 +2,9 @@
 #include <objbase.h>
 
 #include "core/Boundary.h"
-#include "core/Handles.h"
 #include "core/Module.h"
+#include "core/RefCounted.h"
+#include "core/RuntimeCleanup.h"
 #include "shell/ClassFactory.h"
 #include "shell/Lifecycle.h"
 #include "shell/Registration.h"
@@ -16,7 +17,7 @@ STDAPI DllGetClassObject(REFCLSID classId, REFIID interfaceId, void** object)
         if (!object)
             return E_POINTER;
         *object = nullptr;
-        const ComPtr<IClassFactory> factory(makeClassFactory(classId));
+        const auto factory = RefPtr<IClassFactory>::adopt(makeClassFactory(classId));
         if (!factory)
             return CLASS_E_CLASSNOTAVAILABLE;
         resumeThreads();

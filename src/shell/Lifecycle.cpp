@@ -11,6 +11,7 @@
 #include "core/Log.h"
 #include "link/StatusListener.h"
 #include "statedb/Database.h"
+#include "shell/ShellAllocator.h"
 #include "ui/MenuBitmap.h"
 
 namespace tavi {
@@ -53,9 +54,8 @@ void attachToFileManager(HINSTANCE instance, const wchar_t* hostPath)
     setModuleInstance(instance);
     acquireShellAllocator();
     DisableThreadLibraryCalls(instance);
-    // Asked for its side effect: the watcher starts.
-    if (const Manifest* manifest = getCurrentManifest())
-        manifest->Release();
+    // Called for its side effect: it starts the watcher.
+    getCurrentManifest();
     startStatusThread();
     isAttached = true;
 }

@@ -81,8 +81,7 @@ STDMETHODIMP_(ULONG) ShellExt::Release()
 
 STDMETHODIMP ShellExt::AddPages(LPFNADDPROPSHEETPAGE addPage, LPARAM parameter)
 {
-    guarded("ShellExt::AddPages",
-            [&] { addPropertyPage(selection_, ManifestRef(getCurrentManifest()), addPage, parameter); });
+    guarded("ShellExt::AddPages", [&] { addPropertyPage(selection_, getCurrentManifest(), addPage, parameter); });
     return S_OK;
 }
 

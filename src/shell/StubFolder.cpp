@@ -4,6 +4,7 @@
 
 #include "core/Boundary.h"
 #include "shell/ClassIds.h"
+#include "shell/ShellAllocator.h"
 
 namespace tavi {
 namespace {

@@ -5,7 +5,7 @@
 
 #include <sqlite3.h>
 
-#include "core/Text.h"
+#include "core/Utf8.h"
 
 namespace tavi {
 namespace {

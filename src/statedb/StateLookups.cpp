@@ -10,29 +10,10 @@
 namespace tavi {
 namespace {
 
-constexpr std::int32_t kInheritedIn = 7;
-constexpr std::int32_t kInheritedOut = 8;
-
 const char* const kFolderSelect = "SELECT state FROM filesystem WHERE folder=?";
 const char* const kFolderReplace = "INSERT OR REPLACE INTO filesystem(state,folder) VALUES(?,?)";
 const char* const kFolderDelete = "DELETE FROM filesystem WHERE folder=?";
 const char* const kFileSelect = "SELECT state FROM file_states WHERE filename=?";
-
-// What a folder takes over from the nearest recorded one above it.
-std::int32_t inherited(std::int32_t state)
-{
-    switch (state) {
-    case 0:
-    case 2:
-        return kInheritedOut;
-    case 1:
-    case 3:
-    case 5:
-        return kInheritedIn;
-    default:
-        return state;
-    }
-}
 
 CriticalSection& fileStateLock()
 {
@@ -82,29 +63,29 @@ FolderStateTable::ReadScope::~ReadScope()
     }
 }
 
-std::optional<std::int32_t> FolderStateTable::recordedState(const wxString& folder)
+std::optional<FolderState> FolderStateTable::recordedState(const wxString& folder)
 {
     select_.reset();
     select_.bind(1, folder);
     DbQuery rows = select_.execQuery();
     if (!rows.nextRow())
         return std::nullopt;
-    const std::int32_t state = rows.fieldInt(0, 0);
+    const auto state = static_cast<FolderState>(rows.fieldInt(0, 0));
     // A statement left on its row would keep the service from writing for as long as the object lives.
     select_.reset();
     return state;
 }
 
-std::int32_t FolderStateTable::getFolderState(const wxString& path)
+FolderState FolderStateTable::getFolderState(const wxString& path)
 {
     if (path.empty())
-        return kInheritedOut;
+        return FolderState::allOff;
     if (const auto state = recordedState(path))
         return *state;
     const wxString parent = path.BeforeLast(L'\\');
     if (reading_ && !parent.empty() && parent == knownParent_)
         return passedOn_;
-    std::int32_t passedOn = kInheritedOut;
+    FolderState passedOn = FolderState::allOff;
     for (wxString folder = parent; !folder.empty(); folder = folder.BeforeLast(L'\\')) {
         if (const auto state = recordedState(folder)) {
             passedOn = inherited(*state);

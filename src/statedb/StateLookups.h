@@ -6,6 +6,7 @@
 
 #include <wx/string.h>
 
+#include "core/FolderState.h"
 #include "statedb/Database.h"
 
 namespace tavi {
@@ -19,9 +20,9 @@ class FolderStateTable {
     FolderStateTable& operator=(const FolderStateTable&) = delete;
     ~FolderStateTable();
 
-    // The state recorded for the path, or what the nearest recorded ancestor passes on; 8 where none is recorded. Exact
-    // comparison, letter case included. Throws DbException.
-    std::int32_t getFolderState(const wxString& path);
+    // The state recorded for the path, or what the nearest recorded ancestor passes on; allOff where none is recorded.
+    // Exact comparison, letter case included. Throws DbException.
+    FolderState getFolderState(const wxString& path);
 
     // Holds the database for reading, so that many lookups in a row lock it once: the locks are most of what a lookup
     // costs. Throws DbException when it cannot.
@@ -37,12 +38,12 @@ class FolderStateTable {
     };
 
   private:
-    std::optional<std::int32_t> recordedState(const wxString& folder);
+    std::optional<FolderState> recordedState(const wxString& folder);
 
     // While a ReadScope lives: the folder of the last path and what it passes on.
     bool reading_ = false;
     wxString knownParent_;
-    std::int32_t passedOn_ = 0;
+    FolderState passedOn_ = FolderState::off;
     DbConnection connection_;
     DbStatement select_;
     DbStatement replace_;

@@ -152,7 +152,7 @@ HRESULT invokeCommand(const CMINVOKECOMMANDINFO& info, const Selection& selectio
         return E_INVALIDARG;
     switch (reinterpret_cast<UINT_PTR>(info.lpVerb)) {
     case kRestore: {
-        ManifestRef manifest(getCurrentManifest());
+        ManifestRef manifest = getCurrentManifest();
         // The object keeps its selection: the host may invoke the command again.
         if (manifest)
             startVersionsDialog(Selection(selection), std::move(manifest), info.hwnd);

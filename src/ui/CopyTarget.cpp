@@ -9,7 +9,7 @@
 #include <shlwapi.h>
 #include <wx/intl.h>
 
-#include "core/Handles.h"
+#include "core/RefCounted.h"
 
 namespace tavi {
 namespace {
@@ -86,7 +86,7 @@ std::optional<wxString> askFileName(HWND owner, const wxString& preset)
 
 std::optional<wxString> askFolder(HWND owner)
 {
-    ComPtr<IMalloc> allocator;
+    RefPtr<IMalloc> allocator;
     if (FAILED(SHGetMalloc(allocator.out())))
         return std::nullopt;
     const wxString title = _("Select a folder to save your restored files in.");

@@ -5,7 +5,7 @@
 #include <windows.h>
 #include <wx/string.h>
 
-#include "core/PathSet.h"
+#include "core/Paths.h"
 
 // Where "Copy To" puts the restored files. The two questions run their own message loops on the calling thread.
 namespace tavi {

@@ -54,26 +54,6 @@ HBITMAP storeBitmap(UINT id, BitmapHandle bitmap)
     }
 }
 
-class ScreenDc {
-  public:
-    ScreenDc() noexcept : window_(GetDesktopWindow()), dc_(GetDC(window_)) {}
-    ~ScreenDc()
-    {
-        if (dc_)
-            ReleaseDC(window_, dc_);
-    }
-    ScreenDc(const ScreenDc&) = delete;
-    ScreenDc& operator=(const ScreenDc&) = delete;
-    HDC get() const noexcept
-    {
-        return dc_;
-    }
-
-  private:
-    HWND window_;
-    HDC dc_;
-};
-
 class SelectionScope {
   public:
     SelectionScope(HDC dc, HGDIOBJ object) noexcept : dc_(dc), previous_(SelectObject(dc, object)) {}
@@ -117,8 +97,8 @@ HBITMAP menuBitmap(UINT resourceId, COLORREF background)
         LoadImageW(moduleInstance(), MAKEINTRESOURCEW(LOWORD(resourceId)), IMAGE_ICON, width, height, 0)));
     if (!icon)
         return nullptr;
-    const ScreenDc screen;
-    if (!screen.get())
+    const ScreenDc screen(GetDC(nullptr));
+    if (!screen)
         return nullptr;
     const MemoryDc memory(CreateCompatibleDC(screen.get()));
     BitmapHandle bitmap(CreateCompatibleBitmap(screen.get(), width, height));

@@ -8,8 +8,8 @@
 
 #include "core/Boundary.h"
 #include "core/Module.h"
-#include "core/ModuleFunction.h"
-#include "core/Text.h"
+#include "core/Handles.h"
+#include "core/Utf8.h"
 #include "ui/ActivationScope.h"
 #include "ui/VersionsDialog.h"
 #include "ui/resource.h"

@@ -12,6 +12,7 @@
 #include "core/CriticalSection.h"
 #include "core/DisplayFormat.h"
 #include "core/Handles.h"
+#include "core/ModuleThread.h"
 #include "link/CommandPipe.h"
 #include "link/StatusListener.h"
 #include "ui/ActivationScope.h"

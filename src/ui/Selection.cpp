@@ -8,7 +8,7 @@
 
 #include "manifest/CurrentManifest.h"
 #include "core/Handles.h"
-#include "core/Text.h"
+#include "core/Utf8.h"
 #include "statedb/Database.h"
 #include "statedb/StateLookups.h"
 
@@ -117,14 +117,14 @@ class IdListArray {
     std::size_t count_ = 0;
 };
 
-ComPtr<IShellFolder> bindParent(LPCITEMIDLIST parent)
+RefPtr<IShellFolder> bindParent(LPCITEMIDLIST parent)
 {
-    ComPtr<IShellFolder> desktop;
+    RefPtr<IShellFolder> desktop;
     if (FAILED(SHGetDesktopFolder(desktop.out())) || parent->mkid.cb == 0)
         return desktop;
-    ComPtr<IShellFolder> folder;
+    RefPtr<IShellFolder> folder;
     if (FAILED(desktop->BindToObject(parent, nullptr, IID_IShellFolder, folder.outVoid())))
-        return ComPtr<IShellFolder>();
+        return RefPtr<IShellFolder>();
     return folder;
 }
 
@@ -139,7 +139,7 @@ void collectItems(IDataObject& data, DriveTypeQuery driveType, PathSet& paths)
     const Medium medium(data);
     const IdListArray items(medium.bytes(), medium.size());
     const LPCITEMIDLIST parent = items.list(0);
-    const ComPtr<IShellFolder> folder = parent ? bindParent(parent) : ComPtr<IShellFolder>();
+    const RefPtr<IShellFolder> folder = parent ? bindParent(parent) : RefPtr<IShellFolder>();
     if (!folder)
         return;
     paths.reserve(paths.size() + items.count());
@@ -183,8 +183,8 @@ std::int32_t summarizeStates(const PathSet& paths, FolderStateTable& states)
     try {
         const FolderStateTable::ReadScope reading(states);
         for (const wxString& path : paths) {
-            const std::int32_t state = states.getFolderState(path);
-            flags.add(state == 6 || state == 7);
+            const FolderState state = states.getFolderState(path);
+            flags.add(state == FolderState::offAllOn || state == FolderState::allOn);
             if (flags.both())
                 break;
         }
@@ -229,7 +229,7 @@ void captureSelection(LPCITEMIDLIST folder, IDataObject* data, FolderStateTable&
     selection = Selection();
     selection.paths = collectPaths(folder, data, GetDriveTypeW);
     selection.stateSummary = summarizeStates(selection.paths, states);
-    const ManifestRef manifest(getCurrentManifest());
+    const ManifestRef manifest = getCurrentManifest();
     summarizeVersions(selection, manifest.get());
 }
 

@@ -8,7 +8,7 @@
 #include <wx/string.h>
 
 #include "manifest/Manifest.h"
-#include "core/PathSet.h"
+#include "core/Paths.h"
 
 namespace tavi {
 

@@ -17,9 +17,10 @@
 #include "core/Boundary.h"
 #include "core/DisplayFormat.h"
 #include "core/Handles.h"
+#include "core/ModuleThread.h"
 #include "core/LocalePattern.h"
 #include "core/Module.h"
-#include "core/Text.h"
+#include "core/Utf8.h"
 #include "restore/RestoreRequest.h"
 #include "ui/ActivationScope.h"
 #include "ui/CopyTarget.h"
@@ -35,23 +36,6 @@ namespace {
 constexpr const wchar_t* kBackupRuns = L"simple.map";
 
 std::atomic<ProgressWindowOpener> progressWindowOpener{RestoreProgressWindow::getOrCreate};
-
-struct WindowTraits : NullIsNone<HWND> {
-    static void free(Handle window) noexcept
-    {
-        if (IsWindow(window))
-            DestroyWindow(window);
-    }
-};
-using WindowHandle = UniqueHandle<WindowTraits>;
-
-struct ScreenDcTraits : NullIsNone<HDC> {
-    static void free(Handle dc) noexcept
-    {
-        ReleaseDC(nullptr, dc);
-    }
-};
-using ScreenDc = UniqueHandle<ScreenDcTraits>;
 
 // The shell's folder browser needs OLE on its thread.
 class OleScope {

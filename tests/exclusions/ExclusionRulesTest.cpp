@@ -61,8 +61,8 @@ class NamedSources : public ExclusionSources {
 std::string rulesOf(NamedSources& sources)
 {
     std::string text;
-    addMachineRules(sources, [&](const wxString& path, PathState state) {
-        text += path.utf8_string() + (state == 0 ? "+|" : state == 7 ? "|" : "?");
+    addMachineRules(sources, [&](const wxString& path, FolderState state) {
+        text += path.utf8_string() + (state == FolderState::off ? "+|" : state == FolderState::allOn ? "|" : "?");
     });
     return text;
 }

@@ -14,7 +14,8 @@
 #include "exclusions/Volumes.h"
 #include "core/Handles.h"
 #include "core/Options.h"
-#include "core/Reference.h"
+#include "core/Privileges.h"
+#include "core/RefCounted.h"
 #include "tests/support/Allocations.h"
 #include "tests/support/Counts.h"
 #include "tests/support/LogCapture.h"
@@ -315,17 +316,18 @@ TEST_F(Graylists, AreBuiltPublishedAndReplaced)
     std::vector<Counts> counts;
     for (const long keeps : {1L, 0L, 0L}) {
         wxRegKey(getSettingsKeyName()).SetValue(L"options.graylist", keeps);
-        const Reference<const PathTree> first(getGraylist(true)), again(getGraylist(false));
+        const auto first = RefPtr<const PathTree>::adopt(getGraylist(true)),
+                   again = RefPtr<const PathTree>::adopt(getGraylist(false));
         EXPECT_TRUE(temporaryHives().empty());
         EXPECT_EQ(again.get(), first.get());
         EXPECT_TRUE(isGrayed(wxString(windows) + L"\\Temp\\x") && isGrayed(L"C:\\served") &&
                     isGrayed(L"C:\\scratch\\x"));
         EXPECT_EQ(isGrayed(wxString(windows) + L"\\notepad.exe"), keeps == 0);
         EXPECT_FALSE(isGrayed(L"C:\\users"));
-        EXPECT_EQ(first->lookup(view(here_)), keeps ? 8u : 5u);
-        EXPECT_EQ(first->lookup(view(here_ + L"\\3\\Microsoft\\Outlook\\mail.pst")), 8u);
+        EXPECT_EQ(first->lookup(view(here_)), keeps ? FolderState::allOff : FolderState::onMostOn);
+        EXPECT_EQ(first->lookup(view(here_ + L"\\3\\Microsoft\\Outlook\\mail.pst")), FolderState::allOff);
         // An old list stays whole for who holds it.
-        const Reference<const PathTree> next(getGraylist(true));
+        const auto next = RefPtr<const PathTree>::adopt(getGraylist(true));
         EXPECT_NE(next.get(), first.get());
         EXPECT_EQ(first->lookup(L"C:\\users\\x\\y"), next->lookup(L"C:\\users\\x\\y"));
         counts.push_back(countNow());
@@ -338,10 +340,10 @@ TEST_F(Graylists, AnswerByStateAndCountWhatTheListInForceDoesNotLeaveOut)
 {
     const PathTree* users = getUserDataTree(true);
     EXPECT_EQ(getUserDataTree(false), users);
-    EXPECT_EQ(users->lookup(view(here_)), 5u);
-    for (const PathState state : {1u, 3u, 5u, 7u}) {
-        const wxString folder = here_ + wxString::Format(L"\\%u", static_cast<unsigned>(state));
-        EXPECT_EQ(users->lookup(view(folder)), state);
+    EXPECT_EQ(users->lookup(view(here_)), FolderState::onMostOn);
+    for (const std::uint32_t state : {1u, 3u, 5u, 7u}) {
+        const wxString folder = here_ + wxString::Format(L"\\%u", state);
+        EXPECT_EQ(users->lookup(view(folder)), FolderState{state});
         EXPECT_TRUE(isUserData(folder));
         EXPECT_EQ(isGrayed(folder), state != 1) << state;
         EXPECT_EQ(isPartlyGrayed(folder), state != 7) << state;
@@ -351,12 +353,12 @@ TEST_F(Graylists, AnswerByStateAndCountWhatTheListInForceDoesNotLeaveOut)
     // Where a list is in force, the folder 7 and the cache do not count, and each entry left has a rule of its own.
     users = getUserDataTree(true);
     for (const wchar_t* const name : {L"", L"\\3", L"\\5"})
-        EXPECT_EQ(users->lookup(view(here_ + name)), 1u) << name;
+        EXPECT_EQ(users->lookup(view(here_ + name)), FolderState::on) << name;
     // Among the users' places all count, also where another list comes into force during the build.
     log_.onNextLine([] { getGraylist(false)->Release(); });
-    const Reference<const PathTree> built(getGraylist(true));
+    const auto built = RefPtr<const PathTree>::adopt(getGraylist(true));
     EXPECT_EQ(log_.take().size(), 3u); // one for each list
-    EXPECT_EQ(built->lookup(view(here_)), 5u);
+    EXPECT_EQ(built->lookup(view(here_)), FolderState::onMostOn);
 }
 
 TEST_F(Graylists, AreBuiltOneAfterTheOtherAndPublishedBeforeTheHivesGo)

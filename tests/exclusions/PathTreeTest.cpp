@@ -3,7 +3,7 @@
 
 #include <gtest/gtest.h>
 
-#include "core/Reference.h"
+#include "core/RefCounted.h"
 #include "fuzz/PathTreeModel.h"
 
 namespace tavi {
@@ -23,16 +23,17 @@ TEST(PathTree, AnswersAsAnObviousModelDoes)
         const EntryCounter counter = [seed](const wxString& folder, bool) {
             return static_cast<std::uint32_t>((std::hash<std::wstring>()(folder.ToStdWstring()) ^ seed) % 1009 % 5);
         };
-        const Reference<PathTree> tree(PathTree::create(false, counter));
+        const RefPtr<PathTree> tree = PathTree::create(false, counter);
         test::PathTreeModel model(counter);
         for (unsigned rule = 0, count = random() % 12 + 1; rule < count; ++rule) {
             const std::wstring& path = paths[random() % paths.size()];
-            const PathState state = random() % 3 == 0 ? random() % 10 : random() % 2 * 7;
-            tree->insert(path, state);
+            const std::uint32_t state = random() % 3 == 0 ? random() % 10 : random() % 2 * 7;
+            tree->insert(path, FolderState{state});
             model.insert(path, state);
         }
         for (const std::wstring& path : paths)
-            ASSERT_EQ(tree->lookup(path), model.lookup(path)) << wxString(path).utf8_string() << " of set " << set;
+            ASSERT_EQ(tree->lookup(path), FolderState{model.lookup(path)})
+                << wxString(path).utf8_string() << " of set " << set;
     }
 }
 
@@ -40,24 +41,27 @@ TEST(PathTree, AnswersAsAnObviousModelDoes)
 TEST(PathTree, TakesOddPathsAsTheyAreAndCountsAFolderOnce)
 {
     std::map<wxString, int> counted;
-    const Reference<PathTree> tree(PathTree::create(true, [&](const wxString& folder, bool foldersOnly) {
+    const RefPtr<PathTree> tree(PathTree::create(true, [&](const wxString& folder, bool foldersOnly) {
         EXPECT_TRUE(foldersOnly);
         ++counted[folder];
         return 5u;
     }));
     for (const wchar_t* const path : {L"C:\\A", L"C:\\B", L"C:\\B\\x", L""})
-        tree->insert(path, 7);
-    const std::pair<const wchar_t*, PathState> answers[] = {
-        {L"", 0}, {L"x", 8}, {L"\\x", 7}, {L"C:\\", 2}, {L"c:\\A", 8}};
+        tree->insert(path, FolderState::allOn);
+    const std::pair<const wchar_t*, FolderState> answers[] = {{L"", FolderState::off},
+                                                              {L"x", FolderState::allOff},
+                                                              {L"\\x", FolderState::allOn},
+                                                              {L"C:\\", FolderState::offSomeOn},
+                                                              {L"c:\\A", FolderState::allOff}};
     for (const auto& [path, state] : answers)
         EXPECT_EQ(tree->lookup(path), state) << wxString(path).utf8_string();
     EXPECT_EQ(counted, (std::map<wxString, int>{{L"C:", 1}, {L"C:\\B", 1}}));
     // As deep as a path can be: neither filling nor freeing goes by recursion.
-    const Reference<PathTree> deep(PathTree::create(false, [](const wxString&, bool) { return 0u; }));
+    const RefPtr<PathTree> deep(PathTree::create(false, [](const wxString&, bool) { return 0u; }));
     std::wstring path(60000, L'\\');
     path[0] = L'x';
-    deep->insert(path.substr(0, 2000), 7);
-    EXPECT_EQ(deep->lookup(path), 7u);
+    deep->insert(path.substr(0, 2000), FolderState::allOn);
+    EXPECT_EQ(deep->lookup(path), FolderState::allOn);
 }
 
 } // namespace

@@ -31,7 +31,7 @@ inline std::unique_ptr<EventMessage> event(std::uint32_t type, std::uint64_t val
 
 inline std::string serialised(const PipeMessage& message)
 {
-    const HeldBuffer buffer;
+    const auto buffer = MessageBuffer::create();
     message.serialise(*buffer);
     return {reinterpret_cast<const char*>(buffer->data()), buffer->length()};
 }

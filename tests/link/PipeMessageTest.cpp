@@ -15,7 +15,7 @@ using namespace test;
 // A payload as a reader leaves it in the buffer.
 std::unique_ptr<PipeMessage> created(std::uint32_t type, const std::string& payload, std::uint32_t length)
 {
-    const HeldBuffer buffer;
+    const auto buffer = MessageBuffer::create();
     buffer->ensure(static_cast<std::uint32_t>(payload.size()));
     std::memcpy(buffer->data(), payload.data(), payload.size());
     buffer->setLength(length);
@@ -93,7 +93,7 @@ TEST(PipeMessage, TextCountsAreBelievedUpToTheEndOfTheBuffer)
 
 TEST(PipeMessage, BuffersGrowByAKilobyteMoreThanAsked)
 {
-    const HeldBuffer buffer;
+    const auto buffer = MessageBuffer::create();
     const std::pair<std::uint32_t, std::uint32_t> steps[] = {
         {44, 1024}, {1024, 1024}, {1025, 2049}, {2000, 2049}, {UINT32_MAX, 0}};
     for (const auto& [size, capacity] : steps) {

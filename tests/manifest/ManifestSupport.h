@@ -8,7 +8,7 @@
 
 #include "manifest/ManifestParser.h"
 #include "manifest/StoredManifest.h"
-#include "core/Text.h"
+#include "core/Utf8.h"
 
 namespace tavi::test {
 
@@ -20,16 +20,9 @@ inline std::string packed(const std::string& text, int format = wxZLIB_ZLIB)
     return {start, static_cast<std::size_t>(blob.GetLength())};
 }
 
-inline ManifestRef held(const Manifest* manifest)
-{
-    if (manifest)
-        manifest->AddRef();
-    return ManifestRef(manifest);
-}
-
 inline ManifestRef stored(const std::string& blob)
 {
-    return held(parseStoredManifest(blob.data(), blob.size()));
+    return parseStoredManifest(blob.data(), blob.size());
 }
 
 inline std::string utf8(const wxString& text)

@@ -23,7 +23,7 @@ TEST(Manifest, StaysWholeForItsReadersWhileOthersReplaceIt)
         readers.emplace_back([&] {
             std::vector<ManifestRef> kept(4);
             for (std::size_t turn = 0; !done; ++turn) {
-                kept[turn % kept.size()] = ManifestRef(published.acquire());
+                kept[turn % kept.size()] = published.acquire();
                 for (const ManifestRef& manifest : kept)
                     ASSERT_TRUE(!manifest ||
                                 utf8(manifest->hash()) == std::to_string(manifest->patches(0)[0].timestamp()));
@@ -31,10 +31,8 @@ TEST(Manifest, StaysWholeForItsReadersWhileOthersReplaceIt)
         });
     for (int version = 1; version <= 400; ++version) {
         const std::string number = std::to_string(version);
-        const Manifest* const next =
-            Manifest::parse(fromUtf8("USER\n_hash|" + number + "\n\n\nFILES\nC:\\a\n" + number + ":1:2:3:0:x:0:40"));
-        next->AddRef();
-        published.replace(next);
+        published.replace(
+            Manifest::parse(fromUtf8("USER\n_hash|" + number + "\n\n\nFILES\nC:\\a\n" + number + ":1:2:3:0:x:0:40")));
     }
     done = true;
     for (std::thread& reader : readers)
@@ -110,7 +108,7 @@ TEST(Manifest, AnswersAsAWalkOverAllEntriesDoes)
         if (text.back() == L'\n')
             text.pop_back();
         // Stored, with the halves of every character apart, the text is still the same.
-        const ManifestRef manifest = held(Manifest::parse(text));
+        const ManifestRef manifest = Manifest::parse(text);
         ASSERT_EQ(dump(stored(packed(inHalves(text)))), dump(manifest));
         ASSERT_EQ(manifest->fileCount(), model.size());
 

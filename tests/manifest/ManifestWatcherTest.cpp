@@ -19,12 +19,12 @@ using namespace test;
 // The times are what the service's setting says, round by round; the third load is invalid and the fourth fails.
 class ScriptedServices : public WatcherServices {
   public:
-    const Manifest* loadManifest() override
+    ManifestRef loadManifest() override
     {
         ++loads;
         if (loads == 4)
             throw std::runtime_error("no manifest");
-        return loads == 3 ? nullptr : Manifest::parse(wxString::Format("USER\n_hash|%d", loads));
+        return loads == 3 ? ManifestRef() : Manifest::parse(wxString::Format("USER\n_hash|%d", loads));
     }
     bool manifestTime(std::int64_t& milliseconds) override
     {
@@ -70,7 +70,7 @@ TEST(ManifestWatcher, ReloadsForALaterTimeRebuildsEvery18thRoundAndStopsWithinAN
     EXPECT_EQ(services.rounds, 55u);
     EXPECT_EQ(services.builds, (std::vector<int>{-1, 18, 36, 54}));
     // The invalid and the failing one leave the one in force.
-    EXPECT_EQ(dump(ManifestRef(services.state.manifest.acquire())), "2[] ");
+    EXPECT_EQ(dump(services.state.manifest.acquire()), "2[] ");
 
     // The first load is not skipped. A second run finds the manifest of the first: it loads a changed one only. The
     // third round's time is later.
@@ -86,7 +86,7 @@ TEST(readStoredManifest, IsEmptyWhereThereIsNoneAndWarnsOfFailures)
     LogCapture log;
     InstalledService service;
     const auto read = [&] {
-        EXPECT_EQ(dump(held(readStoredManifest())), "");
+        EXPECT_EQ(dump(readStoredManifest()), "");
         return log.takeText();
     };
     const std::string failed = "2: Warning: Failed to retrieve stored manifest ";

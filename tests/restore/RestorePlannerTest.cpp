@@ -5,7 +5,7 @@
 
 #include <gtest/gtest.h>
 
-#include "core/Text.h"
+#include "core/Utf8.h"
 #include "tests/manifest/ManifestSupport.h"
 
 namespace tavi {
@@ -29,7 +29,7 @@ TEST(RestorePlanner, ChoosesVersionsTargetsAndFreeNames)
                         "E:/😀é/x\n10:5:6:3:0:x:0:40";
     for (const char* const name : {"report.txt", "README", ".profile", "ends."})
         files += std::string("\n\nD:/dotted.dir/") + name + "\n1:1:1:4:0:x:0:40";
-    const ManifestRef manifest = test::held(Manifest::parse(windows(files)));
+    const ManifestRef manifest = Manifest::parse(windows(files));
     // The selection, the time, the source prefix, the destination, whether to overwrite, how many targets exist, and
     // the rows, each as "path size@timestamp" or "path > target size@timestamp".
     const std::tuple<const char*, std::uint32_t, const char*, const char*, bool, int, const char*> cases[] = {

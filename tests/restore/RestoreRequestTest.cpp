@@ -40,9 +40,9 @@ class RestoreRequests : public testing::Test {
     test::LogCapture log_;
     test::InstalledService service_;
     DbConnection database_;
-    const ManifestRef manifest_ = test::held(
+    const ManifestRef manifest_ =
         Manifest::parse(L"FILES\nC:\\one\\a.txt\n100:1:4000000000:5:0:x:0:40\n\nC:\\one\\b.txt\n100:1:2:6:0:x:0:41\n\n"
-                        L"C:\\gone\\c\n100:1:2:6:0:x:0:41"));
+                        L"C:\\gone\\c\n100:1:2:6:0:x:0:41");
 };
 
 TEST_F(RestoreRequests, StandInTheDatabaseAsOneTransaction)

@@ -5,6 +5,7 @@
 #include <thread>
 
 #include "manifest/CurrentManifest.h"
+#include "core/RuntimeCleanup.h"
 #include "core/Handles.h"
 #include "statedb/Database.h"
 #include "tests/support/Counts.h"
@@ -42,7 +43,7 @@ TEST(Lifecycle, TheFirstManifestIsNullAndItsWatcherTheOnlyOne)
     const test::InstalledService service;
     const test::LogCapture log;
     const std::size_t before = test::countThreads();
-    const auto isLoaded = [] { return static_cast<bool>(ManifestRef(getCurrentManifest())); };
+    const auto isLoaded = [] { return static_cast<bool>(getCurrentManifest()); };
     const auto hasWatcher = [&](bool more) {
         return test::waitUntil([&] { return test::countThreads() == before + more; });
     };

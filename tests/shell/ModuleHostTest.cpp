@@ -9,7 +9,8 @@
 #include <shellapi.h>
 #include <shlobj.h>
 
-#include "core/ModuleFunction.h"
+#include "core/Handles.h"
+#include "core/RefCounted.h"
 #include "shell/ClassIds.h"
 #include "statedb/Database.h"
 #include "tests/manifest/ManifestSupport.h"
@@ -34,16 +35,16 @@ struct LoadedModule {
         EXPECT_EQ(canUnload(), S_OK);
         FreeLibrary(module);
     }
-    ComPtr<IClassFactory> factory(REFCLSID classId) const
+    RefPtr<IClassFactory> factory(REFCLSID classId) const
     {
-        ComPtr<IClassFactory> made;
+        RefPtr<IClassFactory> made;
         EXPECT_EQ(classObject(classId, IID_IClassFactory, made.outVoid()), S_OK);
         return made;
     }
     template <class Interface>
-    ComPtr<Interface> object(REFCLSID classId, REFIID interfaceId) const
+    RefPtr<Interface> object(REFCLSID classId, REFIID interfaceId) const
     {
-        ComPtr<Interface> made;
+        RefPtr<Interface> made;
         EXPECT_EQ(factory(classId)->CreateInstance(nullptr, interfaceId, made.outVoid()), S_OK);
         return made;
     }
@@ -107,7 +108,7 @@ TEST_F(ModuleHost, AnswersAsAComServer)
     };
     for (const auto& [classId, interfaceId, result] : answers) {
         auto factory = module.factory(classId);
-        ComPtr<IUnknown> made;
+        RefPtr<IUnknown> made;
         EXPECT_EQ(factory->CreateInstance(nullptr, interfaceId, made.outVoid()), result);
         EXPECT_EQ(factory->CreateInstance(factory.get(), interfaceId, made.outVoid()), CLASS_E_NOAGGREGATION);
         EXPECT_EQ(factory->LockServer(TRUE), S_OK);
@@ -153,7 +154,7 @@ HRESULT commandsFor(IContextMenu& object, const wchar_t* folder)
     LPITEMIDLIST items = nullptr;
     if (folder)
         SHParseDisplayName(folder, nullptr, &items, 0, nullptr);
-    ComPtr<IShellExtInit> init;
+    RefPtr<IShellExtInit> init;
     object.QueryInterface(IID_IShellExtInit, init.outVoid());
     EXPECT_EQ(init->Initialize(items, nullptr, nullptr), S_OK);
     ILFree(items);
@@ -167,7 +168,7 @@ TEST_F(ModuleHost, OffersWhatItsLastInitializeWasGiven)
 {
     LoadedModule module;
     const auto menu = module.object<IContextMenu>(kShellExtClassId, IID_IContextMenu);
-    ComPtr<IUnknown> object;
+    RefPtr<IUnknown> object;
     menu->QueryInterface(IID_IUnknown, object.outVoid());
     auto* const sheet = reinterpret_cast<IShellPropSheetExt*>(object.get());
     EXPECT_EQ(sheet->ReplacePage(0, nullptr, 0), E_FAIL);
@@ -193,7 +194,7 @@ TEST_F(ModuleHost, ServesAFolderThatParsesAllNamesToNothingAndRefusesTheRest)
 {
     LoadedModule module;
     const auto persist = module.object<IPersistFolder>(kStubFolderClassId, IID_IPersistFolder2);
-    ComPtr<IShellFolder> folder;
+    RefPtr<IShellFolder> folder;
     persist->QueryInterface(IID_IShellFolder, folder.outVoid());
     // Two tables, the count, a word that nothing reads.
     auto* const fields = reinterpret_cast<void***>(persist.get());
@@ -276,13 +277,13 @@ TEST_F(ModuleHost, TheEndOfAPageLetsComFreeWhatNobodyUses)
 {
     LoadedModule().registerServer();
     EXPECT_EQ(CoGetClassObject(kShellExtClassId, CLSCTX_INPROC_SERVER, nullptr, IID_IClassFactory,
-                               ComPtr<IClassFactory>().outVoid()),
+                               RefPtr<IClassFactory>().outVoid()),
               S_OK);
     // The page is this program's own; the module is a library that COM has loaded for it.
     setModuleInstance(GetModuleHandleW(nullptr));
     HPROPSHEETPAGE page = nullptr;
-    addPropertyPage({{L"C:\\f"}, 0, 1, false, {}}, test::held(Manifest::parse(L"FILES\nC:\\f\n1:1:1:1:0::0:0")),
-                    test::takePage, reinterpret_cast<LPARAM>(&page));
+    addPropertyPage({{L"C:\\f"}, 0, 1, false, {}}, Manifest::parse(L"FILES\nC:\\f\n1:1:1:1:0::0:0"), test::takePage,
+                    reinterpret_cast<LPARAM>(&page));
     EXPECT_TRUE(GetModuleHandleW(L"tavishell.dll"));
     DestroyPropertySheetPage(page);
     EXPECT_TRUE(moduleGoes());

@@ -4,7 +4,7 @@
 
 #include <gtest/gtest.h>
 
-#include "core/Text.h"
+#include "core/Utf8.h"
 
 namespace tavi {
 namespace {

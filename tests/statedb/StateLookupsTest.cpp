@@ -21,25 +21,26 @@ TEST(StateLookups, FoldersInheritFromTheNearestRecordedOne)
         writer.execDML(wxString::Format(L"INSERT INTO filesystem VALUES(%d,'C:\\s%d')", state, state));
     writer.execDML("INSERT INTO filesystem VALUES(NULL,'C:\\null'),(4,'D:')");
     FolderStateTable states;
+    const auto stateOf = [&](const wxString& folder) { return static_cast<int>(states.getFolderState(folder)); };
     for (int state = -1; state <= 16; ++state) {
         const wxString folder = wxString::Format(L"C:\\s%d", state);
-        const int inherited = state == 0 || state == 2 ? 8 : state == 1 || state == 3 || state == 5 ? 7 : state;
-        EXPECT_EQ(states.getFolderState(folder), state);
-        EXPECT_EQ(states.getFolderState(folder + L"\\x"), inherited) << state;
-        EXPECT_EQ(states.getFolderState(folder + L"\\x\\y\\"), inherited) << state;
+        const int passedOn = state == 0 || state == 2 ? 8 : state == 1 || state == 3 || state == 5 ? 7 : state;
+        EXPECT_EQ(stateOf(folder), state);
+        EXPECT_EQ(stateOf(folder + L"\\x"), passedOn) << state;
+        EXPECT_EQ(stateOf(folder + L"\\x\\y\\"), passedOn) << state;
     }
-    EXPECT_EQ(states.getFolderState(L"C:\\S2") + states.getFolderState(L"E:\\a\\b") + states.getFolderState(L""), 24);
-    EXPECT_EQ(states.getFolderState(L"C:\\null"), 0);
-    EXPECT_EQ(states.getFolderState(L"D:\\any"), 4);
+    EXPECT_EQ(stateOf(L"C:\\S2") + stateOf(L"E:\\a\\b") + stateOf(L""), 24);
+    EXPECT_EQ(stateOf(L"C:\\null"), 0);
+    EXPECT_EQ(stateOf(L"D:\\any"), 4);
 
     // Held open, but not locked: the service must be able to write.
     EXPECT_EQ(writer.execDML("UPDATE filesystem SET state=5 WHERE folder='C:\\s6'"), 1);
-    EXPECT_EQ(states.getFolderState(L"C:\\s6"), 5);
-    EXPECT_EQ(states.getFolderState(L"C:\\s6\\x"), 7);
+    EXPECT_EQ(stateOf(L"C:\\s6"), 5);
+    EXPECT_EQ(stateOf(L"C:\\s6\\x"), 7);
     writer.execDML("UPDATE filesystem SET state=2 WHERE folder='C:\\s6'");
     std::optional<FolderStateTable::ReadScope> reading(std::in_place, states);
-    EXPECT_EQ(states.getFolderState(L"C:\\s6\\x"), 8); // not what was so before
-    EXPECT_EQ(states.getFolderState(L"C:\\s4\\y"), 4);
+    EXPECT_EQ(stateOf(L"C:\\s6\\x"), 8); // not what was so before
+    EXPECT_EQ(stateOf(L"C:\\s4\\y"), 4);
     {
         const test::FailingAllocations failing(0);
         reading.reset();

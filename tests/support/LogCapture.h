@@ -6,7 +6,7 @@
 
 #include <wx/log.h>
 
-#include "core/Text.h"
+#include "core/Utf8.h"
 
 namespace tavi::test {
 

@@ -19,7 +19,7 @@ constexpr UINT kFirstId = 0x7001;
 struct ContextMenuTest : test::UiTest {
     ContextMenuTest()
     {
-        test::waitUntil([&] { return (manifest = getCurrentManifest()) != nullptr; });
+        test::waitUntil([&] { return (manifest = getCurrentManifest().release()) != nullptr; });
     }
     ~ContextMenuTest() override
     {
@@ -76,8 +76,7 @@ TEST_F(ContextMenuTest, KeepsTheManifestOfTheNewestMenu)
     settings.SetValue(L"options.manifestmtime", L"2037-01-02 03:04:05");
     const Manifest* next = nullptr;
     EXPECT_TRUE(test::waitUntil([&] {
-        next = getCurrentManifest();
-        next->Release();
+        next = getCurrentManifest().get();
         return next != manifest;
     }));
     settings.DeleteSelf();

@@ -16,7 +16,7 @@ HPROPSHEETPAGE pageFor(const PathSet& paths, bool isAccepted = true)
 {
     HPROPSHEETPAGE page = nullptr;
     addPropertyPage({paths, 0, 1, false, {}},
-                    held(Manifest::parse(L"FILES\nC:\\f\n5:5:5:5:0::0:0\n\nC:\\gone\n5:5:5:5:0::0:0\n6:5:5:-1:0::0:0")),
+                    (Manifest::parse(L"FILES\nC:\\f\n5:5:5:5:0::0:0\n\nC:\\gone\n5:5:5:5:0::0:0\n6:5:5:-1:0::0:0")),
                     takePage, isAccepted ? reinterpret_cast<LPARAM>(&page) : 0);
     return page;
 }

@@ -33,8 +33,8 @@ PathSet collect(const wxString& parent, const std::vector<IdList>& items, const 
     std::vector<LPCITEMIDLIST> lists;
     for (const IdList& item : items)
         lists.push_back(ILFindLastID(item.get()));
-    ComPtr<IShellFolder> desktop, folder;
-    ComPtr<IDataObject> data;
+    RefPtr<IShellFolder> desktop, folder;
+    RefPtr<IDataObject> data;
     SHGetDesktopFolder(desktop.out());
     desktop->BindToObject(idsOf(parent).get(), nullptr, IID_IShellFolder, folder.outVoid());
     folder->GetUIObjectOf(nullptr, UINT(lists.size()), lists.data(), IID_IDataObject, nullptr, data.outVoid());
@@ -86,8 +86,8 @@ TEST_F(SelectionTest, NeverReadsOutsideAForgedBlock)
         medium.hGlobal = GlobalAlloc(GMEM_FIXED, block.size() * sizeof(UINT));
         std::copy(block.begin(), block.end(), static_cast<UINT*>(medium.hGlobal));
         // OLE's own store of data takes any block.
-        ComPtr<IOleCache> cache;
-        ComPtr<IDataObject> data;
+        RefPtr<IOleCache> cache;
+        RefPtr<IDataObject> data;
         CreateDataCache(nullptr, CLSID_NULL, IID_IOleCache, cache.outVoid());
         cache->QueryInterface(IID_IDataObject, data.outVoid());
         cache->Cache(&format, 0, &connection);
@@ -100,8 +100,8 @@ TEST_F(SelectionTest, NeverReadsOutsideAForgedBlock)
 
 TEST_F(SelectionTest, SummarizesVersionsAndStates)
 {
-    const ManifestRef manifest = test::held(Manifest::parse(
-        L"FILES\n" + in(L"a.txt\n5:5:5:9:0::0:0\n6:6:6:-1:0::0:0\n\n") + in(L"sub\\deep\\c.txt\n5:5:5:9:0::0:0\n")));
+    const ManifestRef manifest = Manifest::parse(L"FILES\n" + in(L"a.txt\n5:5:5:9:0::0:0\n6:6:6:-1:0::0:0\n\n") +
+                                                 in(L"sub\\deep\\c.txt\n5:5:5:9:0::0:0\n"));
     CreateDirectoryW(in(L"sub").wc_str(), nullptr);
     DbConnection database;
     database.open(service.file(L"taviconf.dat"));

@@ -18,7 +18,7 @@ using namespace test;
 struct VersionsDialogTest : UiTest {
     void open(const Selection& selection, const wxString& files)
     {
-        EXPECT_TRUE(startVersionsDialog(selection, held(Manifest::parse(L"FILES\n" + files)), nullptr));
+        EXPECT_TRUE(startVersionsDialog(selection, (Manifest::parse(L"FILES\n" + files)), nullptr));
         dialog = waitDialog(L"Restore Files");
         list = GetDlgItem(dialog, TAVI_VERSIONS_LIST);
     }

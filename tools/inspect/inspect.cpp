@@ -8,14 +8,14 @@
 #include "manifest/CurrentManifest.h"
 #include "exclusions/Graylist.h"
 #include "core/Module.h"
-#include "core/Text.h"
+#include "core/Utf8.h"
 #include "ui/PropertyPage.h"
 
 namespace {
 
 using namespace tavi;
 
-const char* meaning(PathState state)
+const char* meaning(FolderState state)
 {
     static const char* const meanings[] = {"backed up",
                                            "left out, but not what is listed below",
@@ -26,17 +26,17 @@ const char* meaning(PathState state)
                                            "backed up, all below left out",
                                            "left out",
                                            "backed up"};
-    return state < 9 ? meanings[state] : "unknown";
+    const auto number = static_cast<std::uint32_t>(state);
+    return number < 9 ? meanings[number] : "unknown";
 }
 
 int printExclusions()
 {
     const PathTree* const tree = getGraylist(true);
     std::printf("state  path, and what becomes of it\n");
-    tree->forEach([](const wxString& path, PathState state) {
-        std::printf("  %u    %s: %s\n", state, toUtf8(view(path)).c_str(), meaning(state));
+    tree->forEach([](const wxString& path, FolderState state) {
+        std::printf("  %u    %s: %s\n", static_cast<unsigned>(state), toUtf8(view(path)).c_str(), meaning(state));
     });
-    std::printf("%u folders were listed for it\n", graylistListings());
     tree->Release();
     return 0;
 }
@@ -44,8 +44,8 @@ int printExclusions()
 int explain(const wxString& path)
 {
     const PathTree* const tree = getGraylist(true);
-    const PathState state = tree->lookup(view(path));
-    std::printf("%s: %u, %s\n", toUtf8(view(path)).c_str(), state, meaning(state));
+    const FolderState state = tree->lookup(view(path));
+    std::printf("%s: %u, %s\n", toUtf8(view(path)).c_str(), static_cast<unsigned>(state), meaning(state));
     tree->Release();
     return 0;
 }
@@ -64,14 +64,14 @@ BOOL CALLBACK keepPage(HPROPSHEETPAGE page, LPARAM pages)
 
 int showPage(const wxString& path)
 {
-    const Manifest* manifest = nullptr;
+    ManifestRef manifest;
     for (int waited = 0; !(manifest = getCurrentManifest()) && waited < 500; ++waited)
         Sleep(20);
     Pages pages{};
     Selection selection{};
     selection.paths = {path};
     selection.restoreMode = 1;
-    addPropertyPage(selection, ManifestRef(manifest), keepPage, reinterpret_cast<LPARAM>(&pages));
+    addPropertyPage(selection, manifest, keepPage, reinterpret_cast<LPARAM>(&pages));
     if (pages.count == 0) {
         std::fprintf(stderr, "nothing of this is backed up\n");
         return 1;

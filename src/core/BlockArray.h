@@ -1,0 +1,72 @@
+#pragma once
+
+#include <algorithm>
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <type_traits>
+#include <vector>
+
+namespace tavi {
+
+// An array in blocks of 2^kLog elements, which never move: it grows without copying and needs no large piece of the
+// address space. Elements are plain and start undefined.
+template <class Element, unsigned kLog>
+class BlockArray {
+    static_assert(std::is_trivially_copyable_v<Element>);
+    static constexpr std::size_t kBlock = std::size_t{1} << kLog;
+
+  public:
+    std::uint32_t size() const noexcept
+    {
+        return size_;
+    }
+    const Element& operator[](std::uint32_t i) const noexcept
+    {
+        return blocks_[i >> kLog][i & (kBlock - 1)];
+    }
+    Element& operator[](std::uint32_t i) noexcept
+    {
+        return blocks_[i >> kLog][i & (kBlock - 1)];
+    }
+    void push(const Element& element)
+    {
+        if ((size_ & (kBlock - 1)) == 0 && size_ >> kLog == blocks_.size())
+            addBlock(kBlock);
+        (*this)[size_] = element;
+        ++size_;
+    }
+    // Makes an empty array one of `size` elements that will not grow.
+    void allocate(std::uint32_t size)
+    {
+        for (std::size_t done = 0; done < size; done += kBlock)
+            addBlock(std::min<std::size_t>(kBlock, size - done));
+        size_ = size;
+    }
+    void fill(const Element& element)
+    {
+        for (std::uint32_t i = 0; i < size_; i += kBlock)
+            std::fill_n(blocks_[i >> kLog].get(), std::min<std::size_t>(kBlock, size_ - i), element);
+    }
+    void shrinkTo(std::uint32_t size) noexcept
+    {
+        size_ = std::min(size_, size);
+    }
+    std::size_t bytes() const noexcept
+    {
+        return bytes_;
+    }
+
+  private:
+    void addBlock(std::size_t elements)
+    {
+        blocks_.emplace_back(new Element[elements]);
+        bytes_ += elements * sizeof(Element);
+    }
+
+    std::vector<std::unique_ptr<Element[]>> blocks_;
+    std::uint32_t size_ = 0;
+    std::size_t bytes_ = 0;
+};
+
+} // namespace tavi

@@ -1,0 +1,42 @@
+#include "core/Registry.h"
+
+#include <cwchar>
+#include <vector>
+
+namespace tavi {
+
+std::optional<wxString> readRegistryText(HKEY root, const wxString& path, const wxString& name)
+{
+    std::vector<wchar_t> buffer(MAX_PATH);
+    for (;;) {
+        DWORD bytes = static_cast<DWORD>(buffer.size()) * DWORD{sizeof(wchar_t)};
+        const LONG result =
+            RegGetValueW(root, path.wc_str(), name.wc_str(), RRF_RT_REG_SZ, nullptr, buffer.data(), &bytes);
+        if (result == ERROR_SUCCESS)
+            return wxString(buffer.data(), wcsnlen(buffer.data(), bytes / sizeof(wchar_t)));
+        if (result != ERROR_MORE_DATA)
+            return std::nullopt;
+        // RegGetValue may report the size before references are expanded, which is too small.
+        buffer.resize(buffer.size() * 2 + bytes / sizeof(wchar_t));
+    }
+}
+
+std::vector<wxString> readRegistryTexts(HKEY root, const wxString& path, const wxString& name)
+{
+    std::vector<wxString> texts;
+    DWORD bytes = 0;
+    const auto query = [&](wchar_t* into) {
+        return RegGetValueW(root, path.wc_str(), name.wc_str(), RRF_RT_REG_MULTI_SZ, nullptr, into, &bytes) ==
+               ERROR_SUCCESS;
+    };
+    if (!query(nullptr))
+        return texts;
+    std::vector<wchar_t> buffer(bytes / sizeof(wchar_t) + 2);
+    if (!query(buffer.data()))
+        return texts;
+    for (const wchar_t* at = buffer.data(); *at != L'\0'; at += texts.back().length() + 1)
+        texts.emplace_back(at);
+    return texts;
+}
+
+} // namespace tavi
