@@ -1,4 +1,4 @@
-# The Windows build: the product as a library, the module, tests, stand-ins, benchmarks.
+# The Windows build: the product as a library, the module, tests, the programs that stand in for the platform, benchmarks.
 enable_language(RC)
 
 set(CMAKE_CROSSCOMPILING_EMULATOR "${CMAKE_SOURCE_DIR}/scripts/wine-run;${CMAKE_BINARY_DIR}/wineprefix")
@@ -38,6 +38,17 @@ endif()
 set_property(SOURCE src/ui/tavishell.rc APPEND PROPERTY OBJECT_DEPENDS "${resource_files}")
 target_include_directories(tavishell PRIVATE ${resource_folder})
 target_link_libraries(tavishell PRIVATE tavi_product tavi_warnings)
+
+# Built by scripts/check only: each header in a source of its own, which shows that it compiles alone.
+file(GLOB headers RELATIVE ${CMAKE_SOURCE_DIR}/src CONFIGURE_DEPENDS src/*/*.h)
+set(header_sources)
+foreach(header IN LISTS headers)
+    string(REPLACE "/" "_" name ${header})
+    file(CONFIGURE OUTPUT ${CMAKE_BINARY_DIR}/headers/${name}.cpp CONTENT "#include \"${header}\"\n")
+    list(APPEND header_sources ${CMAKE_BINARY_DIR}/headers/${name}.cpp)
+endforeach()
+add_library(tavi_headers OBJECT EXCLUDE_FROM_ALL ${header_sources})
+target_link_libraries(tavi_headers PRIVATE tavi_platform tavi_warnings)
 
 add_subdirectory(tools)
 add_subdirectory(tests)

@@ -1,16 +1,19 @@
-# Icons are drawn as SVG and rendered here, one file per icon with every size that Windows asks for.
+# Generates what src/ui/tavishell.rc includes: the version, the manifest, and one file per icon, rendered from its SVG drawing in
+# every size that Windows asks for.
 find_program(RSVG_CONVERT rsvg-convert REQUIRED)
 find_program(ICOTOOL icotool REQUIRED)
 
 set(resource_folder ${CMAKE_BINARY_DIR}/resources)
-set(resource_files ${CMAKE_SOURCE_DIR}/src/ui/module.manifest ${CMAKE_SOURCE_DIR}/src/ui/resource.h)
+file(MAKE_DIRECTORY ${resource_folder})
+configure_file(cmake/version.h.in ${resource_folder}/version.h @ONLY)
+configure_file(src/ui/module.manifest.in ${resource_folder}/module.manifest @ONLY)
+set(resource_files ${resource_folder}/module.manifest ${resource_folder}/version.h ${CMAKE_SOURCE_DIR}/src/ui/resource.h)
 # 13, 15 and 19 are check-mark sizes of menus.
 set(icon_sizes 13 15 16 19 20 24 32 40 48 64 128 256)
-file(MAKE_DIRECTORY ${resource_folder})
 file(GLOB icon_sources CONFIGURE_DEPENDS src/ui/icons/*.svg)
 foreach(source IN LISTS icon_sources)
     cmake_path(GET source STEM name)
-    # A drawing for small sizes stands beside the main one where thin strokes would blur.
+    # NAME-small.svg replaces the main drawing in small sizes, where thin strokes would blur.
     if(name MATCHES "-small$")
         continue()
     endif()
@@ -24,7 +27,7 @@ foreach(source IN LISTS icon_sources)
         endif()
         set(png ${resource_folder}/${name}-${size}.png)
         list(APPEND render COMMAND ${RSVG_CONVERT} -w ${size} -h ${size} ${from} -o ${png})
-        # The large ones stay compressed.
+        # The large ones stay compressed as PNG.
         if(size LESS 128)
             list(APPEND pngs ${png})
         else()

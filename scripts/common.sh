@@ -8,19 +8,20 @@ jobs=$(nproc)
 say() { printf '%s\n' "$*"; }
 die() { printf 'error: %s\n' "$*" >&2; exit 1; }
 
-# Package mirrors fail now and then; one more try tells a hiccup from an outage.
-once_more() { "$@" || { say "failed, trying once more: $*" >&2; sleep 5; "$@"; }; }
+# once_more COMMAND...: runs a command that uses the network, twice if need be. A second failure is no hiccup of a mirror.
+once_more() { timeout 1200 "$@" || { say "failed, trying once more: $*" >&2; sleep 5; timeout 1200 "$@"; }; }
 
-# need_packages PACKAGE...: installs what is missing, or says plainly what could not be had.
+# need_packages PACKAGE...: installs what is missing, unless TAVISHELL_INSTALL=0 declines that.
 need_packages() {
     local missing=() package
     for package in "$@"; do
         dpkg-query -W -f='${db:Status-Status}\n' "$package" 2>/dev/null | grep -q '^installed$' || missing+=("$package")
     done
     [ ${#missing[@]} -eq 0 ] && return 0
-    say "installing: ${missing[*]}"
+    [ "${TAVISHELL_INSTALL:-1}" != 0 ] || die "these system packages are missing, and TAVISHELL_INSTALL=0 declines to install them: ${missing[*]}"
+    say "installing system packages (TAVISHELL_INSTALL=0 declines this): ${missing[*]}" >&2
     dpkg --print-foreign-architectures | grep -qx i386 || dpkg --add-architecture i386
-    # The security index of i386 may be refused while the rest is fine: the install below is the real test.
+    # A mirror may refuse one index, such as i386's of the security archive, while all others are fine: the install decides.
     once_more apt-get update -q >/dev/null 2>&1 || true
     # One release for both architectures: multiarch packages must agree on their version.
     DEBIAN_FRONTEND=noninteractive once_more apt-get install -q -y -t bookworm --no-install-recommends "${missing[@]}" \

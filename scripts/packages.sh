@@ -1,8 +1,7 @@
 # What the scripts install, by use; sourced, never run.
-packages_build=(gettext ca-certificates dpkg-dev git make cmake ninja-build g++ g++-mingw-w64-i686-posix tcl pkg-config
-    googletest librsvg2-bin icoutils)
+packages_build=(dpkg-dev git make cmake ninja-build g++ g++-mingw-w64-i686-posix tcl googletest librsvg2-bin icoutils)
 packages_wine=(wine wine32:i386)
-packages_screen=(xvfb xauth imagemagick xdotool x11-utils fonts-dejavu-core fonts-liberation fonts-wine)
+packages_screen=(xvfb imagemagick xdotool fonts-dejavu-core fonts-liberation fonts-wine)
 packages_native=(clang libclang-rt-14-dev libwxgtk3.2-dev libsqlite3-dev zlib1g-dev)
-packages_lint=(clang-format clang-tidy)
+packages_lint=(clang-format clang-tidy gettext python3)
 packages_endure=(sqlite3)

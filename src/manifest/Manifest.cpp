@@ -159,7 +159,7 @@ Manifest::FileRanges Manifest::filesUnder(std::wstring_view prefix) const
     FileRange(&ranges)[4] = found.ranges;
     std::string low = toUtf8(prefix);
     between(low, low + kBehindAll, ranges[0], ranges[2]);
-    if (!prefix.empty() && isHighSurrogate(prefix.back())) {
+    if (!prefix.empty() && isHighSurrogate(static_cast<char32_t>(prefix.back()))) {
         // The prefix ends within a character: every character that begins with this half fits too.
         const std::wstring whole(prefix);
         low = toUtf8(whole + kFirstLowSurrogate);

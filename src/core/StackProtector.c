@@ -1,11 +1,11 @@
-// The runtime of the stack protector and of the fortified library calls. The compiler's own runtime asks a crypto provider for the
+// The runtime of the stack protector and of the fortified library calls. GCC's own runtime asks a crypto provider for the
 // guard, which loads libraries under the loader lock, and reports a failure to a console.
 #include <stdint.h>
 #include <windows.h>
 
 uintptr_t __stack_chk_guard = (uintptr_t)0xBB40E64E;
 
-// Runs before every other constructor. No frame of ours is active yet that holds the initial value.
+// Runs before every other constructor, when no active frame of the module holds the initial value.
 __attribute__((constructor(101), no_stack_protector)) static void seedGuard(void)
 {
     LARGE_INTEGER counter;
@@ -20,7 +20,7 @@ __attribute__((constructor(101), no_stack_protector)) static void seedGuard(void
     __stack_chk_guard = (uintptr_t)(mixed >> 32 ^ mixed);
 }
 
-// Ends the host without running a handler: its stack or heap is no longer what it was.
+// Ends the host without running a handler, since its stack or heap is corrupt.
 __attribute__((noreturn)) void __chk_fail(void)
 {
     if (IsProcessorFeaturePresent(23 /* PF_FASTFAIL_AVAILABLE */))

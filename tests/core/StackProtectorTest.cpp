@@ -16,7 +16,7 @@ volatile std::size_t tooMuch = 64;
         at[i] = 'x';
 }
 
-TEST(HardeningDeathTest, AnOverrunEndsTheHostAtOnce)
+TEST(StackProtectorDeathTest, AnOverrunEndsTheProcessAtOnce)
 {
     GTEST_FLAG_SET(death_test_style, "threadsafe");
     const testing::ExitedWithCode overrun(static_cast<int>(0xC0000409));
