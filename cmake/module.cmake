@@ -9,14 +9,19 @@ endif()
 
 include(cmake/hardening.cmake)
 
+# Flags of every Windows program; those with wxWidgets and SQLite add the libraries of tavi_platform.
+add_library(tavi_platform_flags INTERFACE)
+target_compile_definitions(tavi_platform_flags INTERFACE UNICODE _UNICODE _WIN32_WINNT=0x0600 WINVER=0x0600 NOMINMAX
+    WIN32_LEAN_AND_MEAN)
+target_compile_options(tavi_platform_flags INTERFACE -ffunction-sections -fdata-sections)
+target_link_options(tavi_platform_flags INTERFACE -static -Wl,--gc-sections -Wl,--no-insert-timestamp)
+
 add_library(tavi_platform INTERFACE)
-target_compile_definitions(tavi_platform INTERFACE UNICODE _UNICODE _WIN32_WINNT=0x0600 WINVER=0x0600 NOMINMAX
-    WIN32_LEAN_AND_MEAN __WXMSW__ wxUSE_GUI=0 wxDEBUG_LEVEL=0)
+target_compile_definitions(tavi_platform INTERFACE __WXMSW__ wxUSE_GUI=0 wxDEBUG_LEVEL=0)
 target_include_directories(tavi_platform SYSTEM INTERFACE ${TAVI_DEPS}/include)
 target_include_directories(tavi_platform INTERFACE ${CMAKE_SOURCE_DIR}/src ${CMAKE_SOURCE_DIR})
-target_compile_options(tavi_platform INTERFACE -ffunction-sections -fdata-sections)
-target_link_options(tavi_platform INTERFACE -static -Wl,--gc-sections -Wl,--enable-stdcall-fixup -Wl,--no-insert-timestamp)
-target_link_libraries(tavi_platform INTERFACE ${TAVI_DEPS}/lib/libsqlite3.a ${TAVI_DEPS}/lib/libwxbase32u.a
+target_link_options(tavi_platform INTERFACE -Wl,--enable-stdcall-fixup)
+target_link_libraries(tavi_platform INTERFACE tavi_platform_flags ${TAVI_DEPS}/lib/libsqlite3.a ${TAVI_DEPS}/lib/libwxbase32u.a
     ${TAVI_DEPS}/lib/libz.a ole32 oleaut32 uuid shlwapi shell32 advapi32 comctl32 comdlg32 gdi32 user32 version)
 
 # The DLL itself is thin: the process entry, the exports and the resources.

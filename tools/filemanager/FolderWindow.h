@@ -3,8 +3,7 @@
 #include <windows.h>
 #include <commctrl.h>
 
-#include <cstdint>
-#include <memory>
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -12,43 +11,32 @@
 
 namespace filemanager {
 
-enum ControlId : int { listControl = 1000, statusControl, addressControl, upControl };
-
-// The window with the items of one folder. Its members are for the thread that made it, but run and handle, which any
-// thread may use.
+// The window with the items of one folder. Members belong to the thread that created it; any thread may call handle().
 class FolderWindow {
   public:
-    // Runs a std::function<void()> that LPARAM points to; WPARAM TRUE hands it over.
+    // Sent by another thread: runs the std::function<void()> that LPARAM points to.
     static constexpr UINT kRunMessage = WM_APP + 1;
+    // Posted by another thread: shows the property page in LPARAM, and owns it.
+    static constexpr UINT kShowPageMessage = WM_APP + 2;
 
-    explicit FolderWindow(Output& output) : output_(output) {}
+    FolderWindow();
     FolderWindow(const FolderWindow&) = delete;
     FolderWindow& operator=(const FolderWindow&) = delete;
     ~FolderWindow();
 
-    void create();
     HWND handle() const noexcept
     {
         return window_;
     }
-    // Keys that mean the same wherever the focus is.
-    bool translate(MSG& message);
-
-    // An empty path opens the list of drives.
-    void navigate(const std::wstring& path);
-    void up();
-    void refresh();
-    void openItem(const std::wstring& name);
+    void open(const std::wstring& path);
+    // Selects the items with these names and no other.
     void select(const std::vector<std::wstring>& names);
-    void selectAll(bool selected);
-    // Prints the menu, too.
-    std::unique_ptr<ShellMenu> makeMenu(bool background);
-    void invoke(bool background, const std::wstring& text);
-    // Makes the page that a handler's class has for the selection. No identifier leads to that table, which is the
-    // first of the object.
-    HPROPSHEETPAGE makePage(const std::wstring& classId);
-    // Returns when the sheet is closed, which owns the page.
-    void showPage(HPROPSHEETPAGE page);
+    // Creates the menu of the selection, or of the background if there is none.
+    ShellMenu createMenu();
+    // Performs the command with this text of that menu.
+    void invoke(const std::wstring& text);
+    // Creates the property page that a handler's class offers for the selection.
+    HPROPSHEETPAGE createPage(const std::wstring& classId);
     // Stops the timer that has COM free unused servers.
     void stopFreeing();
 
@@ -57,46 +45,31 @@ class FolderWindow {
         IdList idList;
         std::wstring name;
         std::wstring path;
-        std::wstring type;
-        std::uint64_t size = 0;
-        FILETIME modified = {};
-        bool isFolder = false;
-        int icon = -1;
+        WIN32_FILE_ATTRIBUTE_DATA data;
+        bool isFolder;
     };
 
     static LRESULT CALLBACK procedure(HWND window, UINT message, WPARAM wParam, LPARAM lParam);
     LRESULT respond(UINT message, WPARAM wParam, LPARAM lParam);
-    void notify(NMHDR& header);
-    void command(UINT id);
     void createControls();
     void arrange();
-    int scaled(int pixels) const;
     void readItems();
-    Item readItem(IdList child) const;
-    void sort(int column);
-    void describeCell(LVITEMW& cell);
-    void activate(const Item& item);
-    std::size_t indexOf(const std::wstring& name) const;
-    int nextSelected(int after) const;
-    int chosenItem() const;
-    std::vector<LPCITEMIDLIST> selectedItems() const;
-    void setSelected(int index, UINT state);
+    void addRow(const Item& item, int row);
+    void openItem(std::size_t index);
+    int nextSelected(int after, LPARAM flags = 0) const;
+    std::vector<std::size_t> selection() const;
+    std::vector<LPCITEMIDLIST> selectedIdLists() const;
     void showMenu(POINT at);
     void perform(const ShellMenu& menu, UINT command);
-    void showStatus();
+    void showPage(HPROPSHEETPAGE page);
+    void showItemCount();
+    void showStatus(const std::wstring& text);
 
-    Output& output_;
     HWND window_ = nullptr;
     HWND list_ = nullptr;
     HWND status_ = nullptr;
-    HWND address_ = nullptr;
-    HWND up_ = nullptr;
-    HFONT font_ = nullptr;
-    HACCEL keys_ = nullptr;
     Folder folder_;
     std::vector<Item> items_;
-    int sortColumn_ = 0;
-    bool descending_ = false;
     const ShellMenu* shownMenu_ = nullptr;
 };
 

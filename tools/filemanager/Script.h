@@ -1,71 +1,56 @@
 #pragma once
 
 #include <functional>
+#include <optional>
 #include <string>
 #include <vector>
 
 #include "FolderWindow.h"
+#include "common/Commands.h"
+#include "common/Handle.h"
 
 namespace filemanager {
 
-// Plays a script against the file manager's window and against the dialogs that handlers open in this process. It runs
-// on a thread of its own, so that it can see and answer what is on screen while the window is in a menu; every wait has
-// a limit.
+// Performs the commands of the standard input on the file manager's window and on the dialogs that handlers open in
+// this process. It has a thread of its own, so that it can read and answer what is on screen while the window is in a
+// menu. The first command that fails ends the process with exit code 1. Every wait has a limit.
 class Script {
   public:
-    Script(FolderWindow& window, Output& output, std::wstring text);
+    explicit Script(FolderWindow& window);
     Script(const Script&) = delete;
     Script& operator=(const Script&) = delete;
-    ~Script();
 
-    static std::wstring commandsHelp();
-
-    void start();
-    // Called when the window is gone; the exit code of the process.
+    // Called when the window is gone; returns the exit code of the process.
     int finish();
 
   private:
-    using Arguments = std::vector<std::wstring>;
-    struct Command {
-        const wchar_t* name;
-        const wchar_t* arguments;
-        const wchar_t* help;
-        std::size_t fewest;
-        std::size_t most;
-        void (*run)(Script&, const Arguments&);
-    };
-    static const std::vector<Command>& commands();
-
-    static DWORD WINAPI threadBody(void* script);
-    void play();
-    void fail(const std::wstring& text);
-    void abandon(const std::wstring& text);
-    void runLine(const std::wstring& line);
-    void onWindow(const std::function<void()>& action);
-    void pause(DWORD duration);
-    void waitUntil(const std::function<bool()>& met, DWORD limit, const std::wstring& otherwise);
+    std::vector<tools::Command> commandTable();
+    static DWORD WINAPI threadRoutine(void* script);
+    void perform();
+    // Runs the action on the window's thread.
+    void onWindow(const std::function<void()>& action) const;
+    void pause(std::int64_t milliseconds) const;
+    void waitUntil(const std::function<bool()>& met, const std::wstring& limitMs, const std::wstring& otherwise) const;
+    // The window and the control that the first arguments of a command name.
     HWND window(const std::wstring& title) const;
-    HWND control(const std::wstring& title, const std::wstring& id) const;
-    void menu();
-    void openPage(const std::wstring& classId);
-    void watch(const std::wstring& library);
-    void unload(const Arguments& arguments);
-    void repeat(const Arguments& arguments);
+    HWND control(const tools::Arguments& arguments) const;
+    void printMenu() const;
+    void openPage(const std::wstring& classId) const;
+    void watch(const std::wstring& library) const;
+    void unload(const tools::Arguments& arguments) const;
     void hold(const std::wstring& classId);
-    void retry(const Arguments& arguments);
-    void tryLine(const std::wstring& line);
-    void expect(const Arguments& texts, bool present);
+    void retry(const tools::Arguments& arguments) const;
+    std::optional<std::wstring> failureOf(const std::wstring& line) const;
 
     FolderWindow& folder_;
-    HWND owner_ = nullptr;
-    Output& output_;
-    std::wstring text_;
-    HANDLE stop_;
-    HANDLE thread_ = nullptr;
-    std::vector<IUnknown*> held_;
-    int lineNumber_ = 0;
+    const HWND owner_;
+    tools::Commands commands_;
+    tools::Handle stop_ = tools::createEvent();
+    std::vector<ComPtr<IUnknown>> held_;
+    // Written and read on the script's thread; failed_ is read after that thread has ended, too.
     bool ended_ = false;
     bool failed_ = false;
+    tools::Handle thread_;
 };
 
 } // namespace filemanager

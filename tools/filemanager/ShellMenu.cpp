@@ -3,47 +3,24 @@
 #include <algorithm>
 #include <chrono>
 
+#include "common/Text.h"
+
 namespace filemanager {
 namespace {
 
-constexpr UINT kLastCommand = 0x7FFF;
+constexpr UINT kLastHandlerCommand = 0x7FFF;
 
-struct OwnItem {
-    OwnCommand command;
-    UINT flags;
-    const wchar_t* text;
-    const wchar_t* help;
-};
-constexpr OwnItem kOwnItems[] = {
-    {openCommand, MF_STRING, L"&Open", L"Opens the selected item."},
-    {refreshCommand, MF_STRING, L"R&efresh", L"Reads the folder again."},
-    {selectAllCommand, MF_STRING, L"Select &All", L"Selects every item of the folder."},
-    {propertiesCommand, MF_STRING | MF_GRAYED, L"P&roperties", L"Shows the properties of the selected items."},
-};
-
-const OwnItem* findOwnItem(UINT command)
-{
-    const auto found = std::find_if(std::begin(kOwnItems), std::end(kOwnItems),
-                                    [command](const OwnItem& item) { return item.command == command; });
-    return found == std::end(kOwnItems) ? nullptr : found;
-}
-
-// The classes of HKEY_CLASSES_ROOT whose handlers the shell asks, by what was clicked.
-std::vector<const wchar_t*> classesOf(MenuTarget target, const Folder& folder)
+// Returns the classes of HKEY_CLASSES_ROOT whose handlers the shell asks.
+std::vector<const wchar_t*> classesOf(MenuTarget target)
 {
     switch (target) {
     case MenuTarget::file:
         return {L"*", L"AllFilesystemObjects"};
     case MenuTarget::folder:
         return {L"AllFilesystemObjects", L"Directory", L"Folder"};
-    case MenuTarget::drive:
-        return {L"Drive", L"Folder"};
     case MenuTarget::background:
         break;
     }
-    // The list of drives is no directory.
-    if (folder.path.empty())
-        return {};
     return {L"Directory\\Background"};
 }
 
@@ -55,13 +32,13 @@ struct KeyCloser {
 };
 using Key = std::unique_ptr<std::remove_pointer_t<HKEY>, KeyCloser>;
 
-Key openKey(HKEY parent, const wchar_t* name)
+Key openKey(HKEY parent, const std::wstring& name)
 {
     HKEY key = nullptr;
-    return Key(RegOpenKeyExW(parent, name, 0, KEY_READ, &key) == ERROR_SUCCESS ? key : nullptr);
+    return Key(RegOpenKeyExW(parent, name.c_str(), 0, KEY_READ, &key) == ERROR_SUCCESS ? key : nullptr);
 }
 
-// A handler's key names its class in its default value, or is named after it.
+// A handler's key has the class identifier as its default value or as its name.
 bool handlerClass(HKEY handlers, const wchar_t* name, CLSID& clsid)
 {
     wchar_t value[64] = L"";
@@ -71,78 +48,67 @@ bool handlerClass(HKEY handlers, const wchar_t* name, CLSID& clsid)
            SUCCEEDED(CLSIDFromString(name, &clsid));
 }
 
-MENUITEMINFOW itemInfo(HMENU menu, UINT position, wchar_t* text, UINT capacity)
-{
+struct MenuItem {
     MENUITEMINFOW info = {};
-    info.cbSize = sizeof info;
-    info.fMask = MIIM_FTYPE | MIIM_ID | MIIM_STATE | MIIM_STRING | MIIM_CHECKMARKS | MIIM_BITMAP;
-    info.dwTypeData = text;
-    info.cch = capacity;
-    GetMenuItemInfoW(menu, position, TRUE, &info);
-    return info;
+    std::wstring text;
+};
+
+MenuItem itemAt(HMENU menu, UINT position)
+{
+    wchar_t text[256] = L"";
+    MenuItem item;
+    item.info.cbSize = sizeof item.info;
+    item.info.fMask = MIIM_FTYPE | MIIM_ID | MIIM_STATE | MIIM_STRING | MIIM_CHECKMARKS;
+    item.info.dwTypeData = text;
+    item.info.cch = 256;
+    GetMenuItemInfoW(menu, position, TRUE, &item.info);
+    item.text = text;
+    item.text.erase(std::remove(item.text.begin(), item.text.end(), L'&'), item.text.end());
+    return item;
 }
 
-std::wstring withoutMnemonic(const wchar_t* text)
+std::wstring hexCode(HRESULT result)
 {
-    std::wstring plain;
-    for (; *text; ++text) {
-        if (*text == L'&' && *++text == L'\0')
-            break;
-        plain += *text;
-    }
-    return plain;
+    wchar_t text[16];
+    wsprintfW(text, L"0x%08x", static_cast<unsigned>(result));
+    return text;
 }
 
 } // namespace
 
+void check(HRESULT result, const std::wstring& what)
+{
+    if (FAILED(result))
+        throw tools::Failure{what + L": " + hexCode(result)};
+}
+
 ComPtr<IDataObject> dataObject(HWND owner, const Folder& folder, std::vector<LPCITEMIDLIST> items)
 {
     ComPtr<IDataObject> data;
-    const HRESULT result =
-        folder.object->GetUIObjectOf(owner, static_cast<UINT>(items.size()), items.data(), IID_IDataObject, nullptr,
-                                     reinterpret_cast<void**>(data.GetAddressOf()));
-    if (FAILED(result))
-        throw Failure{L"no data object for the selection: " + hexCode(result)};
+    check(folder.object->GetUIObjectOf(owner, static_cast<UINT>(items.size()), items.data(), IID_IDataObject, nullptr,
+                                       reinterpret_cast<void**>(data.GetAddressOf())),
+          L"no data object for the selection");
     return data;
 }
 
-ShellMenu::ShellMenu(HWND owner, const Folder& folder, MenuTarget target, const std::vector<LPCITEMIDLIST>& items,
-                     Output& output)
-    : popup_(nullptr), output_(output)
+ShellMenu::ShellMenu(HWND owner, const Folder& folder, MenuTarget target, const std::vector<LPCITEMIDLIST>& items)
 {
     const bool onBackground = target == MenuTarget::background;
-    ComPtr<IDataObject> data;
-    if (!onBackground)
-        data = dataObject(owner, folder, items);
+    const auto data = onBackground ? ComPtr<IDataObject>() : dataObject(owner, folder, items);
     popup_ = CreatePopupMenu();
     if (onBackground) {
-        append(refreshCommand);
-        append(selectAllCommand);
+        AppendMenuW(popup_, MF_STRING, kRefreshCommand, L"R&efresh");
     } else {
-        append(openCommand);
-        SetMenuDefaultItem(popup_, openCommand, FALSE);
+        AppendMenuW(popup_, MF_STRING, kOpenCommand, L"&Open");
+        SetMenuDefaultItem(popup_, kOpenCommand, FALSE);
     }
-
     const auto start = std::chrono::steady_clock::now();
-    std::vector<CLSID> seen;
-    for (const wchar_t* const className : classesOf(target, folder)) {
-        const Key classKey = openKey(HKEY_CLASSES_ROOT, className);
-        const Key handlers = classKey ? openKey(classKey.get(), L"shellex\\ContextMenuHandlers") : nullptr;
-        wchar_t name[256];
-        for (DWORD index = 0; handlers && RegEnumKeyW(handlers.get(), index, name, 256) == ERROR_SUCCESS; ++index) {
-            CLSID clsid;
-            if (!handlerClass(handlers.get(), name, clsid) || std::find(seen.begin(), seen.end(), clsid) != seen.end())
-                continue;
-            seen.push_back(clsid);
-            addHandler(clsid, classKey.get(), onBackground ? &folder : nullptr, data.Get());
-        }
-    }
+    addHandlers(target, folder, data.Get());
     handlerMicroseconds_ =
         std::chrono::duration_cast<std::chrono::microseconds>(std::chrono::steady_clock::now() - start).count();
-
     AppendMenuW(popup_, MF_SEPARATOR, 0, nullptr);
-    append(propertiesCommand);
-    removeSpareSeparators();
+    AppendMenuW(popup_, MF_STRING | MF_GRAYED, kPropertiesCommand, L"P&roperties");
+    removeDoubleSeparators();
 }
 
 ShellMenu::~ShellMenu()
@@ -150,24 +116,39 @@ ShellMenu::~ShellMenu()
     DestroyMenu(popup_);
 }
 
-void ShellMenu::addHandler(REFCLSID clsid, HKEY classKey, const Folder* background, IDataObject* data)
+void ShellMenu::addHandlers(MenuTarget target, const Folder& folder, IDataObject* data)
 {
-    wchar_t name[64] = L"";
-    StringFromGUID2(clsid, name, 64);
+    std::vector<CLSID> seen;
+    for (const wchar_t* const className : classesOf(target)) {
+        const Key classKey = openKey(HKEY_CLASSES_ROOT, className);
+        const Key handlers = openKey(HKEY_CLASSES_ROOT, className + std::wstring(L"\\shellex\\ContextMenuHandlers"));
+        wchar_t name[256];
+        for (DWORD index = 0; handlers && RegEnumKeyW(handlers.get(), index, name, 256) == ERROR_SUCCESS; ++index) {
+            CLSID clsid;
+            if (!handlerClass(handlers.get(), name, clsid) || std::find(seen.begin(), seen.end(), clsid) != seen.end())
+                continue;
+            seen.push_back(clsid);
+            // The shell passes the folder for a background only; elsewhere the data object is enough.
+            addHandler(clsid, classKey.get(), data ? nullptr : folder.idList.get(), data);
+        }
+    }
+}
+
+void ShellMenu::addHandler(REFCLSID clsid, HKEY classKey, LPCITEMIDLIST folder, IDataObject* data)
+{
     ComPtr<IShellExtInit> handler;
+    ComPtr<IContextMenu> menu;
     HRESULT result = CoCreateInstance(clsid, nullptr, CLSCTX_INPROC_SERVER, IID_IShellExtInit,
                                       reinterpret_cast<void**>(handler.GetAddressOf()));
-    // The shell names the folder for a background only: elsewhere the data object says it all.
     if (SUCCEEDED(result))
-        result = handler->Initialize(background ? background->idList.get() : nullptr, data, classKey);
-    ComPtr<IContextMenu> menu;
+        result = handler->Initialize(folder, data, classKey);
     if (SUCCEEDED(result))
         result = handler.CopyTo(IID_IContextMenu, reinterpret_cast<void**>(menu.GetAddressOf()));
     if (SUCCEEDED(result))
-        result = menu->QueryContextMenu(popup_, static_cast<UINT>(GetMenuItemCount(popup_)), nextCommand_, kLastCommand,
-                                        CMF_EXPLORE);
+        result = menu->QueryContextMenu(popup_, static_cast<UINT>(GetMenuItemCount(popup_)), nextCommand_,
+                                        kLastHandlerCommand, CMF_EXPLORE);
     if (FAILED(result)) {
-        output_.error(L"handler " + std::wstring(name) + L" failed: " + hexCode(result));
+        tools::printError(L"a handler failed: " + hexCode(result));
         return;
     }
     const auto count = static_cast<UINT>(HRESULT_CODE(result));
@@ -175,78 +156,59 @@ void ShellMenu::addHandler(REFCLSID clsid, HKEY classKey, const Folder* backgrou
     nextCommand_ += count;
 }
 
-void ShellMenu::append(UINT command)
+// A handler begins its part with a separator even if nothing follows it.
+void ShellMenu::removeDoubleSeparators()
 {
-    const OwnItem& item = *findOwnItem(command);
-    AppendMenuW(popup_, item.flags, item.command, item.text);
-}
-
-void ShellMenu::removeSpareSeparators()
-{
-    const auto isSeparator = [this](int at) {
-        return (GetMenuState(popup_, static_cast<UINT>(at), MF_BYPOSITION) & MF_SEPARATOR) != 0;
-    };
-    for (int at = GetMenuItemCount(popup_) - 1; at >= 0; --at) {
-        const bool last = at == GetMenuItemCount(popup_) - 1;
-        if (isSeparator(at) && (at == 0 || last || isSeparator(at + 1)))
-            RemoveMenu(popup_, static_cast<UINT>(at), MF_BYPOSITION);
+    const auto isSeparator = [this](UINT at) { return (GetMenuState(popup_, at, MF_BYPOSITION) & MF_SEPARATOR) != 0; };
+    for (auto at = static_cast<UINT>(GetMenuItemCount(popup_)) - 1; at > 0; --at) {
+        if (isSeparator(at) && isSeparator(at - 1))
+            RemoveMenu(popup_, at, MF_BYPOSITION);
     }
 }
 
-std::vector<std::wstring> ShellMenu::describe() const
+void ShellMenu::print() const
 {
-    std::vector<std::wstring> lines;
+    tools::print(L"menu:");
     const auto count = static_cast<UINT>(GetMenuItemCount(popup_));
     for (UINT at = 0; at < count; ++at) {
-        wchar_t text[256] = L"";
-        const MENUITEMINFOW info = itemInfo(popup_, at, text, 256);
-        if (info.fType & MFT_SEPARATOR) {
-            lines.emplace_back(L"--------");
-            continue;
-        }
-        std::wstring line = withoutMnemonic(text);
+        const auto [info, text] = itemAt(popup_, at);
+        std::wstring line = info.fType & MFT_SEPARATOR ? L"  --------" : L"  " + text;
         if (info.fState & MFS_GRAYED)
             line += L" [greyed]";
-        if (info.hbmpUnchecked || info.hbmpItem)
+        if (info.hbmpUnchecked)
             line += L" [bitmap]";
         if (const auto verb = commandString(info.wID, GCS_VERBW); !verb.empty())
             line += L" verb=" + verb;
         if (const auto help = helpText(info.wID); !help.empty())
             line += L" help=\"" + help + L"\"";
-        lines.push_back(line);
+        tools::print(line);
     }
-    return lines;
 }
 
 UINT ShellMenu::findText(const std::wstring& text) const
 {
     const auto count = static_cast<UINT>(GetMenuItemCount(popup_));
     for (UINT at = 0; at < count; ++at) {
-        wchar_t found[256] = L"";
-        const MENUITEMINFOW info = itemInfo(popup_, at, found, 256);
-        if (!(info.fType & MFT_SEPARATOR) && !(info.fState & MFS_GRAYED) && withoutMnemonic(found) == text)
-            return info.wID;
+        if (const MenuItem item = itemAt(popup_, at); item.text == text && !(item.info.fState & MFS_GRAYED))
+            return item.info.wID;
     }
     return 0;
 }
 
 std::wstring ShellMenu::helpText(UINT command) const
 {
-    const OwnItem* const own = findOwnItem(command);
-    return own ? own->help : commandString(command, GCS_HELPTEXTW);
+    return commandString(command, GCS_HELPTEXTW);
 }
 
-HRESULT ShellMenu::invoke(UINT command, HWND owner) const
+void ShellMenu::invoke(UINT command, HWND owner) const
 {
     const Handler* const handler = handlerOf(command);
-    if (!handler)
-        return E_INVALIDARG;
     CMINVOKECOMMANDINFO info = {};
     info.cbSize = sizeof info;
     info.hwnd = owner;
-    info.lpVerb = MAKEINTRESOURCEA(command - handler->first);
+    info.lpVerb = handler ? MAKEINTRESOURCEA(command - handler->first) : nullptr;
     info.nShow = SW_SHOWNORMAL;
-    return handler->menu->InvokeCommand(&info);
+    check(handler ? handler->menu->InvokeCommand(&info) : E_INVALIDARG, L"the command was not performed");
 }
 
 const ShellMenu::Handler* ShellMenu::handlerOf(UINT command) const

@@ -8,8 +8,6 @@
 #include <string>
 #include <vector>
 
-#include "Output.h"
-
 namespace filemanager {
 
 using Microsoft::WRL::ComPtr;
@@ -22,31 +20,30 @@ struct IdListDeleter {
 };
 using IdList = std::unique_ptr<std::remove_pointer_t<LPITEMIDLIST>, IdListDeleter>;
 
-// An open folder; the path is empty for the list of drives.
 struct Folder {
     IdList idList;
     ComPtr<IShellFolder> object;
     std::wstring path;
 };
 
-enum class MenuTarget { file, folder, drive, background };
+enum class MenuTarget { file, folder, background };
 
-enum OwnCommand : UINT {
-    openCommand = 1,
-    refreshCommand,
-    selectAllCommand,
-    propertiesCommand,
-    firstHandlerCommand = 0x100
-};
+// The file manager's own items. Handlers get the numbers from kFirstHandlerCommand on.
+constexpr UINT kOpenCommand = 1;
+constexpr UINT kRefreshCommand = 2;
+constexpr UINT kPropertiesCommand = 3;
+constexpr UINT kFirstHandlerCommand = 0x100;
+
+// Throws a Failure of `what` with the code, unless the result is a success.
+void check(HRESULT result, const std::wstring& what);
 
 ComPtr<IDataObject> dataObject(HWND owner, const Folder& folder, std::vector<LPCITEMIDLIST> items);
 
-// One context menu: a few items of our own and what the handlers registered for the target put into it. It lives as
-// long as the menu is on screen; the handlers are released with it.
+// One context menu: the file manager's own items and those of the handlers that are registered for the target. The
+// handlers are released with the menu.
 class ShellMenu {
   public:
-    ShellMenu(HWND owner, const Folder& folder, MenuTarget target, const std::vector<LPCITEMIDLIST>& items,
-              Output& output);
+    ShellMenu(HWND owner, const Folder& folder, MenuTarget target, const std::vector<LPCITEMIDLIST>& items);
     ShellMenu(const ShellMenu&) = delete;
     ShellMenu& operator=(const ShellMenu&) = delete;
     ~ShellMenu();
@@ -55,18 +52,18 @@ class ShellMenu {
     {
         return popup_;
     }
-    // One line for each item: text, bitmap, verb, help text.
-    std::vector<std::wstring> describe() const;
-    // The command of the item with that text (accelerator marks left out), 0 if there is none.
+    // Prints "menu:" and one line for each item: text, bitmap, verb, help text.
+    void print() const;
+    // Returns the command of the item with that text, without accelerator marks, or 0.
     UINT findText(const std::wstring& text) const;
     std::wstring helpText(UINT command) const;
-    // What the handlers took to make their part of the menu.
+    // The time that the handlers took to create their part of the menu.
     long long handlerMicroseconds() const noexcept
     {
         return handlerMicroseconds_;
     }
-    // Hands a command of a handler to it.
-    HRESULT invoke(UINT command, HWND owner) const;
+    // Has the handler of the command perform it.
+    void invoke(UINT command, HWND owner) const;
 
   private:
     struct Handler {
@@ -75,16 +72,15 @@ class ShellMenu {
         UINT count;
     };
 
-    void addHandler(REFCLSID clsid, HKEY classKey, const Folder* background, IDataObject* data);
-    void append(UINT command);
-    void removeSpareSeparators();
+    void addHandlers(MenuTarget target, const Folder& folder, IDataObject* data);
+    void addHandler(REFCLSID clsid, HKEY classKey, LPCITEMIDLIST folder, IDataObject* data);
+    void removeDoubleSeparators();
     const Handler* handlerOf(UINT command) const;
     std::wstring commandString(UINT command, UINT type) const;
 
-    HMENU popup_;
-    Output& output_;
+    HMENU popup_ = nullptr;
     std::vector<Handler> handlers_;
-    UINT nextCommand_ = firstHandlerCommand;
+    UINT nextCommand_ = kFirstHandlerCommand;
     long long handlerMicroseconds_ = 0;
 };
 

@@ -1,230 +1,99 @@
 #include "Backup.h"
 
 #include <windows.h>
-#include <shlwapi.h>
 
 #include <algorithm>
+#include <cwchar>
 #include <ctime>
+#include <filesystem>
 #include <map>
-#include <set>
 
-#include "ContentStore.h"
 #include "Database.h"
 #include "History.h"
-#include "StoredManifest.h"
-#include "Text.h"
+#include "Installation.h"
+#include "Manifest.h"
+#include "common/Text.h"
 
 namespace service {
 namespace {
 
-// The state that the extension knows a backed-up folder by.
+// The state of a backed-up folder in the configuration database.
 constexpr std::int64_t kBackedUpState = 6;
+// The path in the manifest whose versions are the runs.
+constexpr wchar_t kRunsPath[] = L"simple.map";
 
 std::uint64_t ticks(const FILETIME& time)
 {
     return std::uint64_t{time.dwHighDateTime} << 32 | time.dwLowDateTime;
 }
 
-std::wstring join(const std::wstring& folder, const std::wstring& name)
+// Returns the version of the file as it is now, without content.
+Version describe(const std::wstring& path, std::int64_t time)
 {
-    return folder.back() == L'\\' ? folder + name : folder + L"\\" + name;
+    WIN32_FILE_ATTRIBUTE_DATA data = {};
+    if (!GetFileAttributesExW(path.c_str(), GetFileExInfoStandard, &data))
+        throw tools::systemFailure(path, GetLastError());
+    Version version;
+    version.time = time;
+    version.size = static_cast<std::int64_t>(std::uint64_t{data.nFileSizeHigh} << 32 | data.nFileSizeLow);
+    version.modified = ticks(data.ftLastWriteTime);
+    version.created = ticks(data.ftCreationTime);
+    version.attributes = data.dwFileAttributes;
+    return version;
 }
 
-// A folder as the shell would spell it: the drive's letter in upper case, every name as it is on the disk.
-std::wstring spelledFolder(const std::wstring& given)
+// The service names contents by run and number, since nobody looks for equal ones.
+std::wstring contentName(std::int64_t time, std::size_t number)
 {
-    wchar_t full[MAX_PATH];
-    const DWORD length = GetFullPathNameW(given.c_str(), MAX_PATH, full, nullptr);
-    if (length == 0 || length >= MAX_PATH || !PathIsDirectoryW(full))
-        throw Failure{L"no such folder: " + given};
-    if (full[1] == L':')
-        CharUpperBuffW(full, 1);
-    if (!PathIsRootW(full))
-        PathRemoveBackslashW(full);
-    const wchar_t* rest = PathSkipRootW(full);
-    std::wstring path(static_cast<const wchar_t*>(full), rest);
-    while (*rest) {
-        const wchar_t* const end = rest + std::wcscspn(rest, L"\\");
-        WIN32_FIND_DATAW data;
-        const HANDLE search = FindFirstFileW(longPath(join(path, std::wstring(rest, end))).c_str(), &data);
-        if (search == INVALID_HANDLE_VALUE)
-            throw systemFailure(given, GetLastError());
-        FindClose(search);
-        path = join(path, data.cFileName);
-        rest = *end ? end + 1 : end;
-    }
-    return path;
+    wchar_t name[41];
+    std::swprintf(name, 41, L"%032llx%08x", static_cast<unsigned long long>(time), static_cast<unsigned>(number));
+    return name;
 }
 
-class Run {
-  public:
-    Run(const Installation& installation, std::int64_t time, std::map<std::wstring, Version> former)
-        : installation_(installation), store_(installation.storeFolder()), time_(time), former_(std::move(former))
-    {
-    }
-
-    void visit(const std::wstring& folder)
-    {
-        // The store would grow by itself at every run.
-        if (lstrcmpiW(folder.c_str(), installation_.folder.c_str()) == 0)
-            return;
-        WIN32_FIND_DATAW data;
-        const HANDLE search = FindFirstFileW(longPath(join(folder, L"*")).c_str(), &data);
-        if (search == INVALID_HANDLE_VALUE) {
-            skip(folder, systemFailure(folder, GetLastError()));
-            return;
-        }
-        std::vector<std::wstring> folders;
-        do {
-            const std::wstring name = data.cFileName;
-            // A link may lead out of the folder or round in a circle.
-            if (name == L"." || name == L".." || (data.dwFileAttributes & FILE_ATTRIBUTE_REPARSE_POINT))
-                continue;
-            if (data.dwFileAttributes & FILE_ATTRIBUTE_DIRECTORY)
-                folders.push_back(join(folder, name));
-            else
-                visitFile(join(folder, name), data);
-        } while (FindNextFileW(search, &data));
-        FindClose(search);
-        for (const std::wstring& inner : folders)
-            visit(inner);
-    }
-
-    // After the last visit.
-    void findVanished(const std::vector<std::wstring>& roots)
-    {
-        for (const auto& [path, version] : former_) {
-            if (version.size == kDeletedSize || seen_.count(path) || !isUnder(path, roots) || isUnder(path, skipped_))
-                continue;
-            versions_[path].time = time_;
-            ++deleted_;
-        }
-    }
-
-    void addRunItself()
-    {
-        std::wstring list;
-        for (const auto& [path, version] : former_) {
-            if (path != kRunsPath && !versions_.count(path) && version.size != kDeletedSize)
-                list += version.content + L" " + path + L"\n";
-        }
-        for (const auto& [path, version] : versions_) {
-            if (version.size != kDeletedSize)
-                list += version.content + L" " + path + L"\n";
-        }
-        const ContentStore::Content content = store_.addBytes(toUtf8(list));
-        FILETIME now;
-        GetSystemTimeAsFileTime(&now);
-        versions_[kRunsPath] = {time_, content.size, ticks(now), ticks(now), 0, content.hash};
-    }
-
-    const std::map<std::wstring, Version>& versions() const
-    {
-        return versions_;
-    }
-    bool complete() const
-    {
-        return skipped_.empty();
-    }
-    std::wstring summary() const
-    {
-        const auto count = [](std::size_t number, const wchar_t* what) {
-            return std::to_wstring(number) + L" " + what;
-        };
-        return count(seen_.size(), L"files, ") + count(added_, L"new, ") + count(changed_, L"changed, ") +
-               count(deleted_, L"deleted, ") + count(skipped_.size(), L"not read\n");
-    }
-
-  private:
-    static bool isUnder(const std::wstring& path, const std::vector<std::wstring>& roots)
-    {
-        return std::any_of(roots.begin(), roots.end(), [&](const std::wstring& root) {
-            const std::wstring inside = join(root, L"");
-            return path == root || path.compare(0, inside.size(), inside) == 0;
-        });
-    }
-
-    void visitFile(const std::wstring& path, const WIN32_FIND_DATAW& data)
-    {
-        // A folder may be given twice, or beside one that it lies in.
-        if (!seen_.insert(path).second)
-            return;
-        Version version;
-        version.time = time_;
-        version.modified = ticks(data.ftLastWriteTime);
-        version.created = ticks(data.ftCreationTime);
-        version.attributes = data.dwFileAttributes;
-        const auto size = static_cast<std::int64_t>(std::uint64_t{data.nFileSizeHigh} << 32 | data.nFileSizeLow);
-        const auto former = former_.find(path);
-        const bool isNew = former == former_.end() || former->second.size == kDeletedSize;
-        if (!isNew && former->second.size == size && former->second.modified == version.modified &&
-            former->second.attributes == version.attributes)
-            return;
-        try {
-            ContentStore::Content content = store_.addFile(path);
-            version.size = content.size;
-            version.content = std::move(content.hash);
-        } catch (const Failure& failure) {
-            skip(path, failure);
-            return;
-        }
-        versions_.emplace(path, std::move(version));
-        ++(isNew ? added_ : changed_);
-    }
-
-    void skip(const std::wstring& path, const Failure& failure)
-    {
-        printError(L"skipped " + failure.text + L"\n");
-        skipped_.push_back(path);
-    }
-
-    const Installation& installation_;
-    ContentStore store_;
-    std::int64_t time_;
-    std::map<std::wstring, Version> former_;
-    std::map<std::wstring, Version> versions_;
-    std::set<std::wstring> seen_;
-    std::vector<std::wstring> skipped_;
-    std::size_t added_ = 0;
-    std::size_t changed_ = 0;
-    std::size_t deleted_ = 0;
-};
+Version versionOfRun(std::int64_t time)
+{
+    FILETIME now;
+    GetSystemTimeAsFileTime(&now);
+    return {time, 0, ticks(now), ticks(now), 0, contentName(time, 0)};
+}
 
 } // namespace
 
-bool backUp(const Installation& installation, const std::vector<std::wstring>& folders,
-            std::optional<std::int64_t> time)
+void backUp(const std::wstring& folder, std::optional<std::int64_t> time)
 {
-    std::vector<std::wstring> roots;
-    for (const std::wstring& folder : folders)
-        roots.push_back(spelledFolder(folder));
-
+    const Installation installation = findInstallation();
     History history(installation);
-    // Versions stand in the manifest oldest first, each with a time of its own.
-    const std::int64_t last = history.lastRun();
-    if (time && *time <= last)
-        throw Failure{L"there is already a run at " + std::to_wstring(last)};
-    const std::int64_t now = time.value_or(std::max<std::int64_t>(std::time(nullptr), last + 1));
+    // Two versions of a file never have the same time.
+    const std::int64_t now = time.value_or(std::max<std::int64_t>(std::time(nullptr), history.lastRun() + 1));
+    std::map<std::wstring, Version> former = history.newest();
+    std::map<std::wstring, Version> versions = {{kRunsPath, versionOfRun(now)}};
 
-    Run run(installation, now, history.newest());
-    for (const std::wstring& root : roots)
-        run.visit(root);
-    run.findVanished(roots);
-    run.addRunItself();
-    history.addRun(run.versions());
+    for (const auto& entry : std::filesystem::recursive_directory_iterator(folder)) {
+        if (!entry.is_regular_file())
+            continue;
+        const std::wstring path = entry.path().wstring();
+        Version version = describe(path, now);
+        const Version before = former[path];
+        former.erase(path);
+        if (before.size == version.size && before.modified == version.modified)
+            continue;
+        version.content = contentName(now, versions.size());
+        std::filesystem::copy_file(path, installation.contentFile(version.content));
+        versions[path] = std::move(version);
+    }
+    for (const auto& [path, version] : former) {
+        if (version.size != kDeletedSize && path.compare(0, folder.size() + 1, folder + L"\\") == 0)
+            versions[path].time = now;
+    }
+    history.addRun(versions);
 
     Database configuration(installation.configDatabase());
-    Transaction transaction(configuration);
-    Statement insert(configuration, "INSERT OR REPLACE INTO filesystem(state, folder) VALUES(?,?)");
-    for (const std::wstring& root : roots)
-        insert.bind(1, kBackedUpState).bind(2, root).next();
-    transaction.commit();
-
-    Database state(installation.stateDatabase());
-    writeManifest(state, history.manifestText());
-    announceManifest();
-    print(L"run " + std::to_wstring(now) + L": " + run.summary());
-    return run.complete();
+    Statement(configuration, "INSERT OR REPLACE INTO filesystem(state, folder) VALUES(?,?)")
+        .bind(1, kBackedUpState)
+        .bind(2, folder)
+        .next();
+    publishManifest(installation, history);
+    tools::print(L"run " + std::to_wstring(now) + L": " + std::to_wstring(versions.size() - 1) + L" files changed");
 }
 
 } // namespace service

@@ -3,15 +3,11 @@
 #include <cstdint>
 #include <optional>
 #include <string>
-#include <vector>
-
-#include "Installation.h"
 
 namespace service {
 
-// One run over these folders: stores what is new or changed, records what has vanished, publishes the manifest. `time`
-// stands for the present when given. False when some file could not be read; it keeps the versions it has.
-bool backUp(const Installation& installation, const std::vector<std::wstring>& folders,
-            std::optional<std::int64_t> time);
+// Runs one backup of a folder: stores new and changed files, records deleted ones, publishes the manifest. `time`, in
+// seconds since 1970, replaces the present. Throws if a file cannot be read.
+void backUp(const std::wstring& folder, std::optional<std::int64_t> time);
 
 } // namespace service

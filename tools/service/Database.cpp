@@ -1,27 +1,27 @@
 #include "Database.h"
 
-#include "Text.h"
+#include "common/Text.h"
 
 namespace service {
 namespace {
 
-constexpr int kBusyMilliseconds = 60000;
+constexpr int kBusyMs = 60000;
 
 [[noreturn]] void fail(sqlite3* handle)
 {
-    throw Failure{L"database: " + fromUtf8(sqlite3_errmsg(handle))};
+    throw tools::Failure{L"database: " + tools::fromUtf8(sqlite3_errmsg(handle))};
 }
 
 } // namespace
 
 Database::Database(const std::wstring& path)
 {
-    if (sqlite3_open(toUtf8(path).c_str(), &handle_) != SQLITE_OK) {
-        const Failure failure{path + L": " + fromUtf8(sqlite3_errmsg(handle_))};
+    if (sqlite3_open(tools::toUtf8(path).c_str(), &handle_) != SQLITE_OK) {
+        const tools::Failure failure{path + L": " + tools::fromUtf8(sqlite3_errmsg(handle_))};
         sqlite3_close(handle_);
         throw failure;
     }
-    sqlite3_busy_timeout(handle_, kBusyMilliseconds);
+    sqlite3_busy_timeout(handle_, kBusyMs);
 }
 
 Database::~Database()
@@ -76,7 +76,7 @@ Statement& Statement::bind(int parameter, std::int64_t value)
 
 Statement& Statement::bind(int parameter, std::wstring_view text)
 {
-    const std::string bytes = toUtf8(text);
+    const std::string bytes = tools::toUtf8(text);
     check(sqlite3_bind_text(handle_, parameter, bytes.data(), static_cast<int>(bytes.size()), SQLITE_TRANSIENT));
     return *this;
 }
@@ -96,16 +96,6 @@ bool Statement::next()
     return false;
 }
 
-int Statement::columns() const
-{
-    return sqlite3_column_count(handle_);
-}
-
-std::wstring Statement::columnName(int column) const
-{
-    return fromUtf8(sqlite3_column_name(handle_, column));
-}
-
 std::int64_t Statement::integer(int column) const
 {
     return sqlite3_column_int64(handle_, column);
@@ -113,13 +103,8 @@ std::int64_t Statement::integer(int column) const
 
 std::wstring Statement::text(int column) const
 {
-    return fromUtf8(blob(column));
-}
-
-std::string Statement::blob(int column) const
-{
     const auto* const bytes = static_cast<const char*>(sqlite3_column_blob(handle_, column));
-    return bytes ? std::string(bytes, static_cast<std::size_t>(sqlite3_column_bytes(handle_, column))) : std::string();
+    return bytes ? tools::fromUtf8({bytes, static_cast<std::size_t>(sqlite3_column_bytes(handle_, column))}) : L"";
 }
 
 } // namespace service

@@ -25,7 +25,7 @@ class Database {
     sqlite3* handle_ = nullptr;
 };
 
-// Undone at the end of its life unless committed.
+// The destructor undoes it unless it was committed.
 class Transaction {
   public:
     explicit Transaction(Database& database);
@@ -51,14 +51,11 @@ class Statement {
     Statement& bind(int parameter, std::int64_t value);
     Statement& bind(int parameter, std::wstring_view text);
     Statement& bindBlob(int parameter, std::string_view bytes);
-    // Steps once; true on a row. After the last row the statement may be bound and run again.
+    // Returns false after the last row; the statement may then be bound and run again.
     bool next();
 
-    int columns() const;
-    std::wstring columnName(int column) const;
     std::int64_t integer(int column) const;
     std::wstring text(int column) const;
-    std::string blob(int column) const;
 
   private:
     void check(int result) const;

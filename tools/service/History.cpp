@@ -1,15 +1,9 @@
 #include "History.h"
 
-#include <algorithm>
-#include <cinttypes>
-#include <cstdio>
-
-#include "ContentStore.h"
-#include "Text.h"
-
 namespace service {
 namespace {
 
+// Reads the columns of the table behind the path.
 Version readVersion(const Statement& row)
 {
     return {row.integer(1),
@@ -20,26 +14,7 @@ Version readVersion(const Statement& row)
             row.text(6)};
 }
 
-std::string patchLine(const Version& version)
-{
-    char numbers[160];
-    std::snprintf(numbers, sizeof numbers, "%" PRId64 ":%" PRIu32 ":%" PRIu32 ":%" PRId64 ":0:", version.time,
-                  unixSeconds(version.modified), unixSeconds(version.created), version.size);
-    char attributes[32];
-    std::snprintf(attributes, sizeof attributes, ":0:%" PRIo32, version.attributes);
-    return numbers + toUtf8(version.content) + attributes;
-}
-
 } // namespace
-
-std::uint32_t unixSeconds(std::uint64_t fileTime)
-{
-    constexpr std::uint64_t epoch = 116444736000000000;
-    constexpr std::uint64_t ticksPerSecond = 10000000;
-    return fileTime < epoch
-               ? 0
-               : static_cast<std::uint32_t>(std::min<std::uint64_t>((fileTime - epoch) / ticksPerSecond, UINT32_MAX));
-}
 
 History::History(const Installation& installation) : database_(installation.historyDatabase())
 {
@@ -50,17 +25,13 @@ History::History(const Installation& installation) : database_(installation.hist
 std::map<std::wstring, Version> History::newest()
 {
     std::map<std::wstring, Version> found;
-    Statement row(database_, "SELECT path, max(time), size, modified, created, attributes, content FROM versions"
-                             " GROUP BY path");
-    while (row.next())
-        found.emplace(row.text(0), readVersion(row));
+    forEach([&](const std::wstring& path, const Version& version) { found[path] = version; });
     return found;
 }
 
 std::optional<Version> History::find(const std::wstring& path, std::int64_t time)
 {
-    Statement row(database_, "SELECT path, time, size, modified, created, attributes, content FROM versions"
-                             " WHERE path = ? AND time = ?");
+    Statement row(database_, "SELECT * FROM versions WHERE path = ? AND time = ?");
     row.bind(1, path).bind(2, time);
     return row.next() ? std::optional(readVersion(row)) : std::nullopt;
 }
@@ -89,21 +60,11 @@ void History::addRun(const std::map<std::wstring, Version>& versions)
     transaction.commit();
 }
 
-std::string History::manifestText()
+void History::forEach(const std::function<void(const std::wstring& path, const Version& version)>& visit)
 {
-    std::string files;
-    std::wstring current;
-    Statement row(database_, "SELECT path, time, size, modified, created, attributes, content FROM versions"
-                             " ORDER BY path, time");
-    while (row.next()) {
-        // An empty line parts the files; none follows the last line, where it would read as one more version.
-        if (const std::wstring path = row.text(0); path != current) {
-            files += (files.empty() ? "" : "\n\n") + toUtf8(path);
-            current = path;
-        }
-        files += "\n" + patchLine(readVersion(row));
-    }
-    return "USER\n_hash|" + toUtf8(hashOf(files)) + "\nwritten by taviservice\n\n\nFILES\n" + files;
+    Statement row(database_, "SELECT * FROM versions ORDER BY path, time");
+    while (row.next())
+        visit(row.text(0), readVersion(row));
 }
 
 } // namespace service

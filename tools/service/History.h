@@ -1,6 +1,7 @@
 #pragma once
 
 #include <cstdint>
+#include <functional>
 #include <map>
 #include <optional>
 #include <string>
@@ -12,13 +13,14 @@ namespace service {
 
 constexpr std::int64_t kDeletedSize = -1;
 
-// File times are the system's own 64-bit counts; 0 where there is none.
+// `time` is in seconds since 1970; `modified` and `created` are file times of the system.
 struct Version {
     std::int64_t time = 0;
     std::int64_t size = kDeletedSize;
     std::uint64_t modified = 0;
     std::uint64_t created = 0;
     std::uint32_t attributes = 0;
+    // 40 hexadecimal digits: the name of the file with the bytes. Empty for a deleted file.
     std::wstring content;
 };
 
@@ -27,21 +29,18 @@ class History {
   public:
     explicit History(const Installation& installation);
 
+    // Returns the newest version of every file, deleted ones included.
     std::map<std::wstring, Version> newest();
     std::optional<Version> find(const std::wstring& path, std::int64_t time);
+    // Returns the time of the newest run, or 0.
     std::int64_t lastRun();
-    // One run, whole or not at all.
+    // Adds the versions of one run, all or none.
     void addRun(const std::map<std::wstring, Version>& versions);
-    std::string manifestText();
+    // Visits all versions by path and time.
+    void forEach(const std::function<void(const std::wstring& path, const Version& version)>& visit);
 
   private:
     Database database_;
 };
-
-// Seconds since 1970, as the manifest tells times.
-std::uint32_t unixSeconds(std::uint64_t fileTime);
-
-// The path whose versions are the runs.
-constexpr wchar_t kRunsPath[] = L"simple.map";
 
 } // namespace service

@@ -1,9 +1,13 @@
 #include "Messages.h"
 
-#include "Text.h"
+#include "common/Text.h"
 
 namespace service {
 namespace {
+
+// Of an event: two codes of 4 bytes, the value, and the length of the text.
+constexpr std::uint32_t kEventFields = 20;
+constexpr std::uint32_t kSnapshotFields = 36;
 
 std::string u32(std::uint32_t value)
 {
@@ -18,14 +22,6 @@ std::string u64(std::uint64_t value)
     return u32(static_cast<std::uint32_t>(value)) + u32(static_cast<std::uint32_t>(value >> 32));
 }
 
-std::uint32_t u32At(std::string_view bytes, std::size_t at)
-{
-    std::uint32_t value = 0;
-    for (std::size_t i = 0; i < 4; ++i)
-        value |= std::uint32_t{static_cast<unsigned char>(bytes[at + i])} << 8 * i;
-    return value;
-}
-
 } // namespace
 
 std::string header(std::uint32_t type, std::uint32_t length)
@@ -33,23 +29,21 @@ std::string header(std::uint32_t type, std::uint32_t length)
     return u32(type) + u32(length);
 }
 
-std::string eventFrame(std::uint32_t type, std::uint64_t value, std::wstring_view text, std::uint32_t code,
-                       std::uint32_t flag)
+std::string eventFrame(std::uint32_t type, std::uint64_t value, std::wstring_view text)
 {
-    const std::string bytes = toUtf8(text);
-    const auto count = static_cast<std::uint32_t>(bytes.size());
-    return header(type, 20 + count) + u32(code) + u64(value) + u32(flag) + u32(count) + bytes;
+    const std::string bytes = tools::toUtf8(text);
+    const auto length = static_cast<std::uint32_t>(bytes.size());
+    return header(type, kEventFields + length) + u32(0) + u64(value) + u32(0) + u32(length) + bytes;
 }
 
 std::string snapshotFrame(std::uint32_t state)
 {
-    return header(snapshotOfAll, 36) + u32(state) + std::string(32, '\0');
+    return header(kSnapshot, kSnapshotFields) + u32(state) + std::string(kSnapshotFields - 4, '\0');
 }
 
 bool isCancelCommand(std::string_view frame)
 {
-    return frame.size() >= 28 && u32At(frame, 0) == restoreEnded && u32At(frame, 4) == frame.size() - 8 &&
-           u32At(frame, 24) == frame.size() - 28;
+    return frame == eventFrame(kRestoreEnded);
 }
 
 } // namespace service

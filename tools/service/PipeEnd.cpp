@@ -1,20 +1,15 @@
 #include "PipeEnd.h"
 
-#include "Text.h"
+#include "common/Text.h"
 
 namespace service {
 
-Handle makeEvent()
+PipeEnd::PipeEnd(const wchar_t* name, DWORD access, HANDLE stop) : stop_(stop), event_(tools::createEvent())
 {
-    return Handle(CreateEventW(nullptr, TRUE, FALSE, nullptr));
-}
-
-PipeEnd::PipeEnd(const wchar_t* name, DWORD access, HANDLE stop, DWORD instances) : stop_(stop), event_(makeEvent())
-{
-    const HANDLE pipe = CreateNamedPipeW(name, access | FILE_FLAG_OVERLAPPED, PIPE_TYPE_BYTE | PIPE_WAIT, instances,
-                                         65536, 65536, 0, nullptr);
+    const HANDLE pipe = CreateNamedPipeW(name, access | FILE_FLAG_OVERLAPPED, PIPE_TYPE_BYTE | PIPE_WAIT,
+                                         PIPE_UNLIMITED_INSTANCES, 65536, 65536, 0, nullptr);
     if (pipe == INVALID_HANDLE_VALUE)
-        throw systemFailure(name, GetLastError());
+        throw tools::systemFailure(name, GetLastError());
     pipe_.reset(pipe);
 }
 
@@ -31,11 +26,18 @@ bool PipeEnd::finish(BOOL done, DWORD milliseconds, DWORD& count)
 
 bool PipeEnd::connect()
 {
-    overlapped_ = {};
-    overlapped_.hEvent = event_.get();
-    DWORD count = 0;
-    const BOOL done = ConnectNamedPipe(pipe_.get(), &overlapped_);
-    return (!done && GetLastError() == ERROR_PIPE_CONNECTED) || finish(done, INFINITE, count);
+    constexpr DWORD kRetryMs = 10;
+    do {
+        overlapped_ = {};
+        overlapped_.hEvent = event_.get();
+        DWORD count = 0;
+        const BOOL done = ConnectNamedPipe(pipe_.get(), &overlapped_);
+        if ((!done && GetLastError() == ERROR_PIPE_CONNECTED) || finish(done, INFINITE, count))
+            return true;
+        // A client that connected and went away keeps the instance until this.
+        DisconnectNamedPipe(pipe_.get());
+    } while (WaitForSingleObject(stop_, kRetryMs) == WAIT_TIMEOUT);
+    return false;
 }
 
 bool PipeEnd::write(std::string_view bytes, DWORD milliseconds)
@@ -52,13 +54,13 @@ bool PipeEnd::write(std::string_view bytes, DWORD milliseconds)
     return true;
 }
 
-bool PipeEnd::read(std::string& bytes, DWORD most, DWORD milliseconds)
+bool PipeEnd::read(std::string& bytes, DWORD limit, DWORD milliseconds)
 {
-    bytes.resize(most);
+    bytes.resize(limit);
     overlapped_ = {};
     overlapped_.hEvent = event_.get();
     DWORD count = 0;
-    const BOOL done = ReadFile(pipe_.get(), bytes.data(), most, nullptr, &overlapped_);
+    const BOOL done = ReadFile(pipe_.get(), bytes.data(), limit, nullptr, &overlapped_);
     const bool read = finish(done, milliseconds, count);
     bytes.resize(read ? count : 0);
     return read;

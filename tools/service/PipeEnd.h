@@ -2,41 +2,32 @@
 
 #include <windows.h>
 
-#include <memory>
 #include <string>
 #include <string_view>
 
+#include "common/Handle.h"
+
 namespace service {
 
-struct HandleCloser {
-    using pointer = HANDLE;
-    void operator()(HANDLE handle) const
-    {
-        CloseHandle(handle);
-    }
-};
-using Handle = std::unique_ptr<HANDLE, HandleCloser>;
-
-Handle makeEvent();
-
-// The server's end of one instance of a pipe. Every call ends at once, with false, when `stop` is signalled.
+// The server's end of one instance of a pipe. Every call returns false at once when `stop` is signalled.
 class PipeEnd {
   public:
-    // `access` is PIPE_ACCESS_INBOUND and so on. Throws when the instance cannot be made.
-    PipeEnd(const wchar_t* name, DWORD access, HANDLE stop, DWORD instances = PIPE_UNLIMITED_INSTANCES);
+    // `access` is PIPE_ACCESS_INBOUND or PIPE_ACCESS_OUTBOUND. Throws when the instance cannot be created.
+    PipeEnd(const wchar_t* name, DWORD access, HANDLE stop);
 
+    // Waits for a client.
     bool connect();
-    bool write(std::string_view bytes, DWORD milliseconds = INFINITE);
-    // One read of at most `most` bytes; false when the client has gone or nothing came in time.
-    bool read(std::string& bytes, DWORD most, DWORD milliseconds);
+    bool write(std::string_view bytes, DWORD milliseconds);
+    // Reads once, at most `limit` bytes. Returns false when the client has gone or nothing came in time.
+    bool read(std::string& bytes, DWORD limit, DWORD milliseconds);
     void disconnect();
 
   private:
     bool finish(BOOL done, DWORD milliseconds, DWORD& count);
 
-    Handle pipe_;
+    tools::Handle pipe_;
     HANDLE stop_;
-    Handle event_;
+    tools::Handle event_;
     OVERLAPPED overlapped_{};
 };
 

@@ -2,38 +2,38 @@
 
 #include <atomic>
 #include <cstdint>
+#include <filesystem>
 #include <mutex>
 #include <string>
 #include <thread>
 #include <vector>
 
-#include "ContentStore.h"
-#include "Database.h"
 #include "History.h"
 #include "Installation.h"
 #include "StatusServer.h"
+#include "common/Handle.h"
 
 namespace service {
 
-struct RunSettings {
-    // Bytes a second; 0 is as fast as it goes.
-    std::atomic<std::int64_t> rate{0};
-    // Milliseconds that a restore searches before its first file.
-    DWORD search = 0;
-    DWORD poll = 250;
+struct RestoreSettings {
+    // 0 is as fast as the disk.
+    std::atomic<std::int64_t> bytesPerSecond{0};
+    // Time that a restore searches before its first file.
+    std::uint64_t searchMs = 0;
 };
 
-// Carries out the restore requests of the state database on a thread of its own, in their order. A request's rows go
-// when it has ended or was cancelled; until then another run of the service begins it anew.
+// Carries out the restore requests of the state database on a thread of its own, in their order. The rows of a request
+// are deleted when it has ended or was cancelled; until then the next run of the service begins it anew.
 class Restorer {
   public:
-    Restorer(const Installation& installation, const RunSettings& settings, StatusServer& status);
+    Restorer(const Installation& installation, const RestoreSettings& settings, StatusServer& status);
     Restorer(const Restorer&) = delete;
     Restorer& operator=(const Restorer&) = delete;
-    // Leaves a running restore where it is.
+    // Interrupts the restore that runs.
     ~Restorer();
 
-    // The restore in progress or, when none is, the oldest request. False when there is neither. Any thread.
+    // Cancels the restore that runs or, when none does, the oldest request. Returns false when there is neither. Any
+    // thread.
     bool cancel();
     bool isIdle();
 
@@ -41,34 +41,32 @@ class Restorer {
     struct File {
         std::wstring path;
         std::wstring target;
-        std::int64_t time = 0;
-        std::int64_t size = 0;
-        bool overwrite = false;
+        std::int64_t time;
+        std::int64_t size;
+        bool overwrite;
     };
 
     void work();
-    // False when it was left where it is.
-    void restore(std::int64_t id);
+    void restore(std::int64_t request);
+    void restoreFiles(const std::vector<File>& files);
     void restoreFile(History& history, const File& file);
-    void copyContent(const std::wstring& from, const std::wstring& to);
-    void report(std::uint64_t bytes, bool now);
+    void copyContent(const std::filesystem::path& from, const std::filesystem::path& to);
+    void reportBytes();
     void pause(std::uint64_t milliseconds);
     std::int64_t oldestRequest();
-    // Tries until it is done; false when the service stops before.
-    bool forget(std::int64_t id);
+    std::vector<File> filesOf(std::int64_t request);
+    void deleteRequest(std::int64_t request);
 
     const Installation installation_;
-    const RunSettings& settings_;
+    const RestoreSettings& settings_;
     StatusServer& status_;
-    ContentStore store_;
-    // Signalled: whatever goes on ends. The two flags tell why.
     std::mutex mutex_;
-    Handle interrupt_ = makeEvent();
+    // Signalled when the restore must end: stop_ is set, or cancelled_.
+    tools::Handle interrupt_ = tools::createEvent();
     std::atomic<bool> stop_{false};
     std::atomic<bool> cancelled_{false};
     std::atomic<bool> restoring_{false};
-    // Of the file in work, the bytes that have not been counted as done.
-    std::uint64_t left_ = 0;
+    // Bytes that were copied since the last report.
     std::uint64_t unreported_ = 0;
     DWORD lastReport_ = 0;
     std::thread thread_;

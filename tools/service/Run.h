@@ -1,14 +1,11 @@
 #pragma once
 
-#include <string>
-#include <vector>
+#include <cstdint>
 
 namespace service {
 
-// The service at work, until it is told to stop.
-int run(const std::vector<std::wstring>& arguments);
-// One order to the service at work; its answer is printed. False when it was refused or nobody is there.
-bool tell(const std::vector<std::wstring>& words);
-std::wstring ordersHelp();
+// Restores what is requested and reports it, until the command stop or the end of the standard input, from which it
+// takes commands. `bytesPerSecond` 0 is as fast as the disk; a restore searches for `searchMs` before its first file.
+void run(std::int64_t bytesPerSecond, std::int64_t searchMs);
 
 } // namespace service

@@ -1,95 +1,92 @@
 #include "StatusServer.h"
 
-#include <atomic>
+#include <algorithm>
 #include <cstdlib>
 #include <utility>
 
 #include "Messages.h"
-#include "Text.h"
+#include "common/Text.h"
 
 namespace service {
 namespace {
 
 constexpr wchar_t kStatusPipe[] = L"\\\\.\\pipe\\tavistatus";
-constexpr DWORD kPatience = 10000;
-constexpr std::size_t kLongQueue = 20;
-constexpr std::size_t kLongestQueue = 2000;
+constexpr DWORD kWriteMs = 10000;
+constexpr std::size_t kMaxQueue = 2000;
 
 } // namespace
 
 struct StatusServer::Client {
-    explicit Client(std::unique_ptr<PipeEnd> end) : pipe(std::move(end)) {}
     std::unique_ptr<PipeEnd> pipe;
-    std::deque<Outgoing> queue;
-    Handle wake = makeEvent();
-    std::atomic<bool> left{false};
+    std::deque<Output> queue;
+    tools::Handle wake = tools::createEvent();
+    bool gone = false;
     std::thread thread;
 };
 
 StatusServer::StatusServer()
 {
-    // Here, so that a client finds the pipe as soon as there is a server.
-    auto first = std::make_unique<PipeEnd>(kStatusPipe, PIPE_ACCESS_OUTBOUND, stop_.get());
-    acceptor_ = std::thread([this, pipe = std::move(first)]() mutable { accept(std::move(pipe)); });
+    // Created here, so that a client finds the pipe as soon as there is a server.
+    acceptor_ = std::thread([this, first = createPipe()]() mutable { accept(std::move(first)); });
 }
 
 StatusServer::~StatusServer()
 {
     SetEvent(stop_.get());
     acceptor_.join();
-    dropLeft(true);
+    for (const auto& client : clients_)
+        client->thread.join();
 }
 
-void StatusServer::dropLeft(bool all)
+std::unique_ptr<PipeEnd> StatusServer::createPipe() const
 {
-    std::vector<std::unique_ptr<Client>> gone;
-    {
-        const std::lock_guard guard(mutex_);
-        for (std::size_t i = clients_.size(); i-- > 0;) {
-            if (all || clients_[i]->left) {
-                gone.push_back(std::move(clients_[i]));
-                clients_.erase(clients_.begin() + static_cast<std::ptrdiff_t>(i));
-            }
-        }
-    }
-    for (const auto& client : gone)
-        client->thread.join();
+    return std::make_unique<PipeEnd>(kStatusPipe, PIPE_ACCESS_OUTBOUND, stop_.get());
 }
 
 void StatusServer::accept(std::unique_ptr<PipeEnd> next)
 {
-    while (next->connect() || WaitForSingleObject(stop_.get(), 10) == WAIT_TIMEOUT) {
-        // The next instance first: a client that comes again at once must find one.
-        auto connected = std::exchange(next, std::make_unique<PipeEnd>(kStatusPipe, PIPE_ACCESS_OUTBOUND, stop_.get()));
-        dropLeft(false);
-        auto client = std::make_unique<Client>(std::move(connected));
+    while (next->connect()) {
+        auto client = std::make_unique<Client>();
+        // The next instance exists before the client is served: one that reconnects at once must find it.
+        client->pipe = std::exchange(next, createPipe());
         const std::lock_guard guard(mutex_);
-        client->queue.push_back({0, 0, {}, snapshotFrame(running_ ? restoreStarted : restoreEnded)});
-        if (running_) {
-            client->queue.push_back({restoreStarted, 0, {}, {}});
-            if (total_ > 0)
-                client->queue.push_back({restoreTotal, total_, {}, {}});
-            if (done_ > 0)
-                client->queue.push_back({bytesDone, done_, {}, {}});
-            if (!item_.empty())
-                client->queue.push_back({itemStarted, 0, item_, {}});
-        }
-        Client& kept = *clients_.emplace_back(std::move(client));
-        kept.thread = std::thread([this, &kept] {
-            serve(kept);
-            // Not disconnected, which would take back what the client has not read yet.
-            kept.pipe.reset();
-            kept.left = true;
-        });
-        SetEvent(kept.wake.get());
+        dropGone();
+        sendStateTo(*client);
+        client->thread = std::thread([this, &served = *client] { serve(served); });
+        clients_.push_back(std::move(client));
     }
+}
+
+// The lock is held. A thread takes it for the last time before it sets `gone`.
+void StatusServer::dropGone()
+{
+    const auto first =
+        std::partition(clients_.begin(), clients_.end(), [](const auto& client) { return !client->gone; });
+    std::for_each(first, clients_.end(), [](const auto& client) { client->thread.join(); });
+    clients_.erase(first, clients_.end());
+}
+
+void StatusServer::sendStateTo(Client& client) const
+{
+    client.queue.push_back({snapshotFrame(running_ ? kRestoreStarted : kRestoreEnded)});
+    if (running_) {
+        client.queue.push_back({eventFrame(kRestoreStarted)});
+        if (total_ > 0)
+            client.queue.push_back({eventFrame(kRestoreTotal, total_)});
+        if (done_ > 0)
+            client.queue.push_back({eventFrame(kBytesDone, done_)});
+        if (!item_.empty())
+            client.queue.push_back({eventFrame(kItemStarted, 0, item_)});
+    }
+    SetEvent(client.wake.get());
 }
 
 void StatusServer::serve(Client& client)
 {
     const HANDLE events[] = {stop_.get(), client.wake.get()};
-    while (WaitForMultipleObjects(2, events, FALSE, INFINITE) == WAIT_OBJECT_0 + 1) {
-        Outgoing next;
+    bool connected = true;
+    while (connected && WaitForMultipleObjects(2, events, FALSE, INFINITE) == WAIT_OBJECT_0 + 1) {
+        Output next;
         {
             const std::lock_guard guard(mutex_);
             if (client.queue.empty()) {
@@ -99,58 +96,23 @@ void StatusServer::serve(Client& client)
             next = std::move(client.queue.front());
             client.queue.pop_front();
         }
-        const std::string bytes = next.raw.empty() ? eventFrame(next.type, next.value, next.text) : next.raw;
-        for (; next.repeat > 0; --next.repeat) {
-            if (!client.pipe->write(bytes, kPatience))
-                return;
-        }
-        if (next.pause > 0 && WaitForSingleObject(stop_.get(), next.pause) != WAIT_TIMEOUT)
-            return;
-        if (next.hangUp)
-            return;
+        for (; connected && next.repeat > 0; --next.repeat)
+            connected = client.pipe->write(next.bytes, kWriteMs);
+        WaitForSingleObject(stop_.get(), next.pauseMs);
+        connected = connected && !next.hangUp;
     }
+    // A disconnect would take back what the client has not read yet.
+    client.pipe.reset();
+    const std::lock_guard guard(mutex_);
+    client.gone = true;
 }
 
-void StatusServer::collapse(std::deque<Outgoing>& queue)
-{
-    std::deque<Outgoing> shorter;
-    for (Outgoing& message : queue) {
-        const auto isProgress = [](const Outgoing& one) {
-            return one.raw.empty() && one.type >= itemStarted && one.type <= bytesDone;
-        };
-        // Within a run of progress messages: one sum, and the last item.
-        std::size_t run = shorter.size();
-        while (isProgress(message) && run > 0 && isProgress(shorter[run - 1]))
-            --run;
-        std::size_t same = run;
-        while (same < shorter.size() && (shorter[same].type == bytesDone) != (message.type == bytesDone))
-            ++same;
-        if (!isProgress(message) || same == shorter.size()) {
-            shorter.push_back(std::move(message));
-        } else if (message.type == bytesDone) {
-            shorter[same].value += message.value;
-        } else {
-            shorter[same] = std::move(message);
-        }
-    }
-    queue = std::move(shorter);
-}
-
-void StatusServer::post(const Outgoing& message)
+void StatusServer::post(const Output& output)
 {
     for (const auto& client : clients_) {
-        if (client->left)
-            continue;
-        client->queue.push_back(message);
-        if (client->queue.size() > kLongQueue)
-            collapse(client->queue);
-        if (client->queue.size() > kLongestQueue) {
-            client->queue.clear();
-            Outgoing end;
-            end.repeat = 0;
-            end.hangUp = true;
-            client->queue.push_back(end);
-        }
+        client->queue.push_back(output);
+        if (client->queue.size() > kMaxQueue)
+            client->queue = {{"", 0, 0, true}};
         SetEvent(client->wake.get());
     }
 }
@@ -159,79 +121,64 @@ void StatusServer::send(std::uint32_t type, std::uint64_t value, const std::wstr
 {
     const std::lock_guard guard(mutex_);
     switch (type) {
-    case restoreStarted:
-    case restoreEnded:
-        running_ = type == restoreStarted;
+    case kRestoreStarted:
+    case kRestoreEnded:
+        running_ = type == kRestoreStarted;
         total_ = done_ = 0;
         item_.clear();
         break;
-    case restoreTotal:
+    case kRestoreTotal:
         total_ = value;
         break;
-    case itemStarted:
-    case itemEnded:
+    case kItemStarted:
+    case kItemEnded:
         item_ = text;
         break;
-    case bytesDone:
+    case kBytesDone:
         done_ += value;
         break;
     default:
         break;
     }
-    post({type, value, text, {}});
+    post({eventFrame(type, value, text)});
 }
 
-void StatusServer::sendRaw(const std::string& frame)
-{
-    const std::lock_guard guard(mutex_);
-    post({0, 0, {}, frame});
-}
-
-const std::vector<std::wstring>& StatusServer::garbageKinds()
-{
-    static const std::vector<std::wstring> kinds = {L"length", L"count", L"huge",  L"short", L"type",
-                                                    L"cut",    L"stall", L"flood", L"random"};
-    return kinds;
-}
-
-bool StatusServer::sendGarbage(const std::wstring& kind)
+std::vector<StatusServer::Garbage> StatusServer::garbage()
 {
     const std::string fields(16, '\0');
-    Outgoing garbage;
-    if (kind == L"length") {
-        garbage.raw = header(restoreEnded, UINT32_MAX) + "abcde";
-    } else if (kind == L"count") {
-        garbage.raw = header(itemStarted, 25) + fields + "\xff\xff\xff\x7f" + "abcde";
-    } else if (kind == L"huge") {
+    std::string noise(4096, '\0');
+    std::generate(noise.begin(), noise.end(), [] { return static_cast<char>(std::rand()); });
+    return {
+        {L"length", {{header(kRestoreEnded, UINT32_MAX) + "abcde"}}},
+        {L"count", {{header(kItemStarted, 25) + fields + "\xff\xff\xff\x7f" + "abcde"}}},
         // Many small parts: a client that does not read them would keep the whole in memory.
-        garbage.raw = std::string(65536, 'x');
-        garbage.repeat = 1024;
-    } else if (kind == L"short") {
-        garbage.raw = header(restoreEnded, 19) + std::string(19, '\0');
-    } else if (kind == L"type") {
-        garbage.raw = header(30, 20) + std::string(20, '\0');
-    } else if (kind == L"cut") {
-        garbage.raw = header(restoreStarted, 20).substr(0, 4);
-        garbage.hangUp = true;
-    } else if (kind == L"stall") {
-        garbage.raw = header(restoreStarted, 20) + std::string(10, '\0');
-        garbage.pause = 3000;
-        garbage.hangUp = true;
-    } else if (kind == L"flood") {
-        garbage.raw = eventFrame(itemStarted, 0, L"C:\\flood.txt");
-        garbage.repeat = 10000;
-    } else if (kind == L"random") {
-        for (int i = 0; i < 4096; ++i)
-            garbage.raw += static_cast<char>(std::rand());
-        garbage.hangUp = true;
-    } else {
-        return false;
-    }
+        {L"huge", {{header(kItemStarted, 64 << 20)}, {std::string(65536, 'x'), 1024}}},
+        {L"short", {{header(kRestoreEnded, 19) + std::string(19, '\0')}}},
+        {L"type", {{header(30, 20) + std::string(20, '\0')}}},
+        {L"cut", {{header(kRestoreStarted, 20).substr(0, 4), 1, 0, true}}},
+        {L"stall", {{header(kRestoreStarted, 20) + std::string(10, '\0'), 1, 3000, true}}},
+        {L"flood", {{eventFrame(kItemStarted, 0, L"C:\\flood.txt"), 10000}}},
+        {L"random", {{noise, 1, 0, true}}},
+        // A restore that no request asked for.
+        {L"snapshot", {{snapshotFrame(kRestoreStarted)}}},
+    };
+}
+
+void StatusServer::sendGarbage(const std::wstring& kind)
+{
+    const std::vector<Garbage> all = garbage();
+    const auto found = std::find_if(all.begin(), all.end(), [&](const Garbage& one) { return one.kind == kind; });
+    if (found == all.end())
+        throw tools::Failure{L"no such garbage: " + kind};
     const std::lock_guard guard(mutex_);
-    if (kind == L"huge")
-        post({0, 0, {}, header(itemStarted, 64 << 20)});
-    post(garbage);
-    return true;
+    for (const Output& output : found->outputs)
+        post(output);
+}
+
+void StatusServer::sendNextGarbage()
+{
+    const std::vector<Garbage> all = garbage();
+    sendGarbage(all[garbageSent_++ % all.size()].kind);
 }
 
 } // namespace service

@@ -2,6 +2,7 @@
 
 #include <cstdint>
 #include <deque>
+#include <memory>
 #include <mutex>
 #include <string>
 #include <thread>
@@ -11,9 +12,9 @@
 
 namespace service {
 
-// Tells any number of clients what the service does. A client that comes late is first told how things stand; one that
-// reads slowly is told in fewer messages with the same sums; one that takes nothing for ten seconds is dropped. Nobody
-// waits for a client. Any thread.
+// Tells any number of clients about the restore that runs. A client that connects later first gets the state so far.
+// One that reads nothing for ten seconds, or leaves too much unread, is dropped. No caller waits for a client. Any
+// thread.
 class StatusServer {
   public:
     StatusServer();
@@ -22,33 +23,36 @@ class StatusServer {
     ~StatusServer();
 
     void send(std::uint32_t type, std::uint64_t value = 0, const std::wstring& text = {});
-    void sendRaw(const std::string& frame);
-    // Something that no honest service sends; false when the kind is not known.
-    bool sendGarbage(const std::wstring& kind);
-    static const std::vector<std::wstring>& garbageKinds();
+    // Sends something that no honest service sends. Throws a Failure when the kind is not known.
+    void sendGarbage(const std::wstring& kind);
+    // Sends each kind in turn.
+    void sendNextGarbage();
 
   private:
-    // A progress message keeps its parts until it is written, so that it can be merged with others.
-    struct Outgoing {
-        std::uint32_t type = 0;
-        std::uint64_t value = 0;
-        std::wstring text;
-        std::string raw;
+    struct Client;
+    struct Output {
+        std::string bytes;
         unsigned repeat = 1;
-        DWORD pause = 0;
+        DWORD pauseMs = 0;
         bool hangUp = false;
     };
-    struct Client;
+    struct Garbage {
+        const wchar_t* kind;
+        std::vector<Output> outputs;
+    };
 
+    static std::vector<Garbage> garbage();
+    std::unique_ptr<PipeEnd> createPipe() const;
     void accept(std::unique_ptr<PipeEnd> next);
     void serve(Client& client);
-    void post(const Outgoing& message);
-    static void collapse(std::deque<Outgoing>& queue);
-    void dropLeft(bool all);
+    void post(const Output& output);
+    void sendStateTo(Client& client) const;
+    void dropGone();
 
-    Handle stop_ = makeEvent();
+    tools::Handle stop_ = tools::createEvent();
     std::mutex mutex_;
     std::vector<std::unique_ptr<Client>> clients_;
+    std::size_t garbageSent_ = 0;
     bool running_ = false;
     std::uint64_t total_ = 0;
     std::uint64_t done_ = 0;

@@ -1,7 +1,6 @@
 #pragma once
 
 #include <functional>
-#include <string>
 #include <thread>
 #include <vector>
 
@@ -9,11 +8,11 @@
 
 namespace service {
 
-// Takes commands from any number of clients, one message each. A client that says nothing is given two seconds and
-// keeps nobody waiting.
+// Takes commands from any number of clients, one message each. A client that sends nothing gets two seconds, and other
+// clients do not wait for it.
 class CommandServer {
   public:
-    // `cancel` is called on the server's threads.
+    // `cancel` is called on the server's threads; it returns false when there is nothing to cancel.
     explicit CommandServer(std::function<bool()> cancel);
     CommandServer(const CommandServer&) = delete;
     CommandServer& operator=(const CommandServer&) = delete;
@@ -23,7 +22,7 @@ class CommandServer {
     void serve(PipeEnd& pipe);
 
     std::function<bool()> cancel_;
-    Handle stop_ = makeEvent();
+    tools::Handle stop_ = tools::createEvent();
     std::vector<std::thread> threads_;
 };
 

@@ -1,0 +1,13 @@
+#pragma once
+
+#include <string>
+
+namespace filemanager {
+
+// Returns this process's handles, GDI objects, threads, private memory and unloads of the watched library as one line.
+std::wstring objectCounts();
+
+// From now on the line says how often the loader unmapped this library. One library for the life of the process.
+void watchUnloads(const std::wstring& library);
+
+} // namespace filemanager
