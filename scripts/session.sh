@@ -1,5 +1,5 @@
-# What scripts/demo, scripts/endure and tests/host share: the file manager and the service in a Wine prefix, and commands to them.
-# Sourced after common.sh, never run. `prefix` is the prefix, `out` the folder with what the programs print.
+# Shared by scripts/demo, scripts/endure and tests/host: starts the file manager and the service in a Wine prefix and sends them
+# commands. Sourced after common.sh, never run. `prefix` is the prefix, `out` the folder with what the programs print.
 
 # Of the programs here and of those under Wine (scripts/wine-run sets the same).
 export LC_ALL=C.UTF-8 TZ=UTC0
@@ -101,8 +101,12 @@ order() {
     sed '1d;$d' <<<"$answer"
 }
 has_answered() { # NAME FIRST-LINE
-    lives "$1" || { cat "$out/$1.errors" >&2; die "$1 has ended"; }
-    tail -n +"$2" "$out/$1.txt" | grep -qE '^(done$|failed: )'
+    local alive=
+    # Asked first, since a program may end right after its answer.
+    lives "$1" && alive=1
+    tail -n +"$2" "$out/$1.txt" | grep -qE '^(done$|failed: )' && return
+    [ -n "$alive" ] || { cat "$out/$1.errors" >&2; die "$1 has ended"; }
+    return 1
 }
 
 # sql DATABASE STATEMENT

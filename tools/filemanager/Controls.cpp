@@ -138,7 +138,7 @@ void selectRow(HWND list, const std::wstring& row)
 
 POINT clickPoint(HWND control, const std::wstring* row)
 {
-    constexpr LONG kRowBeginning = 40;
+    constexpr LONG kRowStartPixels = 40;
     RECT box = {};
     if (!row) {
         GetClientRect(control, &box);
@@ -146,7 +146,7 @@ POINT clickPoint(HWND control, const std::wstring* row)
         box.left = LVIR_LABEL;
         if (!ask(control, LVM_GETITEMRECT, static_cast<WPARAM>(toNumber(*row)), &box))
             throw Failure{L"the list has no row " + *row};
-        box.right = std::min(box.right, box.left + kRowBeginning);
+        box.right = std::min(box.right, box.left + kRowStartPixels);
     }
     POINT point = {(box.left + box.right) / 2, (box.top + box.bottom) / 2};
     ClientToScreen(control, &point);

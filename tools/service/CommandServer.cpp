@@ -12,7 +12,7 @@ constexpr wchar_t kCommandPipe[] = L"\\\\.\\pipe\\tavibackup";
 constexpr int kInstances = 4;
 constexpr DWORD kFrameMs = 2000;
 // More than any command has.
-constexpr DWORD kMaxFrame = 1024;
+constexpr DWORD kMaxFrameBytes = 1024;
 
 std::wstring hexOf(const std::string& bytes)
 {
@@ -46,7 +46,7 @@ void CommandServer::serve(PipeEnd& pipe)
     while (pipe.connect()) {
         std::string frame;
         std::string part;
-        while (frame.size() < kMaxFrame && !isCancelCommand(frame) && pipe.read(part, kMaxFrame, kFrameMs))
+        while (frame.size() < kMaxFrameBytes && !isCancelCommand(frame) && pipe.read(part, kMaxFrameBytes, kFrameMs))
             frame += part;
         pipe.disconnect();
         std::wstring answer = L"refused";

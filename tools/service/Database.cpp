@@ -17,9 +17,9 @@ constexpr int kBusyMs = 60000;
 Database::Database(const std::wstring& path)
 {
     if (sqlite3_open(tools::toUtf8(path).c_str(), &handle_) != SQLITE_OK) {
-        const tools::Failure failure{path + L": " + tools::fromUtf8(sqlite3_errmsg(handle_))};
+        const std::wstring text = path + L": " + tools::fromUtf8(sqlite3_errmsg(handle_));
         sqlite3_close(handle_);
-        throw failure;
+        throw tools::Failure{text};
     }
     sqlite3_busy_timeout(handle_, kBusyMs);
 }

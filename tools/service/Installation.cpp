@@ -19,7 +19,7 @@ constexpr wchar_t kSettingsKey[] = L"Software\\Tavi\\params";
 
 void setText(const wchar_t* key, const wchar_t* value, const std::wstring& text)
 {
-    const auto bytes = static_cast<DWORD>((text.size() + 1) * sizeof(wchar_t));
+    const auto bytes = (static_cast<DWORD>(text.size()) + 1) * sizeof(wchar_t);
     const LONG result = RegSetKeyValueW(HKEY_LOCAL_MACHINE, key, value, REG_SZ, text.c_str(), bytes);
     if (result != ERROR_SUCCESS)
         throw tools::systemFailure(std::wstring(L"cannot write HKLM\\") + key, static_cast<DWORD>(result));

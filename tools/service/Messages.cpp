@@ -5,9 +5,9 @@
 namespace service {
 namespace {
 
-// Of an event: two codes of 4 bytes, the value, and the length of the text.
-constexpr std::uint32_t kEventFields = 20;
-constexpr std::uint32_t kSnapshotFields = 36;
+// An event has two codes of 4 bytes, a value of 8 and the length of its text.
+constexpr std::uint32_t kEventFieldBytes = 20;
+constexpr std::uint32_t kSnapshotFieldBytes = 36;
 
 std::string u32(std::uint32_t value)
 {
@@ -33,12 +33,12 @@ std::string eventFrame(std::uint32_t type, std::uint64_t value, std::wstring_vie
 {
     const std::string bytes = tools::toUtf8(text);
     const auto length = static_cast<std::uint32_t>(bytes.size());
-    return header(type, kEventFields + length) + u32(0) + u64(value) + u32(0) + u32(length) + bytes;
+    return header(type, kEventFieldBytes + length) + u32(0) + u64(value) + u32(0) + u32(length) + bytes;
 }
 
 std::string snapshotFrame(std::uint32_t state)
 {
-    return header(kSnapshot, kSnapshotFields) + u32(state) + std::string(kSnapshotFields - 4, '\0');
+    return header(kSnapshot, kSnapshotFieldBytes) + u32(state) + std::string(kSnapshotFieldBytes - 4, '\0');
 }
 
 bool isCancelCommand(std::string_view frame)

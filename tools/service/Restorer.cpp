@@ -18,7 +18,7 @@ using tools::Failure;
 constexpr DWORD kPollMs = 250;
 // A client takes about a hundred messages a second.
 constexpr DWORD kReportMs = 50;
-constexpr std::int64_t kMaxChunk = 65536;
+constexpr std::int64_t kMaxChunkBytes = 65536;
 constexpr std::int64_t kChunksPerSecond = 20;
 
 // The service stops, or the restore was cancelled.
@@ -26,17 +26,20 @@ struct Interrupted {};
 
 void setModifiedTime(const std::filesystem::path& path, std::uint64_t time)
 {
-    const tools::Handle file(
-        CreateFileW(path.c_str(), FILE_WRITE_ATTRIBUTES, FILE_SHARE_READ, nullptr, OPEN_EXISTING, 0, nullptr));
+    const HANDLE file =
+        CreateFileW(path.c_str(), FILE_WRITE_ATTRIBUTES, FILE_SHARE_READ, nullptr, OPEN_EXISTING, 0, nullptr);
+    if (file == INVALID_HANDLE_VALUE)
+        throw tools::systemFailure(path.wstring(), GetLastError());
+    const tools::Handle owned(file);
     const FILETIME modified = {static_cast<DWORD>(time), static_cast<DWORD>(time >> 32)};
-    if (!SetFileTime(file.get(), nullptr, nullptr, &modified))
+    if (!SetFileTime(file, nullptr, nullptr, &modified))
         throw tools::systemFailure(path.wstring(), GetLastError());
 }
 
 } // namespace
 
-Restorer::Restorer(const Installation& installation, const RestoreSettings& settings, StatusServer& status)
-    : installation_(installation), settings_(settings), status_(status)
+Restorer::Restorer(Installation installation, const RestoreSettings& settings, StatusServer& status)
+    : installation_(std::move(installation)), settings_(settings), status_(status)
 {
     thread_ = std::thread([this] { work(); });
 }
@@ -58,7 +61,6 @@ bool Restorer::cancel()
     const std::lock_guard guard(mutex_);
     if (isIdle())
         return false;
-    cancelled_ = true;
     SetEvent(interrupt_.get());
     return true;
 }
@@ -102,10 +104,8 @@ void Restorer::restore(std::int64_t request)
     const std::lock_guard guard(mutex_);
     restoring_ = false;
     // A cancel that came too late for this request must not cancel the next one.
-    if (!stop_) {
-        cancelled_ = false;
+    if (!stop_)
         ResetEvent(interrupt_.get());
-    }
 }
 
 void Restorer::restoreFiles(const std::vector<File>& files)
@@ -161,7 +161,7 @@ void Restorer::copyContent(const std::filesystem::path& from, const std::filesys
     while (source && copy) {
         const std::int64_t rate = settings_.bytesPerSecond;
         const std::int64_t size =
-            rate > 0 ? std::clamp<std::int64_t>(rate / kChunksPerSecond, 1, kMaxChunk) : kMaxChunk;
+            rate > 0 ? std::clamp<std::int64_t>(rate / kChunksPerSecond, 1, kMaxChunkBytes) : kMaxChunkBytes;
         chunk.resize(static_cast<std::size_t>(size));
         source.read(chunk.data(), static_cast<std::streamsize>(chunk.size()));
         const auto count = static_cast<std::uint64_t>(source.gcount());

@@ -26,7 +26,7 @@ struct RestoreSettings {
 // are deleted when it has ended or was cancelled; until then the next run of the service begins it anew.
 class Restorer {
   public:
-    Restorer(const Installation& installation, const RestoreSettings& settings, StatusServer& status);
+    Restorer(Installation installation, const RestoreSettings& settings, StatusServer& status);
     Restorer(const Restorer&) = delete;
     Restorer& operator=(const Restorer&) = delete;
     // Interrupts the restore that runs.
@@ -61,10 +61,9 @@ class Restorer {
     const RestoreSettings& settings_;
     StatusServer& status_;
     std::mutex mutex_;
-    // Signalled when the restore must end: stop_ is set, or cancelled_.
+    // Signalled when the restore must end: it was cancelled, or stop_ is set.
     tools::Handle interrupt_ = tools::createEvent();
     std::atomic<bool> stop_{false};
-    std::atomic<bool> cancelled_{false};
     std::atomic<bool> restoring_{false};
     // Bytes that were copied since the last report.
     std::uint64_t unreported_ = 0;

@@ -12,7 +12,7 @@ namespace {
 
 constexpr wchar_t kStatusPipe[] = L"\\\\.\\pipe\\tavistatus";
 constexpr DWORD kWriteMs = 10000;
-constexpr std::size_t kMaxQueue = 2000;
+constexpr std::size_t kMaxQueuedOutputs = 2000;
 
 } // namespace
 
@@ -27,7 +27,8 @@ struct StatusServer::Client {
 StatusServer::StatusServer()
 {
     // Created here, so that a client finds the pipe as soon as there is a server.
-    acceptor_ = std::thread([this, first = createPipe()]() mutable { accept(std::move(first)); });
+    next_ = createPipe();
+    acceptor_ = std::thread([this] { accept(); });
 }
 
 StatusServer::~StatusServer()
@@ -43,12 +44,12 @@ std::unique_ptr<PipeEnd> StatusServer::createPipe() const
     return std::make_unique<PipeEnd>(kStatusPipe, PIPE_ACCESS_OUTBOUND, stop_.get());
 }
 
-void StatusServer::accept(std::unique_ptr<PipeEnd> next)
+void StatusServer::accept()
 {
-    while (next->connect()) {
+    while (next_->connect()) {
         auto client = std::make_unique<Client>();
         // The next instance exists before the client is served: one that reconnects at once must find it.
-        client->pipe = std::exchange(next, createPipe());
+        client->pipe = std::exchange(next_, createPipe());
         const std::lock_guard guard(mutex_);
         dropGone();
         sendStateTo(*client);
@@ -111,7 +112,7 @@ void StatusServer::post(const Output& output)
 {
     for (const auto& client : clients_) {
         client->queue.push_back(output);
-        if (client->queue.size() > kMaxQueue)
+        if (client->queue.size() > kMaxQueuedOutputs)
             client->queue = {{"", 0, 0, true}};
         SetEvent(client->wake.get());
     }

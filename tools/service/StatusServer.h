@@ -43,13 +43,15 @@ class StatusServer {
 
     static std::vector<Garbage> garbage();
     std::unique_ptr<PipeEnd> createPipe() const;
-    void accept(std::unique_ptr<PipeEnd> next);
+    void accept();
     void serve(Client& client);
     void post(const Output& output);
     void sendStateTo(Client& client) const;
     void dropGone();
 
     tools::Handle stop_ = tools::createEvent();
+    // The instance that waits for a client; the acceptor's.
+    std::unique_ptr<PipeEnd> next_;
     std::mutex mutex_;
     std::vector<std::unique_ptr<Client>> clients_;
     std::size_t garbageSent_ = 0;
