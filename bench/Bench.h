@@ -1,72 +1,54 @@
 #pragma once
 
+#include <cstdint>
 #include <functional>
 #include <limits>
 #include <string>
 #include <vector>
 
-// The benchmarks' frame: groups register themselves, measure, and report figures against their bounds. What depends on
-// the machine is stated as a ratio of two things measured in one run.
+// The frame of the benchmarks. A group measures, and reports figures with their upper bounds. A bounded time is a ratio
+// of two measurements of one run, so that the speed of the machine does not count.
 namespace tavi::bench {
 
 constexpr double kNoBound = std::numeric_limits<double>::infinity();
 
-struct Figure {
-    std::string name;
-    double value;
-    double bound;
-    std::string unit;
+struct Bench {
+    // The folder that keeps generated data from run to run.
+    const std::string dataFolder;
+    // Smaller sets and fewer repetitions.
+    const bool quick;
+    const int repetitions = quick ? 3 : 7;
+    // The number of files of the largest set that every run has.
+    const std::uint32_t files = quick ? 100000 : 1000000;
+    bool allWithinBounds = true;
+
+    // Prints a row of the table and compares the value with its bound.
+    void report(const std::string& name, double value, double bound, const char* unit);
+    // Runs a child in a new process, whose memory and processor time are only its own. Returns the numbers that the
+    // child returns. Any thread.
+    std::vector<double> inOwnProcess(const std::string& child, const std::vector<std::string>& arguments) const;
 };
 
-class Bench {
-  public:
-    Bench(std::string dataFolder, bool quick) : dataFolder_(std::move(dataFolder)), quick_(quick) {}
+// The groups, and the children that inOwnProcess runs.
+void runDatabase(Bench& bench);
+void runExclusions(Bench& bench);
+void runLink(Bench& bench);
+void runManifest(Bench& bench);
+void runMenu(Bench& bench);
+void runRestore(Bench& bench);
+using Arguments = std::vector<std::string>;
+std::vector<double> measureIdle(const Arguments& arguments);
+std::vector<double> measureManifest(const Arguments& arguments);
+std::vector<double> measurePlanning(const Arguments& arguments);
 
-    // Generated data is kept here from run to run.
-    const std::string& dataFolder() const
-    {
-        return dataFolder_;
-    }
-    bool quick() const
-    {
-        return quick_;
-    }
-    int repetitions() const
-    {
-        return quick_ ? 3 : 7;
-    }
-    // Prints the figure as a line of the table.
-    void report(const Figure& figure);
-    bool allWithinBounds() const
-    {
-        return allWithinBounds_;
-    }
-
-    // Runs `child` with these arguments in a process of its own, so that what it measures of the process is its own
-    // doing. The numbers that it returns come back. Any thread.
-    std::vector<double> inOwnProcess(const std::string& child, const std::vector<std::string>& arguments);
-
-  private:
-    std::string dataFolder_;
-    bool quick_;
-    bool allWithinBounds_ = true;
-};
-
-using ChildBody = std::vector<double> (*)(const std::vector<std::string>& arguments);
-
-// Static objects of these register a group, and a body for inOwnProcess.
-struct Group {
-    Group(const char* name, void (*run)(Bench&));
-};
-struct Child {
-    Child(const char* name, ChildBody body);
-};
-
-// Runs the works in turn, so often; the median of each, in seconds.
+// Runs all works in turn, as often as `repetitions` says. Returns the median of each in seconds.
 std::vector<double> medianSeconds(int repetitions, const std::vector<std::function<void()>>& works);
 
-// Working set of this process, now and at its highest, in bytes.
-double workingSet();
-double peakWorkingSet();
+// The working set of this process in bytes.
+struct WorkingSet {
+    double now;
+    double peak;
+};
+WorkingSet workingSet();
 
 } // namespace tavi::bench

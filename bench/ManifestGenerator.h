@@ -8,30 +8,26 @@
 
 namespace tavi::bench {
 
-// The bench set: files with 81-character paths in folders of about fifty, three versions each, 40-digit digests as aux
-// texts. The same for the same number of files, whatever the order; never in memory as a text.
-enum class FileOrder { kWalk, kRandom };
+// The generated set: files with long paths in folders of fifty, three versions each, with digests of 40 digits. The
+// order changes nothing else. The text is never in memory as a whole.
+enum class FileOrder { walk, random };
 
 struct StoredText {
     std::string file;
-    // Of the uncompressed text.
-    std::uint64_t textBytes;
+    std::string title;
+    std::uint64_t textBytes; // uncompressed
 };
 
-// The path of file `number`; its last kFolderCut characters are the name.
+// Returns the path of a file. The last kNameLength characters are its name.
 constexpr std::size_t kPathLength = 81;
-constexpr std::size_t kFolderCut = 19;
+constexpr std::size_t kNameLength = 19;
 std::string generatedPath(std::uint32_t number);
 
-// The compressed text in the data folder, made there if it is not there yet.
+// Returns the compressed text in the data folder, generated on first use.
 StoredText storedText(const std::string& dataFolder, std::uint32_t files, FileOrder order);
 std::vector<char> readBlob(const std::string& file);
-// Returns the manifest. Throws unless it holds all `files` of the set.
-ManifestRef whole(ManifestRef manifest, std::uint32_t files);
+// Returns the manifest. Throws unless it holds exactly `files` files.
+ManifestRef checked(ManifestRef manifest, std::uint32_t files);
 ManifestRef loadSet(const std::string& file, std::uint32_t files);
-
-// What no reader of a blob can do without: it is inflated into 64 KB and forgotten. Throws unless `expected` bytes came
-// out.
-void inflateOnly(std::vector<char>& blob, std::uint64_t expected);
 
 } // namespace tavi::bench

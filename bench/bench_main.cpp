@@ -4,7 +4,6 @@
 #include <atomic>
 #include <chrono>
 #include <cstdio>
-#include <cstring>
 #include <fstream>
 #include <map>
 #include <stdexcept>
@@ -13,90 +12,53 @@
 
 #include <psapi.h>
 
+#include "core/Handles.h"
+
 namespace tavi::bench {
 namespace {
 
-std::map<std::string, void (*)(Bench&)>& groups()
-{
-    static std::map<std::string, void (*)(Bench&)> all;
-    return all;
-}
-
-std::map<std::string, ChildBody>& children()
-{
-    static std::map<std::string, ChildBody> all;
-    return all;
-}
-
-PROCESS_MEMORY_COUNTERS memoryCounters()
-{
-    PROCESS_MEMORY_COUNTERS counters{};
-    counters.cb = sizeof counters;
-    if (!GetProcessMemoryInfo(GetCurrentProcess(), &counters, sizeof counters))
-        throw std::runtime_error("no memory counters");
-    return counters;
-}
-
-int runAsChild(const std::string& resultFile, const std::string& child, const std::vector<std::string>& arguments)
-{
-    const std::vector<double> numbers = children().at(child)(arguments);
-    std::ofstream result(resultFile);
-    result.precision(17);
-    for (const double number : numbers)
-        result << number << '\n';
-    return result ? 0 : 1;
-}
+const std::map<std::string, void (*)(Bench&)> kGroups = {{"database", runDatabase}, {"exclusions", runExclusions},
+                                                         {"link", runLink},         {"manifest", runManifest},
+                                                         {"menu", runMenu},         {"restore", runRestore}};
+const std::map<std::string, std::vector<double> (*)(const Arguments&)> kChildren = {
+    {"idle", measureIdle}, {"manifest", measureManifest}, {"planning", measurePlanning}};
 
 } // namespace
 
-Group::Group(const char* name, void (*run)(Bench&))
+void Bench::report(const std::string& name, double value, double bound, const char* unit)
 {
-    groups()[name] = run;
-}
-
-Child::Child(const char* name, ChildBody body)
-{
-    children()[name] = body;
-}
-
-void Bench::report(const Figure& figure)
-{
-    const bool bounded = figure.bound != kNoBound;
-    const bool within = figure.value <= figure.bound;
-    allWithinBounds_ = allWithinBounds_ && within;
-    char bound[32] = "";
-    if (bounded)
-        std::snprintf(bound, sizeof bound, "%10.2f", figure.bound);
-    std::printf("%-80s %10.2f %10s %-6s %s\n", figure.name.c_str(), figure.value, bound, figure.unit.c_str(),
-                !bounded ? ""
-                : within ? "ok"
-                         : "MISSED");
+    const bool within = value <= bound;
+    allWithinBounds = allWithinBounds && within;
+    std::printf("%-80s %10.2f ", name.c_str(), value);
+    if (bound == kNoBound)
+        std::printf("%10s %s\n", "", unit);
+    else
+        std::printf("%10.2f %-6s %s\n", bound, unit, within ? "ok" : "MISSED");
     std::fflush(stdout);
 }
 
-std::vector<double> Bench::inOwnProcess(const std::string& child, const std::vector<std::string>& arguments)
+std::vector<double> Bench::inOwnProcess(const std::string& child, const Arguments& arguments) const
 {
     char program[MAX_PATH] = "";
     GetModuleFileNameA(nullptr, program, MAX_PATH);
     static std::atomic<int> started{0};
     const std::string resultFile =
-        dataFolder_ + "/child-" + std::to_string(GetCurrentProcessId()) + "-" + std::to_string(++started) + ".txt";
+        dataFolder + "/child-" + std::to_string(GetCurrentProcessId()) + "-" + std::to_string(++started) + ".txt";
     std::string line = '"' + std::string(program) + "\" --child \"" + resultFile + "\" " + child;
     for (const std::string& argument : arguments)
         line += " \"" + argument + '"';
 
     STARTUPINFOA startup{};
     startup.cb = sizeof startup;
-    PROCESS_INFORMATION process{};
-    if (!CreateProcessA(program, line.data(), nullptr, nullptr, FALSE, 0, nullptr, nullptr, &startup, &process))
+    PROCESS_INFORMATION information{};
+    if (!CreateProcessA(program, line.data(), nullptr, nullptr, FALSE, 0, nullptr, nullptr, &startup, &information))
         throw std::runtime_error("cannot start " + line);
+    const KernelHandle thread(information.hThread), process(information.hProcess);
     constexpr DWORD kLimitMs = 15 * 60 * 1000;
-    if (WaitForSingleObject(process.hProcess, kLimitMs) != WAIT_OBJECT_0)
-        TerminateProcess(process.hProcess, 1);
+    if (WaitForSingleObject(process.get(), kLimitMs) != WAIT_OBJECT_0)
+        TerminateProcess(process.get(), 1);
     DWORD code = 1;
-    GetExitCodeProcess(process.hProcess, &code);
-    CloseHandle(process.hThread);
-    CloseHandle(process.hProcess);
+    GetExitCodeProcess(process.get(), &code);
 
     std::vector<double> numbers;
     std::ifstream result(resultFile);
@@ -127,43 +89,43 @@ std::vector<double> medianSeconds(int repetitions, const std::vector<std::functi
     return medians;
 }
 
-double workingSet()
+WorkingSet workingSet()
 {
-    return static_cast<double>(memoryCounters().WorkingSetSize);
-}
-
-double peakWorkingSet()
-{
-    return static_cast<double>(memoryCounters().PeakWorkingSetSize);
+    PROCESS_MEMORY_COUNTERS counters{};
+    if (!GetProcessMemoryInfo(GetCurrentProcess(), &counters, sizeof counters))
+        throw std::runtime_error("cannot read the memory counters");
+    return {static_cast<double>(counters.WorkingSetSize), static_cast<double>(counters.PeakWorkingSetSize)};
 }
 
 } // namespace tavi::bench
 
-// tavi_bench DATA-FOLDER [--quick] [GROUP...]: all groups, or those named. 1 if a figure missed its bound, 2 if one
-// could not be had.
+// tavi_bench DATA-FOLDER [--quick] [GROUP...] runs all groups, or those named. Returns 1 if a figure exceeds its bound,
+// 2 on failure. tavi_bench --child RESULT-FILE CHILD [ARGUMENT...] stores the numbers of a child.
 int main(int argc, char** argv)
 {
     using namespace tavi::bench;
-    const std::vector<std::string> arguments(argv + 1, argv + argc);
+    Arguments arguments(argv + 1, argv + argc);
     try {
-        if (arguments.size() >= 3 && arguments[0] == "--child")
-            return runAsChild(arguments[1], arguments[2], {arguments.begin() + 3, arguments.end()});
-        if (arguments.empty()) {
-            std::fputs("usage: tavi_bench DATA-FOLDER [--quick] [GROUP...]\n", stderr);
-            return 2;
+        if (arguments.size() >= 3 && arguments[0] == "--child") {
+            std::ofstream result(arguments[1]);
+            result.precision(17);
+            for (const double number : kChildren.at(arguments[2])({arguments.begin() + 3, arguments.end()}))
+                result << number << '\n';
+            return result ? 0 : 1;
         }
-        const bool quick = std::count(arguments.begin(), arguments.end(), "--quick") != 0;
-        Bench bench(arguments[0], quick);
+        if (arguments.empty())
+            throw std::runtime_error("usage: tavi_bench DATA-FOLDER [--quick] [GROUP...]");
+        const auto end = std::remove(arguments.begin(), arguments.end(), "--quick");
+        Bench bench{arguments[0], end != arguments.end()};
+        const Arguments wanted(arguments.begin() + 1, end);
         std::printf("%-80s %10s %10s %-6s\n", "figure", "value", "bound", "unit");
-        std::vector<std::string> wanted(arguments.begin() + 1, arguments.end());
-        wanted.erase(std::remove(wanted.begin(), wanted.end(), "--quick"), wanted.end());
         for (const std::string& name : wanted)
-            groups().at(name);
-        for (const auto& [name, run] : groups()) {
+            kGroups.at(name);
+        for (const auto& [name, run] : kGroups) {
             if (wanted.empty() || std::count(wanted.begin(), wanted.end(), name) != 0)
                 run(bench);
         }
-        return bench.allWithinBounds() ? 0 : 1;
+        return bench.allWithinBounds ? 0 : 1;
     } catch (const std::exception& error) {
         std::fprintf(stderr, "error: %s\n", error.what());
         return 2;

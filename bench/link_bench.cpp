@@ -1,5 +1,7 @@
+#include <algorithm>
 #include <atomic>
 #include <cstring>
+#include <future>
 #include <stdexcept>
 #include <thread>
 
@@ -7,20 +9,22 @@
 #include <wx/datetime.h>
 
 #include "bench/Bench.h"
-#include "bench/BenchInstall.h"
 #include "core/Handles.h"
 #include "core/Options.h"
-#include "manifest/ManifestWatcher.h"
 #include "link/MessageReader.h"
 #include "link/PipeIo.h"
 #include "link/StatusListener.h"
+#include "manifest/ManifestWatcher.h"
+#include "tests/support/Registry.h"
 
 namespace tavi::bench {
 namespace {
 
 using Bytes = std::vector<unsigned char>;
 
-// What a restore sends, over and over.
+constexpr const wchar_t* kStatusPipe = L"\\\\.\\pipe\\tavistatus";
+
+// The messages of a restore, again and again.
 Bytes streamOf(unsigned messages)
 {
     const auto path = std::make_shared<wxString>(L"C:\\Users\\Ana\\Documents\\R\u00E9sum\u00E9 of last year.txt");
@@ -36,36 +40,10 @@ Bytes streamOf(unsigned messages)
     return stream;
 }
 
-class MemorySource final : public ByteSource {
+// A pipe without the reader's pause, which would hide the cost of everything else.
+class UnpacedSource final : public ByteSource {
   public:
-    explicit MemorySource(const Bytes& bytes) : at_(bytes.data()), end_(bytes.data() + bytes.size()) {}
-    bool peek(std::uint32_t& available) override
-    {
-        available = static_cast<std::uint32_t>(end_ - at_);
-        return available > 0;
-    }
-    void pause() override {}
-    bool startRead(unsigned char* into, std::uint32_t size) override
-    {
-        std::memcpy(into, at_, size);
-        at_ += size;
-        return true;
-    }
-    bool finishRead() override
-    {
-        return true;
-    }
-    void abandonRead() override {}
-
-  private:
-    const unsigned char* at_;
-    const unsigned char* const end_;
-};
-
-// A real pipe without the required pause, which would hide what everything else costs.
-class HastySource final : public ByteSource {
-  public:
-    explicit HastySource(HANDLE pipe) : pipe_(pipe) {}
+    explicit UnpacedSource(HANDLE pipe) : pipe_(pipe) {}
     bool peek(std::uint32_t& available) override
     {
         DWORD count = 0;
@@ -89,185 +67,139 @@ class HastySource final : public ByteSource {
     const HANDLE pipe_;
 };
 
-// A pipe's two ends, with the stream written and waiting to be read.
-class FilledPipe {
-  public:
-    explicit FilledPipe(const Bytes& stream)
-    {
-        constexpr const wchar_t* name = L"\\\\.\\pipe\\tavi-link-bench";
-        server_.reset(CreateNamedPipeW(name, PIPE_ACCESS_OUTBOUND, PIPE_TYPE_BYTE, 1, 1 << 22, 0, 0, nullptr));
-        client_.reset(CreateFileW(name, GENERIC_READ, 0, nullptr, OPEN_EXISTING, FILE_ATTRIBUTE_NORMAL, nullptr));
-        DWORD count = 0;
-        if (!client_ || !WriteFile(server_.get(), stream.data(), static_cast<DWORD>(stream.size()), &count, nullptr))
-            throw std::runtime_error("no pipe of the bench's own");
-    }
-    HANDLE client() const
-    {
-        return client_.get();
-    }
-
-  private:
-    FileHandle server_;
-    FileHandle client_;
-};
-
-void expectDone(unsigned read, unsigned messages)
+// Returns both ends of a new pipe that holds the whole stream: the service's and the module's.
+std::pair<FileHandle, FileHandle> filledPipe(const Bytes& stream)
 {
-    if (read != messages)
-        throw std::runtime_error("messages were lost: " + std::to_string(messages - read));
+    constexpr const wchar_t* name = L"\\\\.\\pipe\\tavi-link-bench";
+    FileHandle server(CreateNamedPipeW(name, PIPE_ACCESS_OUTBOUND, PIPE_TYPE_BYTE, 1, 1 << 22, 0, 0, nullptr));
+    FileHandle client(CreateFileW(name, GENERIC_READ, 0, nullptr, OPEN_EXISTING, FILE_ATTRIBUTE_NORMAL, nullptr));
+    DWORD count = 0;
+    if (!client || !WriteFile(server.get(), stream.data(), static_cast<DWORD>(stream.size()), &count, nullptr))
+        throw std::runtime_error("cannot create and fill a pipe");
+    return {std::move(server), std::move(client)};
 }
 
-// The calls that no reader can do without.
-void bareReads(HANDLE pipe, unsigned messages, DWORD pause)
+// Reads one frame by the system calls that every reader needs, and no others.
+bool bareRead(HANDLE pipe, DWORD pauseMs)
 {
     unsigned char bytes[1024];
-    unsigned read = 0;
-    for (DWORD count = 0; read < messages; ++read) {
-        if (!PeekNamedPipe(pipe, nullptr, 0, nullptr, &count, nullptr))
-            break;
-        if (pause > 0)
-            Sleep(pause);
-        if (!ReadFile(pipe, bytes, kFrameHeaderSize, &count, nullptr))
-            break;
-        std::uint32_t length;
-        std::memcpy(&length, bytes + 4, sizeof length);
-        if (!ReadFile(pipe, bytes, length, &count, nullptr))
-            break;
-    }
-    expectDone(read, messages);
+    DWORD count = 0;
+    std::uint32_t length;
+    const BOOL open = PeekNamedPipe(pipe, nullptr, 0, nullptr, &count, nullptr);
+    if (open && pauseMs > 0)
+        Sleep(pauseMs);
+    if (!open || !ReadFile(pipe, bytes, kFrameHeaderSize, &count, nullptr))
+        return false;
+    std::memcpy(&length, bytes + 4, sizeof length);
+    return ReadFile(pipe, bytes, length, &count, nullptr);
 }
 
-double milliseconds(const FILETIME& time)
-{
-    return (time.dwHighDateTime * 4294967296.0 + time.dwLowDateTime) / 1e4;
-}
-
-// User and kernel time of this process. The clock behind it may go in steps of 10 ms.
+// Returns the user and kernel time of this process in milliseconds. Its clock may advance in steps of 10 ms.
 double processorTime()
 {
     FILETIME created, ended, kernel, user;
     GetProcessTimes(GetCurrentProcess(), &created, &ended, &kernel, &user);
+    const auto milliseconds = [](const FILETIME& time) {
+        return (time.dwHighDateTime * 4294967296.0 + time.dwLowDateTime) / 1e4;
+    };
     return milliseconds(kernel) + milliseconds(user);
 }
-constexpr double kClockStep = 10;
+constexpr double kClockStepMs = 10;
 
-void reportTime(Bench& bench, const std::string& name, double time, double step)
+// Returns a work that fills a pipe and reads all messages by one call of `readOne` each. Adds the processor time of the
+// calls to `spent`.
+template <class ReadOne>
+std::function<void()> reading(unsigned messages, double& spent, ReadOne readOne)
 {
-    const bool measurable = time >= step;
-    bench.report({name + (measurable ? "" : ", below"), measurable ? time : step, kNoBound, "ms"});
+    return [stream = streamOf(messages), messages, &spent, readOne] {
+        const auto [server, client] = filledPipe(stream);
+        const double start = processorTime();
+        unsigned read = 0;
+        while (read < messages && readOne(client.get()))
+            ++read;
+        spent += processorTime() - start;
+        if (read != messages)
+            throw std::runtime_error("messages were lost: " + std::to_string(messages - read));
+    };
 }
 
-void messageBench(Bench& bench)
+void reportMessages(Bench& bench)
 {
     const StopCheck never = [] { return false; };
-    const unsigned paced = bench.quick() ? 100 : 200;
-    const Bytes stream = streamOf(paced);
-    const auto bareCalls = [&] {
-        const FilledPipe pipe(stream);
-        bareReads(pipe.client(), paced, 10);
-    };
-    const auto readAndDispatch = [&] {
-        const FilledPipe pipe(stream);
-        std::unique_ptr<PipeMessage> message;
-        unsigned read = 0;
-        for (; read < paced && readMessage(pipe.client(), &message, never); ++read)
-            dispatch(std::move(message));
-        expectDone(read, paced);
-    };
-    const auto pacedTimes = medianSeconds(bench.quick() ? 3 : 5, {bareCalls, readAndDispatch});
-    bench.report({"message from pipe to status / required calls", pacedTimes[1] / pacedTimes[0], 1.05, "x"});
-    bench.report({"message from pipe to status, beyond the required calls",
-                  (pacedTimes[1] - pacedTimes[0]) / paced * 1e6, kNoBound, "us"});
-
-    // In small parts that take turns: what a call to the system costs changes from second to second.
-    constexpr unsigned kPart = 250;
-    const Bytes part = streamOf(kPart);
+    std::unique_ptr<PipeMessage> message;
     TransferStatus status(true, [] { return static_cast<std::uint32_t>(GetTickCount()); });
-    const auto readAll = [&](ByteSource& source, unsigned messages) {
-        unsigned read = 0;
-        for (; read < messages; ++read) {
-            const auto message = readFrame(source, never);
-            if (!message)
-                break;
+    const auto bare = [](DWORD pauseMs) { return [=](HANDLE pipe) { return bareRead(pipe, pauseMs); }; };
+    const auto readAndDispatch = [&](HANDLE pipe) {
+        const bool read = readMessage(pipe, &message, never);
+        if (read)
+            dispatch(std::move(message));
+        return read;
+    };
+    const auto readUnpaced = [&](HANDLE pipe) {
+        UnpacedSource source(pipe);
+        message = readFrame(source, never);
+        if (message)
             status.apply(*message);
-        }
-        expectDone(read, messages);
+        return message != nullptr;
     };
-    double bareProcessor = 0, processor = 0;
-    const auto bareHasty = [&] {
-        const FilledPipe pipe(part);
-        const double start = processorTime();
-        bareReads(pipe.client(), kPart, 0);
-        bareProcessor += processorTime() - start;
-    };
-    const auto hasty = [&] {
-        const FilledPipe pipe(part);
-        HastySource source(pipe.client());
-        const double start = processorTime();
-        readAll(source, kPart);
-        processor += processorTime() - start;
-    };
-    const auto times = medianSeconds(bench.quick() ? 51 : 201, {bareHasty, hasty});
-    bench.report({"message without the pause / required calls", times[1] / times[0], 2, "x"});
-    bench.report({"the same in processor time", processor / bareProcessor, 2, "x"});
-    bench.report({"message without the pause, from a pipe", times[1] / kPart * 1e6, kNoBound, "us"});
+    double required = 0, ours = 0;
+    const unsigned paced = bench.quick ? 100 : 200;
+    const auto pacedTimes =
+        medianSeconds(bench.quick ? 3 : 5, {reading(paced, required, bare(10)), reading(paced, ours, readAndDispatch)});
+    bench.report("message from pipe to status / required calls", pacedTimes[1] / pacedTimes[0], 1.05, "x");
 
-    constexpr unsigned kMany = 20000;
-    const Bytes many = streamOf(kMany);
-    const auto pure = medianSeconds(bench.repetitions(), {[&] {
-                                        MemorySource source(many);
-                                        readAll(source, kMany);
-                                    }});
-    bench.report({"message from memory to status", pure[0] / kMany * 1e9, kNoBound, "ns"});
+    // Small parts in turns, since the cost of a system call changes from second to second.
+    constexpr unsigned kPart = 250;
+    required = ours = 0;
+    const auto times =
+        medianSeconds(bench.quick ? 51 : 201, {reading(kPart, required, bare(0)), reading(kPart, ours, readUnpaced)});
+    bench.report("message without the pause / required calls", times[1] / times[0], 2, "x");
+    bench.report("the same in processor time", ours / required, 2, "x");
+    bench.report("message without the pause, from a pipe", times[1] / kPart * 1e6, kNoBound, "us");
 }
 
-// --- The module at rest
-
-constexpr int kThreads = 32;
+// The idle module: loops of its threads, and the system calls that each of them needs.
+constexpr unsigned kThreads = 32;
 std::atomic<bool> stopAll{false};
-
-bool stopped()
-{
-    return stopAll;
-}
 
 void listen()
 {
-    listenToStatus(stopped);
+    listenToStatus([] { return stopAll.load(); });
+}
+
+FileHandle openStatusPipe()
+{
+    return FileHandle(CreateFileW(kStatusPipe, GENERIC_READ, 0, nullptr, OPEN_EXISTING, 0, nullptr));
 }
 
 void bareAttempts()
 {
-    while (!stopped()) {
-        CreateFileW(L"\\\\.\\pipe\\tavistatus", GENERIC_READ, 0, nullptr, OPEN_EXISTING, 0, nullptr);
-        for (int i = 0; i < 100 && !stopped(); ++i)
+    while (!stopAll) {
+        openStatusPipe();
+        for (int i = 0; i < 100 && !stopAll; ++i)
             Sleep(50);
     }
 }
 
 void barePolling()
 {
-    const FileHandle pipe(CreateFileW(L"\\\\.\\pipe\\tavistatus", GENERIC_READ, 0, nullptr, OPEN_EXISTING, 0, nullptr));
+    const FileHandle pipe = openStatusPipe();
     if (!pipe)
-        throw std::runtime_error("no silent service");
+        throw std::runtime_error("cannot open the pipe of the silent service");
     DWORD count = 0;
-    while (!stopped() && PeekNamedPipe(pipe.get(), nullptr, 0, nullptr, &count, nullptr))
+    while (!stopAll && PeekNamedPipe(pipe.get(), nullptr, 0, nullptr, &count, nullptr))
         Sleep(10);
 }
 
-// As the module has them, but any number of watchers can have a state each. With `rounds` no time passes in them, and
-// so many are done.
+// The module's own services, but each watcher has a state of its own.
 class Services final : public WatcherServices {
   public:
-    explicit Services(unsigned rounds) : inTime_(rounds == 0), left_(rounds) {}
     ManifestRef loadManifest() override
     {
         return Manifest::parse(wxString());
     }
     bool manifestTime(std::int64_t& milliseconds) override
     {
-        if (!inTime_)
-            --left_;
         const auto time = readManifestTime();
         milliseconds = time.value_or(0);
         return time.has_value();
@@ -278,154 +210,99 @@ class Services final : public WatcherServices {
     }
     void sleep(std::uint32_t milliseconds) override
     {
-        if (inTime_)
-            Sleep(milliseconds);
+        Sleep(milliseconds);
     }
     bool isStopping() override
     {
-        return inTime_ ? stopped() : left_ == 0;
+        return stopAll;
     }
     void buildExclusions(bool) override {}
-
-  private:
-    const bool inTime_;
-    unsigned left_;
 };
-
-void runWatcher(unsigned rounds)
-{
-    WatcherState state;
-    Services services(rounds);
-    runManifestWatcher(state, services);
-    state.manifest.replace({});
-}
 
 void watch()
 {
-    runWatcher(0);
-}
-
-void readTime()
-{
-    HKEY key = nullptr;
-    wchar_t text[64];
-    DWORD size = sizeof text;
-    static const wxString name = getSettingsKeyName().AfterFirst(L'\\');
-    RegOpenKeyExW(HKEY_LOCAL_MACHINE, name.wc_str(), 0, KEY_READ, &key);
-    RegQueryValueExW(key, L"options.manifestmtime", nullptr, nullptr, reinterpret_cast<BYTE*>(text), &size);
-    RegCloseKey(key);
+    WatcherState state;
+    Services services;
+    runManifestWatcher(state, services);
 }
 
 void bareWatch()
 {
-    while (!stopped()) {
-        for (int i = 0; i < 10 && !stopped(); ++i)
+    const wxString name = getSettingsKeyName().AfterFirst(L'\\');
+    while (!stopAll) {
+        for (int i = 0; i < 10 && !stopAll; ++i)
             Sleep(500);
-        readTime();
+        RegistryKey key;
+        wchar_t text[64];
+        DWORD size = sizeof text;
+        RegOpenKeyExW(HKEY_LOCAL_MACHINE, name.wc_str(), 0, KEY_READ, key.out());
+        RegQueryValueExW(key.get(), L"options.manifestmtime", nullptr, nullptr, reinterpret_cast<BYTE*>(text), &size);
     }
 }
 
-struct IdleLoop {
+// The module's loop and the bare one.
+constexpr struct {
     const char* name;
-    void (*run)();
-};
-constexpr IdleLoop kLoops[] = {{"listen", listen},
-                               {"attempts", bareAttempts},
-                               {"polling", barePolling},
-                               {"watch", watch},
-                               {"bare-watch", bareWatch}};
+    void (*loops[2])();
+} kPairs[] = {{"listener without a service", {listen, bareAttempts}},
+              {"watcher", {watch, bareWatch}},
+              {"listener of a silent service", {listen, barePolling}}};
 
-// Many at once, so that the steps of the clock do not matter: processor time in all.
-std::vector<double> measureIdle(const std::vector<std::string>& arguments)
+// Measures some of the pairs, all loops at the same time and each in its own process.
+void reportIdle(Bench& bench, std::size_t first, std::size_t end)
 {
-    void (*run)() = nullptr;
-    for (const IdleLoop& loop : kLoops)
-        run = loop.name == arguments.at(0) ? loop.run : run;
+    const std::string seconds = bench.quick ? "5" : "60";
+    const double perMinute = (bench.quick ? 12.0 : 1.0) / kThreads;
+    std::vector<std::future<double>> times;
+    for (std::size_t loop = 2 * first; loop < 2 * end; ++loop)
+        times.push_back(std::async(std::launch::async, [=, &bench] {
+            return bench.inOwnProcess("idle", {std::to_string(loop), seconds})[0] * perMinute;
+        }));
+    for (std::size_t pair = first; pair < end; ++pair) {
+        const std::string name = kPairs[pair].name;
+        const double ours = times[2 * (pair - first)].get(), required = times[2 * (pair - first) + 1].get();
+        bench.report(name + ", a minute", ours, kNoBound, "ms");
+        bench.report(name + ", a minute of the required calls", required, kNoBound, "ms");
+        // A ratio of fewer steps of the clock would be chance.
+        if (std::min(ours, required) >= 10 * kClockStepMs * perMinute)
+            bench.report(name + " / required calls", ours / required, 1.5, "x");
+    }
+}
+
+} // namespace
+
+// Returns the processor time of many threads in a loop, so that the steps of the clock do not matter.
+std::vector<double> measureIdle(const Arguments& arguments)
+{
+    const std::size_t loop = std::stoul(arguments[0]);
     std::vector<std::thread> threads;
-    threads.reserve(kThreads);
-    for (int i = 0; i < kThreads; ++i)
-        threads.emplace_back(run);
-    Sleep(1000); // starting is not being at rest
+    for (unsigned i = 0; i < kThreads; ++i)
+        threads.emplace_back(kPairs[loop / 2].loops[loop % 2]);
+    Sleep(1000); // the start of the threads does not count
     const double start = processorTime();
-    Sleep(static_cast<DWORD>(std::stoul(arguments.at(1)) * 1000));
+    Sleep(static_cast<DWORD>(std::stoul(arguments[1]) * 1000));
     const double spent = processorTime() - start;
     stopAll = true;
     for (std::thread& thread : threads)
         thread.join();
     return {spent};
 }
-const Child idleChild("idle", measureIdle);
 
-// The figures of several loops over the same time, each in a process of its own.
-std::vector<double> idleTimes(Bench& bench, const std::vector<std::string>& loops)
+void runLink(Bench& bench)
 {
-    const std::string seconds = bench.quick() ? "5" : "60";
-    std::vector<double> times(loops.size());
-    std::vector<std::thread> threads;
-    threads.reserve(loops.size());
-    for (std::size_t i = 0; i < loops.size(); ++i)
-        threads.emplace_back([&, i] {
-            try {
-                times[i] = bench.inOwnProcess("idle", {loops[i], seconds})[0];
-            } catch (const std::exception&) {
-                times[i] = -1;
-            }
-        });
-    for (std::thread& thread : threads)
-        thread.join();
-    for (double& time : times) {
-        if (time < 0)
-            throw std::runtime_error("a loop at rest failed");
-        time *= 60 / std::stod(seconds) / kThreads;
-    }
-    return times;
-}
-
-void reportIdle(Bench& bench, const std::string& name, double ours, double bare)
-{
-    const double step = kClockStep * (bench.quick() ? 12 : 1) / kThreads;
-    reportTime(bench, name + ", a minute", ours, step);
-    reportTime(bench, name + ", a minute of the required calls", bare, step);
-    if (ours >= 10 * step && bare >= 10 * step)
-        bench.report({name + " / required calls", ours / bare, 1.5, "x"});
-}
-
-void idleBench(Bench& bench)
-{
+    reportMessages(bench);
+    const test::InstalledService service;
     wxRegKey settings(getSettingsKeyName());
     settings.Create();
     settings.SetValue(L"options.manifestmtime", L"2020-01-02 03:04:05");
-    const auto alone = idleTimes(bench, {"listen", "attempts", "watch", "bare-watch"});
-    reportIdle(bench, "listener without a service", alone[0], alone[1]);
-    reportIdle(bench, "watcher", alone[2], alone[3]);
-
-    std::vector<FileHandle> service;
-    service.reserve(2 * kThreads);
-    for (int i = 0; i < 2 * kThreads; ++i)
-        service.emplace_back(CreateNamedPipeW(L"\\\\.\\pipe\\tavistatus", PIPE_ACCESS_OUTBOUND, PIPE_TYPE_BYTE,
-                                              PIPE_UNLIMITED_INSTANCES, 4096, 0, 0, nullptr));
-    const auto connected = idleTimes(bench, {"listen", "polling"});
-    reportIdle(bench, "listener of a silent service", connected[0], connected[1]);
-
-    const unsigned rounds = bench.quick() ? 1000 : 5000;
-    const auto bareRound = [&] {
-        for (unsigned i = 0; i < rounds; ++i)
-            readTime();
-    };
-    const auto times = medianSeconds(bench.repetitions(), {bareRound, [&] { runWatcher(rounds); }});
     if (!readManifestTime())
         throw std::runtime_error("the time of the manifest was not read");
-    settings.DeleteValue(L"options.manifestmtime");
-    bench.report({"work of a watcher's round / one registry read", times[1] / times[0], kNoBound, "x"});
-    bench.report({"work of a watcher's round", times[1] / rounds * 1e6, kNoBound, "us"});
+    reportIdle(bench, 0, 2);
+    std::vector<FileHandle> pipes;
+    for (unsigned i = 0; i < 2 * kThreads; ++i)
+        pipes.emplace_back(CreateNamedPipeW(kStatusPipe, PIPE_ACCESS_OUTBOUND, PIPE_TYPE_BYTE, PIPE_UNLIMITED_INSTANCES,
+                                            4096, 0, 0, nullptr));
+    reportIdle(bench, 2, 3);
 }
 
-void linkBench(Bench& bench)
-{
-    messageBench(bench);
-    idleBench(bench);
-}
-const Group linkGroup("link", linkBench);
-
-} // namespace
 } // namespace tavi::bench

@@ -2,129 +2,157 @@
 #include <stdexcept>
 
 #include <windows.h>
+#include <zlib.h>
 
-#include "manifest/StoredManifest.h"
 #include "bench/Bench.h"
 #include "bench/ManifestGenerator.h"
 #include "core/Utf8.h"
+#include "manifest/ManifestWatcher.h"
+#include "manifest/StoredManifest.h"
+#include "tests/support/Registry.h"
 
 namespace tavi::bench {
 namespace {
 
-constexpr double kMegabyte = 1e6;
-
-std::string nameOf(std::uint32_t files, FileOrder order)
+// The least work of any reader: inflates the blob into 64 KB and drops the text. Throws unless it has `expected` bytes.
+void inflateOnly(std::vector<char>& blob, std::uint64_t expected)
 {
-    return ", " + std::to_string(files) + (order == FileOrder::kWalk ? " files, walk order" : " files, random order");
+    std::vector<Bytef> out(64 * 1024);
+    z_stream stream{};
+    inflateInit2(&stream, 15 + 32);
+    stream.next_in = reinterpret_cast<Bytef*>(blob.data());
+    stream.avail_in = static_cast<uInt>(blob.size());
+    std::uint64_t total = 0;
+    for (int status = Z_OK; status == Z_OK; total += out.size() - stream.avail_out) {
+        stream.next_out = out.data();
+        stream.avail_out = static_cast<uInt>(out.size());
+        status = inflate(&stream, Z_NO_FLUSH);
+    }
+    inflateEnd(&stream);
+    if (total != expected)
+        throw std::runtime_error("the generated set does not inflate");
+}
+
+// Returns the seconds of inflating the blob and of loading its manifest.
+std::vector<double> loadTimes(int repetitions, const StoredText& text, std::vector<char>& blob,
+                              const std::function<ManifestRef()>& load)
+{
+    ManifestRef manifest;
+    const auto inflate = [&] { inflateOnly(blob, text.textBytes); };
+    return medianSeconds(repetitions, {inflate, [&] { manifest = load(); }, [&] { manifest.reset(); }});
 }
 
 void loadFigures(Bench& bench, std::uint32_t files, FileOrder order)
 {
-    const std::string set = nameOf(files, order);
-    const StoredText text = storedText(bench.dataFolder(), files, order);
+    const StoredText text = storedText(bench.dataFolder, files, order);
     std::vector<char> blob = readBlob(text.file);
-    ManifestRef manifest;
-    // A small set is loaded in less time than the scheduler may take from it: many rounds.
-    const int repetitions = bench.repetitions() * (files < 100000 ? 15 : 1);
-    const auto times =
-        medianSeconds(repetitions, {[&] { inflateOnly(blob, text.textBytes); },
-                                    [&] { manifest = whole(parseStoredManifest(blob.data(), blob.size()), files); },
-                                    [&] { manifest = ManifestRef(); }});
-    bench.report(
-        {"blob to manifest / inflating" + set, times[1] / times[0], order == FileOrder::kWalk ? 1.6 : 1.8, "x"});
-    bench.report({"blob to manifest" + set, times[1] * 1e3, kNoBound, "ms"});
-    bench.report({"destroying" + set, times[2] * 1e3, kNoBound, "ms"});
+    const auto load = [&] { return checked(parseStoredManifest(blob.data(), blob.size()), files); };
+    // The load of a small set is shorter than a time slice of the scheduler, so it has many repetitions.
+    const auto times = loadTimes(bench.repetitions * (files < 100000 ? 15 : 1), text, blob, load);
+    bench.report("blob to manifest / inflating" + text.title, times[1] / times[0], order == FileOrder::walk ? 1.6 : 1.8,
+                 "x");
+    bench.report("blob to manifest" + text.title, times[1] * 1e3, kNoBound, "ms");
 }
-
-// Bytes over the idle process: at the peak of the first load, after it without the blob, at the peak of the second load
-// with the first manifest held; and the address space of the process.
-std::vector<double> measureMemory(const std::vector<std::string>& arguments)
-{
-    const std::uint32_t files = static_cast<std::uint32_t>(std::stoul(arguments[1]));
-    const double idle = workingSet();
-    std::vector<double> numbers;
-    const ManifestRef held = loadSet(arguments[0], files);
-    numbers.push_back(peakWorkingSet() - idle);
-    numbers.push_back(workingSet() - idle);
-    numbers.push_back(static_cast<double>(held->residentBytes()));
-    const ManifestRef next = loadSet(arguments[0], files);
-    numbers.push_back(peakWorkingSet() - idle);
-    MEMORYSTATUSEX memory{};
-    memory.dwLength = sizeof memory;
-    GlobalMemoryStatusEx(&memory);
-    numbers.push_back(static_cast<double>(memory.ullTotalVirtual));
-    return numbers;
-}
-const Child memoryChild("manifest-memory", measureMemory);
 
 void memoryFigures(Bench& bench, std::uint32_t files, FileOrder order)
 {
-    const std::string set = nameOf(files, order);
-    const StoredText text = storedText(bench.dataFolder(), files, order);
-    const auto bytes = bench.inOwnProcess("manifest-memory", {text.file, std::to_string(files)});
+    const StoredText text = storedText(bench.dataFolder, files, order);
+    const auto bytes = bench.inOwnProcess("manifest", {std::to_string(files), text.file});
     const double textBytes = static_cast<double>(text.textBytes);
-    bench.report({"peak of a load, blob included / text" + set, bytes[0] / textBytes, 1.05, "x"});
-    bench.report({"resident after a load, without the blob / text" + set, bytes[1] / textBytes, 0.55, "x"});
-    bench.report({"the manifest's own count of it / text" + set, bytes[2] / textBytes, kNoBound, "x"});
-    bench.report({"peak of a reload, old manifest held / text" + set, bytes[3] / textBytes, 1.6, "x"});
-    bench.report({"peak of a reload" + set, bytes[3] / kMegabyte, kNoBound, "MB"});
-    // A file manager may be given no more than this: a bench that had more would prove nothing about it.
-    bench.report({"address space" + set, bytes[4] / kMegabyte, 2048 * 1.048576, "MB"});
+    bench.report("peak of a load, blob included / text" + text.title, bytes[0] / textBytes, 1.05, "x");
+    bench.report("resident after a load, without the blob / text" + text.title, bytes[1] / textBytes, 0.55, "x");
+    bench.report("peak of a reload, old manifest held / text" + text.title, bytes[2] / textBytes, 1.6, "x");
+    bench.report("peak of a reload" + text.title, bytes[2] / 1e6, kNoBound, "MB");
+    // A file manager may have no more than this, so the figures above must not come from a larger address space.
+    bench.report("address space" + text.title, bytes[3] / 1e6, 2048 * 1.048576, "MB");
 }
 
-void questionFigures(Bench& bench, std::uint32_t files)
+void questionFigures(Bench& bench)
 {
     constexpr std::size_t kQuestions = 50000;
     constexpr std::size_t kSelection = 1000;
-    const ManifestRef manifest = loadSet(storedText(bench.dataFolder(), files, FileOrder::kWalk).file, files);
+    const ManifestRef manifest = loadSet(storedText(bench.dataFolder, bench.files, FileOrder::walk).file, bench.files);
     std::mt19937 random(1);
     std::vector<std::wstring> paths, folders, partial, missing;
     for (std::size_t i = 0; i < kQuestions; ++i) {
-        const std::string path = generatedPath(static_cast<std::uint32_t>(random()) % files);
+        const std::string path = generatedPath(static_cast<std::uint32_t>(random()) % bench.files);
         paths.push_back(fromUtf8(path).ToStdWstring());
-        folders.push_back(paths.back().substr(0, kPathLength - kFolderCut));
+        folders.push_back(paths.back().substr(0, kPathLength - kNameLength));
         partial.push_back(paths.back().substr(0, kPathLength - 5));
         missing.push_back(folders.back() + L"nothing");
     }
-    std::size_t answers = 0;
-    const auto under = [&](const std::vector<std::wstring>& all, std::size_t count) {
-        for (std::size_t i = 0; i < count; ++i)
-            answers += manifest->hasBackedUpUnder(all[i], kAnyTime) ? 1u : 0u;
+    std::size_t found = 0;
+    const auto lookUp = [&] {
+        for (const std::wstring& path : paths)
+            found += manifest->findPatches(path) ? 1u : 0u;
     };
-    const auto times = medianSeconds(bench.repetitions(), {
-                                                              [&] {
-                                                                  for (const auto& path : paths)
-                                                                      answers += manifest->findPatches(path) ? 1u : 0u;
-                                                              },
-                                                              [&] { under(folders, kQuestions); },
-                                                              [&] { under(partial, kQuestions); },
-                                                              [&] { under(missing, kQuestions); },
-                                                              [&] { under(folders, kSelection); },
-                                                          });
-    if (answers != (3 * kQuestions + kSelection) * static_cast<std::size_t>(bench.repetitions()))
+    const auto under = [&](const std::vector<std::wstring>& prefixes, std::size_t count) {
+        return [&, count] {
+            for (std::size_t i = 0; i < count; ++i)
+                found += manifest->hasBackedUpUnder(prefixes[i], kAnyTime) ? 1u : 0u;
+        };
+    };
+    const auto times = medianSeconds(bench.repetitions, {lookUp, under(folders, kQuestions), under(partial, kQuestions),
+                                                         under(missing, kQuestions), under(folders, kSelection)});
+    if (found != (3 * kQuestions + kSelection) * static_cast<std::size_t>(bench.repetitions))
         throw std::runtime_error("wrong answers");
-    const std::string at = ", " + std::to_string(files) + " files";
-    bench.report({"exact lookup" + at, times[0] / kQuestions * 1e6, 2, "us"});
-    bench.report({"prefix question, a folder" + at, times[1] / kQuestions * 1e6, 5, "us"});
-    bench.report({"prefix question, part of a name" + at, times[2] / kQuestions * 1e6, 5, "us"});
-    bench.report({"prefix question, nothing there" + at, times[3] / kQuestions * 1e6, 5, "us"});
-    bench.report({"selection of 1000 folders" + at, times[4] * 1e3, 4, "ms"});
+    const std::string at = ", " + std::to_string(bench.files) + " files";
+    bench.report("exact lookup" + at, times[0] / kQuestions * 1e6, 2, "us");
+    bench.report("prefix question, a folder" + at, times[1] / kQuestions * 1e6, 5, "us");
+    bench.report("prefix question, part of a name" + at, times[2] / kQuestions * 1e6, 5, "us");
+    bench.report("prefix question, nothing there" + at, times[3] / kQuestions * 1e6, 5, "us");
+    bench.report("selection of 1000 folders" + at, times[4] * 1e3, 4, "ms");
 }
-
-void manifestBench(Bench& bench)
-{
-    const std::uint32_t most = bench.quick() ? 100000 : 1000000;
-    for (std::uint32_t files = 10000; files <= most; files *= 10) {
-        loadFigures(bench, files, FileOrder::kWalk);
-        loadFigures(bench, files, FileOrder::kRandom);
-    }
-    memoryFigures(bench, most, FileOrder::kWalk);
-    memoryFigures(bench, most, FileOrder::kRandom);
-    if (!bench.quick())
-        memoryFigures(bench, 2 * most, FileOrder::kWalk);
-    questionFigures(bench, most);
-}
-const Group manifestGroup("manifest", manifestBench);
 
 } // namespace
+
+// Returns bytes: the peak of a load, the manifest without its blob, and the peak of a second load beside the first
+// manifest, all over the idle process; then the address space. Without a file the manifest comes from the database.
+std::vector<double> measureManifest(const Arguments& arguments)
+{
+    const auto files = static_cast<std::uint32_t>(std::stoul(arguments[0]));
+    const auto load = [&] {
+        return arguments.size() == 1 ? checked(readStoredManifest(), files) : loadSet(arguments[1], files);
+    };
+    const double idle = workingSet().now;
+    const ManifestRef held = load();
+    const double peak = workingSet().peak - idle;
+    const double resident = workingSet().now - idle;
+    const ManifestRef next = load();
+    MEMORYSTATUSEX memory{};
+    memory.dwLength = sizeof memory;
+    GlobalMemoryStatusEx(&memory);
+    return {peak, resident, workingSet().peak - idle, static_cast<double>(memory.ullTotalVirtual)};
+}
+
+void runDatabase(Bench& bench)
+{
+    const StoredText text = storedText(bench.dataFolder, bench.files, FileOrder::walk);
+    const std::string at = ", " + std::to_string(bench.files) + " files";
+    const test::InstalledService service;
+    service.createTables();
+    std::vector<char> blob = readBlob(text.file);
+    service.storeManifest({blob.data(), blob.size()});
+    const auto load = [&] { return checked(readStoredManifest(), bench.files); };
+    const auto times = loadTimes(bench.quick ? 3 : 5, text, blob, load);
+    bench.report("database to manifest / inflating" + at, times[1] / times[0], 2.5, "x");
+    const auto bytes = bench.inOwnProcess("manifest", {std::to_string(bench.files)});
+    const auto textBytes = static_cast<double>(text.textBytes);
+    bench.report("peak of a load from the database / text" + at, bytes[0] / textBytes, 1.05, "x");
+    bench.report("peak of a reload from the database / text" + at, bytes[2] / textBytes, 1.6, "x");
+}
+
+void runManifest(Bench& bench)
+{
+    for (std::uint32_t files = 10000; files <= bench.files; files *= 10) {
+        loadFigures(bench, files, FileOrder::walk);
+        loadFigures(bench, files, FileOrder::random);
+    }
+    memoryFigures(bench, bench.files, FileOrder::walk);
+    memoryFigures(bench, bench.files, FileOrder::random);
+    if (!bench.quick)
+        memoryFigures(bench, 2 * bench.files, FileOrder::walk);
+    questionFigures(bench);
+}
+
 } // namespace tavi::bench
