@@ -5,16 +5,16 @@
 #include <wx/log.h>
 #include <zlib.h>
 
-#include "manifest/StoredManifest.h"
 #include "core/Utf8.h"
+#include "manifest/StoredManifest.h"
 
 namespace {
 
 using namespace tavi;
 
-void require(bool truth)
+void require(bool condition)
 {
-    if (!truth)
+    if (!condition)
         std::abort();
 }
 
@@ -27,8 +27,8 @@ std::string packed(const std::uint8_t* bytes, std::size_t length)
     return out;
 }
 
-// Every file must be found by its path and under every beginning of it.
-void checkAnswers(const Manifest& manifest)
+// Looks up every file by its path and by a prefix of it.
+void checkLookups(const Manifest& manifest)
 {
     for (std::uint32_t file = 0; file < manifest.fileCount(); ++file) {
         const wxString path = manifest.filePath(file);
@@ -37,7 +37,7 @@ void checkAnswers(const Manifest& manifest)
         for (std::size_t i = 0; i < patches->size(); ++i)
             (void)(*patches)[i].auxText();
         const std::wstring_view prefix = view(path).substr(0, file % (path.length() + 1));
-        // Half a character is only told from a whole one where wide characters have 16 bits.
+        // Half a surrogate pair also matches the whole pair, which 32-bit wide characters do not show.
         if (!prefix.empty() && prefix.back() >= 0xD800 && prefix.back() <= 0xDBFF)
             continue;
         bool visited = false;
@@ -52,7 +52,7 @@ void checkAnswers(const Manifest& manifest)
 
 } // namespace
 
-// The input is a text, if its first byte is even, or a blob as it stands.
+// If the first byte is even, the other bytes are a text, which is compressed here; otherwise they are a blob.
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t length)
 {
     static const bool quiet = wxLog::EnableLogging(false);
@@ -62,19 +62,20 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t len
     if (bytes[0] % 2 != 0) {
         const ManifestRef manifest = parseStoredManifest(bytes + 1, length - 1);
         if (manifest)
-            checkAnswers(*manifest);
+            checkLookups(*manifest);
         return 0;
     }
-    // A character that an earlier input left half would otherwise begin this one.
-    const std::uint8_t fault[] = {0xFF};
-    const std::string clear = packed(fault, 1);
-    parseStoredManifest(clear.data(), clear.size());
+    // The parser keeps an incomplete character for the next text. A malformed text clears it, so that an input does not
+    // depend on the one before.
+    const std::uint8_t malformed[] = {0xFF};
+    const std::string clearing = packed(malformed, 1);
+    parseStoredManifest(clearing.data(), clearing.size());
 
     const std::string blob = packed(bytes + 1, length - 1);
     const ManifestRef stored = parseStoredManifest(blob.data(), blob.size());
     if (stored)
-        checkAnswers(*stored);
-    // Where the whole text is sound, the wide text must give the same manifest.
+        checkLookups(*stored);
+    // If the whole text is well-formed, the wide text must give the same manifest.
     const std::string text(reinterpret_cast<const char*>(bytes + 1), length - 1);
     const wxString wide = fromUtf8(text);
     if (toUtf8(view(wide)) != text || text.find('\0') != std::string::npos)

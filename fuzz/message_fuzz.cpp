@@ -10,7 +10,7 @@ namespace {
 
 using namespace tavi;
 
-// A peer that sends the input, as many bytes at a time as the input itself says.
+// A peer that sends the input. Every read but the first returns at most as many bytes as its first byte says, plus one.
 class Peer : public ByteSource {
   public:
     Peer(const std::uint8_t* bytes, std::size_t length) : bytes_(bytes), length_(length) {}
@@ -49,7 +49,7 @@ std::uint32_t clock()
 
 } // namespace
 
-// Whatever arrives is applied; a message that is written and read again must be the same one.
+// Applies every message to a status. A message that is serialised, read and serialised again must have the same bytes.
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t length)
 {
     static TransferStatus status(false, clock);

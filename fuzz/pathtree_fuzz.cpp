@@ -11,11 +11,11 @@ namespace {
 using namespace tavi;
 
 constexpr std::size_t kMostRules = 40;
-constexpr unsigned kStates = 10; // 9 is unknown
+constexpr unsigned kStates = 10; // 9 is no known state
 constexpr unsigned kDeepest = 6;
 constexpr const char* kNames = "abc";
 
-// Takes the input apart; behind its end come zeros.
+// Reads the input byte by byte. Returns 0 after the end.
 class Bytes {
   public:
     Bytes(const std::uint8_t* bytes, std::size_t length) : left_(reinterpret_cast<const char*>(bytes), length) {}
@@ -38,12 +38,13 @@ class Bytes {
 
 } // namespace
 
-// The first byte seeds the numbers of entries; each rule is a byte of state and depth and one byte per name.
+// Inserts the same rules into the tree and its model, and compares their states. The first byte seeds the entry counts.
+// Each rule has a byte for state and depth, and a byte for each name of its path.
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t length)
 {
     Bytes input(bytes, length);
     const std::size_t seed = input.next();
-    // None at all, fewer entries than names, as many, or more.
+    // From no entries to more than there are names.
     const EntryCounter counter = [seed](const wxString& folder, bool) {
         std::size_t sum = seed;
         for (const wchar_t character : view(folder))
