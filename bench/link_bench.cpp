@@ -70,9 +70,9 @@ class UnpacedSource final : public ByteSource {
 // Returns both ends of a new pipe that holds the whole stream: the service's and the module's.
 std::pair<FileHandle, FileHandle> filledPipe(const Bytes& stream)
 {
-    constexpr const wchar_t* name = L"\\\\.\\pipe\\tavi-link-bench";
-    FileHandle server(CreateNamedPipeW(name, PIPE_ACCESS_OUTBOUND, PIPE_TYPE_BYTE, 1, 1 << 22, 0, 0, nullptr));
-    FileHandle client(CreateFileW(name, GENERIC_READ, 0, nullptr, OPEN_EXISTING, FILE_ATTRIBUTE_NORMAL, nullptr));
+    constexpr const wchar_t* kName = L"\\\\.\\pipe\\tavi-link-bench";
+    FileHandle server(CreateNamedPipeW(kName, PIPE_ACCESS_OUTBOUND, PIPE_TYPE_BYTE, 1, 1 << 22, 0, 0, nullptr));
+    FileHandle client(CreateFileW(kName, GENERIC_READ, 0, nullptr, OPEN_EXISTING, FILE_ATTRIBUTE_NORMAL, nullptr));
     DWORD count = 0;
     if (!client || !WriteFile(server.get(), stream.data(), static_cast<DWORD>(stream.size()), &count, nullptr))
         throw std::runtime_error("cannot create and fill a pipe");
