@@ -16,15 +16,17 @@ constexpr std::string_view kUserHeader = "USER";
 constexpr std::string_view kFilesHeader = "FILES";
 constexpr std::string_view kHashMark = "_hash|";
 constexpr unsigned kSeparatorNewlines = 3;
-constexpr std::size_t kMostFields = 8;
+constexpr std::size_t kMaxFields = 8;
+// Every number of so many digits fits 32 bits.
+constexpr std::ptrdiff_t kMaxSizeDigits = 9;
 
 bool isDigit(char c) noexcept
 {
     return c >= '0' && c <= '9';
 }
 
-// Lenient: leading white space and a sign are allowed, the first character that is no digit ends the number, nothing
-// gives 0. What does not fit wraps, so that a negative time and one beyond 2038 keep their 32 bits.
+// Converts leniently: allows leading white space and a sign, ends at the first character that is no digit, and returns
+// 0 without digits. A number that is too large wraps, so that a negative time and one beyond 2038 keep their 32 bits.
 std::uint64_t toNumber(std::string_view text, unsigned base = 10) noexcept
 {
     std::size_t at = std::min(text.find_first_not_of(" \t\v\f\r"), text.size());
@@ -47,7 +49,8 @@ std::int64_t toSize(std::string_view text) noexcept
     return static_cast<std::int64_t>(toNumber(text));
 }
 
-// A pair of surrogates in their three-byte forms is one character in the wide text, and must be found as such.
+// Converts each pair of surrogates in three-byte form to one sequence of four bytes, the form in which a wide path is
+// looked up.
 std::string joinSurrogates(std::string_view text)
 {
     return toUtf8(view(fromUtf8(text)));
@@ -58,37 +61,26 @@ bool mayHaveSurrogates(std::string_view text) noexcept
     return text.find('\xED') != std::string_view::npos;
 }
 
-const char* findNewline(const char* at, const char* end) noexcept
+// Reads digits, which wrap, and the colon behind them. Returns the number of digits, 0 without a colon.
+std::ptrdiff_t readNumber(const char*& at, std::uint32_t& number) noexcept
 {
-    constexpr std::uint32_t kOnes = 0x01010101u;
-    for (std::uint32_t word = 0; end - at >= 4; at += 4) {
-        std::memcpy(&word, at, sizeof word);
-        word ^= '\n' * kOnes;
-        if (((word - kOnes) & ~word & (kOnes << 7)) != 0)
-            break;
-    }
-    while (at != end && *at != '\n')
-        ++at;
-    return at;
-}
-
-// Reads up to nine digits, which always fit, and passes over the colon behind them.
-bool readShort(const char*& at, std::uint32_t& number) noexcept
-{
-    const char* from = at;
+    const char* const from = at;
     number = 0;
     while (isDigit(*at))
         number = number * 10 + static_cast<std::uint32_t>(*at++ - '0');
-    return at != from && at - from <= 9 && *at++ == ':';
+    const std::ptrdiff_t digits = at - from;
+    return *at++ == ':' ? digits : 0;
 }
 
 bool readTime(const char*& at, std::uint32_t& number) noexcept
 {
-    const char* from = at;
-    number = 0;
-    while (isDigit(*at))
-        number = number * 10 + static_cast<std::uint32_t>(*at++ - '0');
-    return at != from && *at++ == ':';
+    return readNumber(at, number) != 0;
+}
+
+bool readSize(const char*& at, std::uint32_t& number) noexcept
+{
+    const std::ptrdiff_t digits = readNumber(at, number);
+    return digits != 0 && digits <= kMaxSizeDigits;
 }
 
 bool readZero(const char*& at) noexcept
@@ -112,13 +104,13 @@ void ManifestParser::feed(const char* bytes, std::size_t length)
             if (at == end)
                 return;
         }
-        const char* const newline = findNewline(at, end);
-        const std::string_view part(at, static_cast<std::size_t>(newline - at));
-        if (newline == end) {
-            keepForLater(part);
+        const std::string_view rest(at, static_cast<std::size_t>(end - at));
+        const std::string_view part = rest.substr(0, rest.find('\n'));
+        if (part.size() == rest.size()) {
+            carry(part);
             return;
         }
-        at = newline + 1;
+        at += part.size() + 1;
         if (carry_.empty()) {
             endLine(part);
         } else {
@@ -129,8 +121,9 @@ void ManifestParser::feed(const char* bytes, std::size_t length)
     }
 }
 
-// The form that nearly every line has, taken in one pass: eight fields, plain numbers, nothing to carry but a digest.
-// Stops before the first line that is anything else; the zero byte behind the slice looks like one.
+// Parses lines of the most frequent form in one pass: eight fields of plain numbers, the aux text a digest and the
+// other aux values 0. Returns the first line of any other form, or the end. The zero byte behind the slice matches no
+// field.
 const char* ManifestParser::feedVersions(const char* at, const char* end)
 {
     storage::VersionStore& versions = builder_->versions();
@@ -138,7 +131,7 @@ const char* ManifestParser::feedVersions(const char* at, const char* end)
         const char* field = at;
         storage::PackedVersion& version = versions.next();
         if (!readTime(field, version.timestamp) || !readTime(field, version.modifiedTime) ||
-            !readTime(field, version.ctime) || !readShort(field, version.sizeLow) || !readZero(field))
+            !readTime(field, version.ctime) || !readSize(field, version.sizeLow) || !readZero(field))
             break;
         version.sizeHigh = 0;
         constexpr std::ptrdiff_t kDigest = 2 * sizeof version.digest;
@@ -158,12 +151,12 @@ const char* ManifestParser::feedVersions(const char* at, const char* end)
     return at;
 }
 
-void ManifestParser::keepForLater(std::string_view part)
+void ManifestParser::carry(std::string_view part)
 {
-    if (section_ == Section::kHeader && carry_.size() + part.size() > kFilesHeader.size())
-        section_ = Section::kSkipped;
-    if (section_ == Section::kSkipped)
-        // That the line is not empty is all that matters of it.
+    if (section_ == Section::header && carry_.size() + part.size() > kFilesHeader.size())
+        section_ = Section::skipped;
+    if (section_ == Section::skipped)
+        // Only whether the line is empty matters.
         carry_ = "?";
     else
         carry_ += part;
@@ -173,38 +166,38 @@ void ManifestParser::endLine(std::string_view line)
 {
     newlines_ = line.empty() ? newlines_ + 1 : 1;
     if (newlines_ == kSeparatorNewlines) {
-        // The newlines of the separator belong to no section.
-        if (section_ == Section::kUser && userText_.size() < kSeparatorNewlines - 1)
-            section_ = Section::kSkipped;
-        else if (section_ == Section::kUser)
+        // The newlines of the separator are not part of the section.
+        if (section_ == Section::user && userText_.size() < kSeparatorNewlines - 1)
+            section_ = Section::skipped;
+        else if (section_ == Section::user)
             userText_.resize(userText_.size() - (kSeparatorNewlines - 1));
         endSection();
         return;
     }
     switch (section_) {
-    case Section::kHeader:
-        section_ = line == kUserHeader ? Section::kUser : line == kFilesHeader ? Section::kFiles : Section::kSkipped;
+    case Section::header:
+        section_ = line == kUserHeader ? Section::user : line == kFilesHeader ? Section::files : Section::skipped;
         break;
-    case Section::kUser:
+    case Section::user:
         userText_ += line;
         userText_ += '\n';
         break;
-    case Section::kFiles:
-        fileLine(line, false);
+    case Section::files:
+        addFileLine(line, false);
         break;
-    case Section::kSkipped:
+    case Section::skipped:
         break;
     }
 }
 
 void ManifestParser::endSection()
 {
-    if (section_ == Section::kUser)
+    if (section_ == Section::user)
         endUserSection();
-    if (section_ == Section::kFiles)
-        flushFile();
+    if (section_ == Section::files)
+        endFile();
     userText_.clear();
-    section_ = Section::kHeader;
+    section_ = Section::header;
     newlines_ = 0;
 }
 
@@ -223,14 +216,15 @@ void ManifestParser::endUserSection()
     builder_->setUserText(fromUtf8(userText_));
 }
 
-void ManifestParser::fileLine(std::string_view line, bool last)
+void ManifestParser::addFileLine(std::string_view line, bool isLast)
 {
     if (hasPath_) {
-        // The empty line behind a lone newline at the end of the text is a version of zeros: the format has it so.
-        if (line.empty() && !last)
-            flushFile();
+        // Behind a newline at the end of the text one more line begins, empty: a version of zeros. The service parses
+        // its manifests alike, and both must see the same versions.
+        if (line.empty() && !isLast)
+            endFile();
         else
-            patchLine(line);
+            addPatchLine(line);
     } else if (!line.empty()) {
         if (mayHaveSurrogates(line))
             path_ = joinSurrogates(line);
@@ -241,7 +235,7 @@ void ManifestParser::fileLine(std::string_view line, bool last)
     }
 }
 
-void ManifestParser::patchLine(std::string_view line)
+void ManifestParser::addPatchLine(std::string_view line)
 {
     if (addPatch(line))
         return;
@@ -253,17 +247,17 @@ void ManifestParser::patchLine(std::string_view line)
 
 bool ManifestParser::addPatch(std::string_view line)
 {
-    std::array<std::string_view, kMostFields> fields;
+    std::array<std::string_view, kMaxFields> fields;
     std::size_t count = 0;
     for (std::size_t at = 0; at <= line.size();) {
-        if (count == kMostFields)
+        if (count == kMaxFields)
             return false;
         const std::size_t colon = std::min(line.find(':', at), line.size());
         fields[count++] = line.substr(at, colon - at);
         at = colon + 1;
     }
 
-    // Fields that are not there are empty, and so 0. Seven fields are laid out as six, the last of them given twice.
+    // Missing fields are empty and so 0. Seven fields are laid out as six; the seventh replaces the sixth.
     const std::size_t times = count == 8 ? 3 : count >= 6 ? 2 : 1;
     const std::string_view* rest = fields.data() + times;
     const std::string_view aux2 = count == 7 ? fields[6] : rest[3];
@@ -278,13 +272,13 @@ bool ManifestParser::addPatch(std::string_view line)
         version.attributes = count == 8 ? static_cast<std::uint32_t>(toNumber(fields[7], 8)) : 0;
         builder_->keepVersion(toSize(rest[1]), toSize(aux2), rest[2]);
     } catch (const std::bad_alloc&) {
-        // A version for which there is no memory makes its line invalid.
+        // Without memory for the version its line counts as invalid, which the callers handle and log.
         return false;
     }
     return true;
 }
 
-void ManifestParser::flushFile()
+void ManifestParser::endFile()
 {
     if (hasPath_ && builder_->versions().size() > firstVersion_)
         builder_->addFile(path_, firstVersion_);
@@ -293,10 +287,10 @@ void ManifestParser::flushFile()
 
 ManifestRef ManifestParser::finish(std::uint32_t units)
 {
-    if (builder_ && section_ == Section::kUser)
+    if (builder_ && section_ == Section::user)
         userText_ += carry_;
-    if (builder_ && section_ == Section::kFiles)
-        fileLine(carry_, true);
+    if (builder_ && section_ == Section::files)
+        addFileLine(carry_, true);
     if (!builder_)
         return {};
     endSection();

@@ -10,40 +10,37 @@
 
 namespace tavi {
 
-// The line machine of the manifest text, fed as the bytes arrive. The text is well-formed UTF-8, in which surrogates
-// may stand in their three-byte form; slices may end anywhere. One thread.
+// Parses the manifest text as its bytes arrive. The text is well-formed UTF-8, in which surrogates may have their
+// three-byte form; slices may end anywhere. One thread.
 class ManifestParser {
   public:
     ManifestParser();
 
-    // A zero byte must stand behind the bytes.
+    // Parses the next slice; a zero byte must follow its bytes. After an invalid line, which is logged, slices are
+    // ignored.
     void feed(const char* bytes, std::size_t length);
-    // Whether a line was invalid; it has been logged, and what is fed after it counts for nothing.
-    bool failed() const noexcept
-    {
-        return !builder_;
-    }
-    // The text is complete and has this many UTF-16 units. Returns null if a line was invalid.
+    // Ends the text, whose length in UTF-16 units is `units`. Returns null if a line was invalid.
     ManifestRef finish(std::uint32_t units);
 
   private:
-    enum class Section { kHeader, kUser, kFiles, kSkipped };
+    enum class Section { header, user, files, skipped };
 
     const char* feedVersions(const char* at, const char* end);
-    void keepForLater(std::string_view part);
+    void carry(std::string_view part);
     void endLine(std::string_view line);
     void endSection();
     void endUserSection();
-    void fileLine(std::string_view line, bool last);
-    void patchLine(std::string_view line);
+    void addFileLine(std::string_view line, bool isLast);
+    void addPatchLine(std::string_view line);
     bool addPatch(std::string_view line);
-    void flushFile();
+    void endFile();
 
+    // Empty after an invalid line.
     std::optional<ManifestBuilder> builder_;
-    Section section_ = Section::kHeader;
-    // Newlines that stand directly before this point of the section.
+    Section section_ = Section::header;
+    // The newlines directly before the current line, within its section.
     unsigned newlines_ = 0;
-    // The part of the current line that earlier slices brought.
+    // The part of the current line that was in earlier slices.
     std::string carry_;
     std::string userText_;
     std::string path_;

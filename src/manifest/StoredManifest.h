@@ -6,9 +6,9 @@
 
 namespace tavi {
 
-// Returns the manifest of a stored blob: UTF-8 text, compressed with a zlib or gzip header. It is an empty manifest for
-// an empty text, null for a text with an invalid line. The text ends at its first zero byte, at the first byte that is
-// not UTF-8, or where the compressed data break off.
+// Parses a stored blob: UTF-8 text, compressed with a zlib or gzip header. Returns an empty manifest for an empty text,
+// null for a text with an invalid line, which is logged. The text ends at its first zero byte, at the first byte that
+// is not UTF-8, or where the compressed data are cut off.
 ManifestRef parseStoredManifest(const void* bytes, std::size_t length);
 
 } // namespace tavi
