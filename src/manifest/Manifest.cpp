@@ -6,7 +6,7 @@
 namespace tavi {
 namespace {
 
-// What a manifest without a hash line has: the SHA-1 digest of nothing.
+// The hash of a manifest without a hash line: the SHA-1 digest of no bytes.
 constexpr const char* kEmptyInputHash = "da39a3ee5e6b4b0d3255bfef95601890afd80709";
 
 constexpr wchar_t kFirstLowSurrogate = 0xDC00;
@@ -45,10 +45,10 @@ wxString ManifestPatch::auxText() const
     return fromUtf8(text);
 }
 
-std::optional<std::size_t> ManifestPatchList::decidingAt(std::uint32_t time) const noexcept
+std::optional<std::size_t> ManifestPatchList::newestUpTo(std::uint32_t time) const noexcept
 {
     for (std::size_t i = size(); i-- > 0;) {
-        if (time == 0 || manifest_->versions_[first_ + static_cast<std::uint32_t>(i)].timestamp <= time)
+        if (manifest_->versions_[first_ + static_cast<std::uint32_t>(i)].timestamp <= time)
             return i;
     }
     return std::nullopt;
@@ -56,7 +56,9 @@ std::optional<std::size_t> ManifestPatchList::decidingAt(std::uint32_t time) con
 
 bool ManifestPatchList::existsAt(std::uint32_t time) const noexcept
 {
-    const auto deciding = decidingAt(time);
+    // No timestamp is above kAnyTime. A restore, which must not bring back anything newer than its time, takes 0 as
+    // 1970 instead.
+    const auto deciding = newestUpTo(time == 0 ? kAnyTime : time);
     return deciding && !(*this)[*deciding].isDeletion();
 }
 
@@ -64,8 +66,8 @@ Manifest::Manifest() : hash_(kEmptyInputHash) {}
 
 ManifestRef Manifest::parse(const wxString& text)
 {
-    // In slices, so that no second copy of the whole text ever stands beside the first. The parser joins what that cuts
-    // apart.
+    // In slices, so that there is never a second copy of the whole text. The parser joins surrogate pairs that a slice
+    // cuts in two.
     constexpr std::size_t kSlice = 16 * 1024;
     ManifestParser parser;
     std::string bytes;
@@ -141,8 +143,8 @@ Manifest::FileRanges Manifest::filesUnder(std::wstring_view prefix) const
     const auto firstFileOf = [this](std::uint32_t folder) {
         return folder < folders_.size() ? folders_[folder].firstFile : files_.size();
     };
-    // Paths from `low` up to but not including `high`, which have everything before `high`'s last character in common:
-    // those in one folder, whose names go on where the text ends, and those in folders that begin with it.
+    // Finds the paths from `low` up to but not including `high`, which have all bytes but `high`'s last in common:
+    // files of one folder whose names continue the text, and all files of the folders that begin with it.
     const auto between = [&](const std::string& low, const std::string& high, FileRange& names, FileRange& folders) {
         folders = {firstFileOf(firstFolderFrom(low)), firstFileOf(firstFolderFrom(high))};
         const SplitPath split = splitPath(low);
@@ -153,17 +155,17 @@ Manifest::FileRanges Manifest::filesUnder(std::wstring_view prefix) const
         names = {firstNameFrom(files, split.name), firstNameFrom(files, splitPath(high).name)};
     };
 
-    // No path holds this byte, so it stands behind every continuation of a text.
-    constexpr char kBehindAll = '\xFF';
+    // Not part of UTF-8, so greater than every continuation of a path.
+    constexpr char kAboveAll = '\xFF';
     FileRanges found;
     FileRange(&ranges)[4] = found.ranges;
     std::string low = toUtf8(prefix);
-    between(low, low + kBehindAll, ranges[0], ranges[2]);
-    if (!prefix.empty() && isHighSurrogate(static_cast<char32_t>(prefix.back()))) {
-        // The prefix ends within a character: every character that begins with this half fits too.
+    between(low, low + kAboveAll, ranges[0], ranges[2]);
+    if (!prefix.empty() && isHighSurrogate(prefix.back())) {
+        // The prefix ends within a character: paths with any character that begins with this half match too.
         const std::wstring whole(prefix);
         low = toUtf8(whole + kFirstLowSurrogate);
-        between(low, toUtf8(whole + kLastLowSurrogate) + kBehindAll, ranges[1], ranges[3]);
+        between(low, toUtf8(whole + kLastLowSurrogate) + kAboveAll, ranges[1], ranges[3]);
     }
     return found;
 }

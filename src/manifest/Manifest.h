@@ -12,14 +12,13 @@
 #include "manifest/ManifestStorage.h"
 #include "core/RefCounted.h"
 
-// The parsed backup set. A manifest never changes once parsed: any thread that holds a reference reads it without a
-// lock.
+// The parsed backup set. A manifest is immutable: any thread that holds a reference reads it without a lock.
 namespace tavi {
 
 class Manifest;
 using ManifestRef = RefPtr<const Manifest>;
 
-// The time that means "at any time".
+// Stands for any time in a manifest's queries.
 constexpr std::uint32_t kAnyTime = 0xFFFFFFFF;
 // The file size that marks a deletion.
 constexpr std::int64_t kDeletedSize = -1;
@@ -79,8 +78,9 @@ class ManifestPatchList {
     }
     ManifestPatch operator[](std::size_t i) const noexcept;
 
-    // Which version decides whether and as what the file existed at `time`; 0 asks for the newest.
-    std::optional<std::size_t> decidingAt(std::uint32_t time) const noexcept;
+    // Returns the index of the newest version with a timestamp of at most `time`; 0 is a time like any other.
+    std::optional<std::size_t> newestUpTo(std::uint32_t time) const noexcept;
+    // Returns whether the file existed at `time`; 0 asks for the newest version.
     bool existsAt(std::uint32_t time) const noexcept;
 
   private:
@@ -100,8 +100,9 @@ class Manifest : public RefCounted<Manifest> {
     // Returns null for a text with an invalid line, which is logged.
     static ManifestRef parse(const wxString& text);
 
+    // Returns whether the file existed at `time`; 0 asks for the newest version, kAnyTime for any.
     bool isBackedUp(std::wstring_view path, std::uint32_t time) const;
-    // Whether a path that begins with exactly these characters is backed up; no separator is added.
+    // Returns the same for any file whose path begins with exactly these characters; no separator is added.
     bool hasBackedUpUnder(std::wstring_view prefix, std::uint32_t time) const;
     std::optional<ManifestPatchList> findPatches(std::wstring_view path) const;
 
@@ -137,12 +138,12 @@ class Manifest : public RefCounted<Manifest> {
     {
         return hash_;
     }
-    // UTF-16 units of the whole text, plus one.
+    // Returns the number of UTF-16 units of the whole text, plus one.
     std::uint32_t textLength() const noexcept
     {
         return textLength_;
     }
-    // Memory that the manifest holds.
+    // Returns the memory that the manifest occupies.
     std::size_t residentBytes() const noexcept;
 
   private:
@@ -150,7 +151,7 @@ class Manifest : public RefCounted<Manifest> {
     friend class ManifestPatchList;
 
     using FileRange = std::pair<std::uint32_t, std::uint32_t>;
-    // Ascending. One prefix needs two of them, one that ends within a surrogate pair all four.
+    // Ascending. A prefix needs two ranges, or four if it ends within a surrogate pair.
     struct FileRanges {
         FileRange ranges[4] = {};
     };
@@ -161,7 +162,7 @@ class Manifest : public RefCounted<Manifest> {
         std::uint32_t versionCount;
         std::uint32_t hash;
     };
-    // The folder's text ends in its separator; its files end where the next folder's begin.
+    // The folder's text ends in its separator. Its files end at the next folder's first file.
     struct FolderRecord {
         storage::ByteArena::Ref text;
         std::uint32_t firstFile;

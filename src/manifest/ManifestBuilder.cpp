@@ -75,7 +75,7 @@ void ManifestBuilder::setHash(const wxString& hash)
 std::uint32_t ManifestBuilder::internFolder(std::string_view folder)
 {
     storage::ByteArena& texts = manifest_->texts_;
-    // The service walks folder by folder.
+    // The service writes its files folder by folder.
     if (lastFolder_ != storage::NumberTable::kNone && texts.at(folders_[lastFolder_].text) == folder)
         return lastFolder_;
 
@@ -112,7 +112,7 @@ ManifestRef ManifestBuilder::finish(std::uint32_t textLength)
     return std::move(manifest_);
 }
 
-// Sorts the folders and puts each file into the part of the array that is its folder's, in the order of the text.
+// Sorts the folders and moves each file into its folder's part of the array; the files keep the order of the text.
 void ManifestBuilder::orderFolders()
 {
     const storage::ByteArena& texts = manifest_->texts_;
@@ -145,7 +145,7 @@ void ManifestBuilder::orderFolders()
     files_ = {};
 }
 
-// Sorts each folder's files by name and keeps the last of those that have one name.
+// Sorts each folder's files by name and keeps the last of several files of one name.
 void ManifestBuilder::orderFiles()
 {
     const storage::ByteArena& texts = manifest_->texts_;

@@ -8,7 +8,7 @@
 
 namespace tavi {
 
-// A path cut behind its last separator; the folder keeps the separator.
+// A path split behind its last separator; the folder keeps the separator.
 struct SplitPath {
     std::string_view folder;
     std::string_view name;
@@ -20,10 +20,10 @@ inline SplitPath splitPath(std::string_view path) noexcept
     return {path.substr(0, cut), path.substr(cut)};
 }
 
-// Packs a text of 40 lower-case hexadecimal digits; nothing else fits.
+// Packs a text of 40 lower-case hexadecimal digits. Returns false for any other text; `digest` is undefined then.
 bool packDigest(std::string_view text, unsigned char (&digest)[20]) noexcept;
 
-// Fills a manifest entry by entry; one thread.
+// Builds a manifest file by file. One thread.
 class ManifestBuilder {
   public:
     ManifestBuilder();
@@ -32,14 +32,14 @@ class ManifestBuilder {
     {
         return manifest_->versions_;
     }
-    // Keeps the version in versions().next(), whose aux values are these.
+    // Keeps the version in versions().next() and gives it these aux values.
     void keepVersion(std::int64_t aux1, std::int64_t aux2, std::string_view auxText);
-    // The file of every version kept since `firstVersion`; replaces an earlier file of the same path.
+    // Adds the file of all versions kept since `firstVersion`. It replaces an earlier file of the same path.
     void addFile(std::string_view path, std::uint32_t firstVersion);
     void setUserText(const wxString& text);
     void setHash(const wxString& hash);
 
-    // Returns the manifest; afterwards the builder may only be destroyed.
+    // Returns the manifest. Afterwards the builder may only be destroyed.
     ManifestRef finish(std::uint32_t textLength);
 
   private:

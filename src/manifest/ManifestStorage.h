@@ -10,9 +10,8 @@
 
 #include "core/BlockArray.h"
 
-// The blocks that a manifest lives in. A million files must load into a 32-bit process that belongs to someone else,
-// whose address space is in pieces: nothing here grows by copying, no block is much above 1 MB, and no entry has a heap
-// block of its own.
+// The memory of a manifest. A million files must load into a 32-bit host, whose address space is fragmented: nothing
+// here grows by copying, no block is much above 1 MB, and no entry has a heap block of its own.
 namespace tavi::storage {
 
 constexpr std::uint32_t hashBytes(std::uint32_t seed, std::string_view bytes) noexcept
@@ -37,14 +36,14 @@ constexpr std::uint32_t hashBytes(std::uint32_t seed, std::string_view bytes) no
     return hash ^ (hash >> 16);
 }
 
-// Byte strings named by a 32-bit reference: block number and offset.
+// Immutable byte strings, each with a 32-bit reference: block number and offset.
 class ByteArena {
   public:
     using Ref = std::uint32_t;
 
     Ref append(std::string_view bytes)
     {
-        // The length stands in front, seven bits to a byte, lowest first.
+        // The length comes first, in unsigned LEB128.
         char head[10];
         std::size_t headSize = 0;
         std::size_t rest = bytes.size();
@@ -53,10 +52,10 @@ class ByteArena {
         head[headSize++] = static_cast<char>(rest);
 
         const std::size_t need = headSize + bytes.size();
-        if (need > kBlock)
+        if (need > kBlockBytes)
             return write(addBlock(need), 0, {head, headSize}, bytes);
-        if (blocks_.empty() || kBlock - used_ < need) {
-            current_ = addBlock(kBlock);
+        if (blocks_.empty() || kBlockBytes - used_ < need) {
+            current_ = addBlock(kBlockBytes);
             used_ = 0;
         }
         const auto offset = static_cast<std::uint32_t>(used_);
@@ -81,8 +80,8 @@ class ByteArena {
 
   private:
     static constexpr unsigned kOffsetBits = 20;
-    // Room for the heap's own header keeps a block inside a whole number of pages.
-    static constexpr std::size_t kBlock = (std::size_t{1} << kOffsetBits) - 64;
+    // Leaves room for the heap's header, so that a block fills a whole number of pages.
+    static constexpr std::size_t kBlockBytes = (std::size_t{1} << kOffsetBits) - 64;
 
     std::uint32_t addBlock(std::size_t size)
     {
@@ -103,19 +102,20 @@ class ByteArena {
 
     std::vector<std::unique_ptr<char[]>> blocks_;
     std::uint32_t current_ = 0;
-    std::size_t used_ = kBlock;
+    std::size_t used_ = kBlockBytes;
     std::size_t bytes_ = 0;
 };
 
-// Open addressing over numbers of things that are kept elsewhere.
+// A hash table, with open addressing, over numbers of elements that are stored elsewhere.
 class NumberTable {
   public:
     static constexpr std::uint32_t kNone = 0xFFFFFFFF;
 
-    void allocate(std::uint32_t things)
+    // Empties the table and makes room for so many elements.
+    void allocate(std::uint32_t elements)
     {
         std::uint32_t slots = 16;
-        while (slots / 2 < things)
+        while (slots / 2 < elements)
             slots *= 2;
         mask_ = slots - 1;
         slots_ = {};
@@ -133,13 +133,14 @@ class NumberTable {
             slot = (slot + 1) & mask_;
         slots_[slot] = number;
     }
-    template <class Is>
-    std::uint32_t find(std::uint32_t hash, Is is) const
+    // Returns the first number of this hash that `matches` accepts, or kNone.
+    template <class Matches>
+    std::uint32_t find(std::uint32_t hash, Matches matches) const
     {
         if (slots_.size() == 0)
             return kNone;
         for (std::uint32_t slot = hash & mask_;; slot = (slot + 1) & mask_) {
-            if (slots_[slot] == kNone || is(slots_[slot]))
+            if (slots_[slot] == kNone || matches(slots_[slot]))
                 return slots_[slot];
         }
     }
@@ -154,7 +155,7 @@ class NumberTable {
 };
 
 // One version of one file. Nearly every aux text is 40 hexadecimal digits, which fit in `digest`, and nearly every
-// other aux value is 0; where that is not so, `digest` begins with a reference to the Extra of the version.
+// other aux value is 0. For any other version `digest` begins with the arena reference of its Extra.
 struct PackedVersion {
     std::uint32_t timestamp;
     std::uint32_t modifiedTime;
@@ -166,12 +167,13 @@ struct PackedVersion {
 };
 static_assert(sizeof(PackedVersion) == 44);
 
-// What stands in front of the aux text in an arena string of a version that does not fit.
+// Precedes the aux text in the arena string of a version that does not fit.
 struct Extra {
     std::int64_t aux1;
     std::int64_t aux2;
 };
 
+// All versions of all files, in the order of the text.
 class VersionStore {
     static constexpr unsigned kLog = 14;
     static constexpr std::uint32_t kBlock = 1u << kLog;
@@ -197,7 +199,7 @@ class VersionStore {
     {
         return size_ >> kLog != blocks_.size();
     }
-    // The place of the next version, undefined until written; keep() makes it one.
+    // Returns the place of the next version, which is undefined until written and not counted until keep().
     PackedVersion& next()
     {
         if (!hasRoom())

@@ -9,24 +9,10 @@
 namespace tavi {
 namespace {
 
-constexpr std::uint32_t kLastFreeName = 9999;
+constexpr std::uint32_t kMaxFreeName = 9999;
 
-// The newest version of that time decides; as a deletion it says that the file did not exist.
-std::optional<std::uint32_t> versionAt(const ManifestPatchList& patches, std::uint32_t cutoff)
-{
-    for (std::size_t i = patches.size(); i-- > 0;) {
-        const ManifestPatch patch = patches[i];
-        if (patch.timestamp() <= cutoff) {
-            if (patch.isDeletion())
-                return std::nullopt;
-            return static_cast<std::uint32_t>(i);
-        }
-    }
-    return std::nullopt;
-}
-
-// Puts " (n)" before the extension. A name without one gets it at its end; one that begins with its
-// last dot is all extension.
+// Inserts " (n)" before the extension: at the end of a name without a dot, at the front of one whose last dot comes
+// first.
 void insertFreeName(std::string& path, std::uint32_t number)
 {
     const std::size_t slash = path.rfind('\\');
@@ -58,8 +44,10 @@ void RestorePlan::buildTarget(const std::string& manifestPath, std::uint32_t fre
 
 void RestorePlan::plan(std::uint32_t file, const RestoreRequest& request, const PathProbe& exists)
 {
-    const auto patch = versionAt(manifest_->patches(file), request.cutoffTime);
-    if (!patch)
+    const ManifestPatchList patches = manifest_->patches(file);
+    const auto patch = patches.newestUpTo(request.cutoffTime);
+    // A file without a version, or whose version is a deletion, did not exist then.
+    if (!patch || patches[*patch].isDeletion())
         return;
     std::uint32_t freeName = 0;
     if (!overwrite_) {
@@ -69,11 +57,11 @@ void RestorePlan::plan(std::uint32_t file, const RestoreRequest& request, const 
         };
         manifestPath_.clear();
         manifest_->appendFilePathUtf8(file, manifestPath_);
-        // With every number taken the one behind the last is used unasked.
-        while (isTaken() && ++freeName <= kLastFreeName) {
+        // If all numbers are taken, the next one is used without a check, so that the file still gets its row.
+        while (isTaken() && ++freeName <= kMaxFreeName) {
         }
     }
-    rows_.push({file, *patch, freeName});
+    rows_.push({file, static_cast<std::uint32_t>(*patch), freeName});
 }
 
 void RestorePlan::readEntry(std::uint32_t row, RestoreFileEntry& entry) const
@@ -99,8 +87,8 @@ RestorePlan planRestore(const RestoreRequest& request, const Manifest& manifest,
         paths.push_back(&path);
     std::sort(paths.begin(), paths.end(), [](const wxString* a, const wxString* b) { return *a < *b; });
     for (const wxString* path : paths) {
-        // A plain prefix, no separator added: required so, though a file's path then also takes longer names that begin
-        // alike.
+        // A plain prefix without a separator, as in the menu's question whether anything is backed up there. A file's
+        // path therefore also selects longer names that begin alike; the service and its users rely on the same rows.
         manifest.forEachUnder(view(*path), [&](std::uint32_t file) {
             plan.plan(file, request, exists);
             return true;

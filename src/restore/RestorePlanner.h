@@ -12,12 +12,13 @@
 
 namespace tavi {
 
-// What the user asked for.
+// The user's choices in the versions dialog.
 struct RestoreRequest {
     PathSet selectedPaths;
     // Seconds since 1970 UTC: each file is restored as it was then.
     std::uint32_t cutoffTime = 0;
-    // Taken off the paths that go into the destination folder. Without such a folder the restore is in place.
+    // Removed from the front of the paths that are restored into the destination folder. Without both texts the restore
+    // is in place.
     wxString sourcePrefix;
     wxString destinationFolder;
     bool overwrite = false;
@@ -38,18 +39,18 @@ struct RestoreFileEntry {
     std::uint32_t attributes = 0;
 };
 
-// Tells whether something exists at a path, given in UTF-8.
+// Returns whether something exists at a path, given in UTF-8.
 using PathProbe = std::function<bool(const std::string& path)>;
 
-// The files of one request in the order of their rows. Keeps numbers only, so that a million of them fit beside the
-// manifest; the manifest must be held for as long as the plan lives.
+// The files of one request, in the order of their rows. Stores numbers only, so that a million of them fit beside the
+// manifest, which must outlive the plan.
 class RestorePlan {
   public:
     std::uint32_t size() const noexcept
     {
         return rows_.size();
     }
-    // Fills `entry`, whose texts keep their room from call to call.
+    // Fills `entry`. Reusing one entry for all rows saves allocations.
     void readEntry(std::uint32_t row, RestoreFileEntry& entry) const;
 
   private:
@@ -75,8 +76,8 @@ class RestorePlan {
     std::string target_;
 };
 
-// Chooses, for every selected path and every file of the manifest whose path begins with it, the version and the
-// target. `exists` is asked only when existing files are to be kept.
+// Chooses the version and the target of every file of the manifest whose path begins with a selected path. Calls
+// `exists` only if existing files are to be kept.
 RestorePlan planRestore(const RestoreRequest& request, const Manifest& manifest, const PathProbe& exists);
 
 } // namespace tavi
