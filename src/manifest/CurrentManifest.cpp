@@ -1,6 +1,7 @@
 #include "manifest/CurrentManifest.h"
 
 #include <atomic>
+#include <utility>
 
 #include <wx/datetime.h>
 
@@ -9,23 +10,31 @@
 #include "core/BackgroundThread.h"
 #include "core/Handles.h"
 #include "core/Options.h"
+#include "core/ScopeGuard.h"
 
 namespace tavi {
 namespace {
 
+// One reference, which any thread may exchange for another. Its owner must exchange it for null in the end.
+class SharedReference {
+  public:
+    // Returns the former reference.
+    ManifestRef exchange(ManifestRef next) noexcept
+    {
+        return ManifestRef::adopt(manifest_.exchange(next.release()));
+    }
+
+  private:
+    std::atomic<const Manifest*> manifest_{nullptr};
+};
+
 WatcherState watcher;
-// The reference of the newest menu, and one that a menu before it had. The watcher releases that: to destroy a manifest
-// of many files takes longer than a menu may.
-std::atomic<const Manifest*> menuManifest{nullptr};
-std::atomic<const Manifest*> retiredManifest{nullptr};
+// The reference of the newest menu.
+SharedReference menuManifest;
+// The reference of the menu before. The watcher releases it: to destroy a large manifest takes longer than a menu may.
+SharedReference retiredManifest;
 
-void replaceReference(std::atomic<const Manifest*>& holder, const Manifest* next) noexcept
-{
-    if (const Manifest* const previous = holder.exchange(next))
-        previous->Release();
-}
-
-// Created before the process entry runs; serialises only the start of the watcher.
+// Created before the process entry runs. Serialises the start of the watcher.
 const KernelHandle manifestMutex(CreateMutexW(nullptr, FALSE, nullptr));
 
 class SystemServices : public WatcherServices {
@@ -48,7 +57,7 @@ class SystemServices : public WatcherServices {
     void sleep(std::uint32_t milliseconds) override
     {
         Sleep(milliseconds);
-        replaceReference(retiredManifest, nullptr);
+        retiredManifest.exchange({});
     }
     bool isStopping() override
     {
@@ -76,25 +85,19 @@ ManifestRef getCurrentManifest() noexcept
         return manifest;
     const DWORD wait = WaitForSingleObject(manifestMutex.get(), 0);
     if (wait == WAIT_OBJECT_0 || wait == WAIT_ABANDONED) {
-        if (ManifestRef manifest = watcher.manifest.acquire()) {
-            ReleaseMutex(manifestMutex.get());
-            return manifest;
-        }
-        watcherThread.start();
+        const ScopeGuard release([] { ReleaseMutex(manifestMutex.get()); });
+        if (!watcher.manifest.acquire())
+            watcherThread.start();
     }
-    // Also without the mutex: releasing what is not held fails, and that is all.
-    ReleaseMutex(manifestMutex.get());
     return watcher.manifest.acquire();
 }
 
 void holdManifestForMenu() noexcept
 {
-    const Manifest* const current = getCurrentManifest().release();
-    const Manifest* const previous = menuManifest.exchange(current);
-    if (previous == current && previous)
-        previous->Release();
-    else if (previous)
-        replaceReference(retiredManifest, previous);
+    const ManifestRef current = getCurrentManifest();
+    ManifestRef previous = menuManifest.exchange(current);
+    if (previous && previous.get() != current.get())
+        retiredManifest.exchange(std::move(previous));
 }
 
 void requestWatcherStop() noexcept
@@ -115,14 +118,14 @@ bool isWatcherActive() noexcept
 void stopManifestWatcher() noexcept
 {
     requestWatcherStop();
-    // The wait is for a start in progress, not for the thread, and the mutex stays taken: nothing may start after this.
+    // Waits for a start in progress, not for the thread. The mutex stays locked, so that nothing starts afterwards.
     if (isWatcherActive())
         WaitForSingleObject(manifestMutex.get(), INFINITE);
     if (const HANDLE thread = watcherThread.releaseHandle())
         CloseHandle(thread);
     watcher.manifest.replace({});
-    replaceReference(menuManifest, nullptr);
-    replaceReference(retiredManifest, nullptr);
+    menuManifest.exchange({});
+    retiredManifest.exchange({});
     dropGraylist();
 }
 

@@ -2,28 +2,28 @@
 
 #include "manifest/Manifest.h"
 
-// The manifest in force and the thread that keeps it so.
+// The manifest in force and the watcher, the thread that loads it.
 namespace tavi {
 
-// Returns the current manifest, or null while none has been loaded. The first call starts the watcher. Never waits; any
+// Returns the manifest in force, or null before the first load; then it also starts the watcher. Never waits. Any
 // thread.
 ManifestRef getCurrentManifest() noexcept;
 
-// Starts the watcher like getCurrentManifest. The manifest in force stays referenced until the next menu asks or the
-// module is unmapped, whatever is loaded meanwhile. Any thread.
+// Holds a reference to the manifest in force until the next call, for the next menu, or until the module is unmapped.
+// Starts the watcher like getCurrentManifest. Any thread.
 void holdManifestForMenu() noexcept;
 
-// Asks the watcher to end. It does so within half a second, and nobody waits for it.
+// Asks the watcher to end, which it does within half a second. Does not wait.
 void requestWatcherStop() noexcept;
 
 // Withdraws the request, or starts the watcher again if it has ended.
 void resumeWatcher() noexcept;
 
-// False before the watcher has been started and once it has ended.
+// Returns false before the watcher's first start and after its end.
 bool isWatcherActive() noexcept;
 
-// Detach only: asks the watcher to end and releases the current manifest, the menu's and the list of default
-// exclusions. Does not wait for the thread.
+// Asks the watcher to end, without waiting for it, and releases the manifest in force, the menu's and the list of
+// default exclusions. Process detach only.
 void stopManifestWatcher() noexcept;
 
 } // namespace tavi

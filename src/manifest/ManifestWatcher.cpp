@@ -12,17 +12,10 @@
 namespace tavi {
 namespace {
 
-constexpr std::uint32_t kNapMilliseconds = 500;
-constexpr int kNapsPerCycle = 10;
-constexpr std::uint32_t kCyclesPerExclusionBuild = 18;
-
-// A null result, from an invalid text, leaves the manifest in force where it is: its readers lose nothing by a text
-// that the service is about to replace.
-void publish(WatcherState& state, ManifestRef manifest)
-{
-    if (manifest)
-        state.manifest.replace(std::move(manifest));
-}
+// Short, so that a stop request takes effect soon.
+constexpr std::uint32_t kSleepMs = 500;
+constexpr int kSleepsPerPoll = 10;
+constexpr std::uint32_t kPollsPerExclusionBuild = 18;
 
 } // namespace
 
@@ -47,7 +40,11 @@ ManifestRef readStoredManifest()
 void runManifestWatcher(WatcherState& state, WatcherServices& services)
 {
     const auto load = [&] {
-        guarded("manifest load", [&] { publish(state, services.loadManifest()); });
+        guarded("manifest load", [&] {
+            // An invalid text leaves the former manifest in force until the service stores another.
+            if (ManifestRef manifest = services.loadManifest())
+                state.manifest.replace(std::move(manifest));
+        });
         state.lastLoad = services.now();
     };
     const auto loadIfChanged = [&] {
@@ -59,21 +56,22 @@ void runManifestWatcher(WatcherState& state, WatcherServices& services)
     };
 
     guarded("exclusion build", [&] { services.buildExclusions(true); });
-    // A watcher that starts again while the host keeps the module finds the manifest of the one before it.
+    // The host may keep the module after a stop request. The watcher that is then started finds the manifest of the
+    // former one.
     if (state.manifest.acquire())
         loadIfChanged();
     else
         load();
-    for (std::uint32_t cycles = 0; !services.isStopping();) {
-        for (int naps = 0; naps < kNapsPerCycle; ++naps) {
+    for (std::uint32_t polls = 0;;) {
+        for (int sleeps = 0; sleeps < kSleepsPerPoll; ++sleeps) {
             if (services.isStopping())
                 return;
-            services.sleep(kNapMilliseconds);
+            services.sleep(kSleepMs);
         }
         if (services.isStopping())
             return;
         loadIfChanged();
-        if (++cycles % kCyclesPerExclusionBuild == 0)
+        if (++polls % kPollsPerExclusionBuild == 0)
             guarded("exclusion build", [&] { services.buildExclusions(false); });
     }
 }
