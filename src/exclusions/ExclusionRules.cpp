@@ -18,24 +18,13 @@ constexpr const wchar_t* kProgramUserData[] = {L"\\Intuit\\QuickBooks",
                                                L"\\palmOne",
                                                L"\\Sony Handheld"};
 
-enum SpecialFolder {
-    recycleBin = 10,
-    windows = 36,
-    system = 37,
-    programFiles = 38,
-    programFiles32 = 42,
-    commonFiles = 43,
-    commonFiles32 = 44,
-    commonAdminTools = 47
-};
-
 wxString inside(const wxString& folder, const wxString& name)
 {
     return folder.EndsWith(L"\\") ? folder + name : folder + L"\\" + name;
 }
 
 template <std::size_t N>
-void addCarvedOut(ExclusionSources& sources, const RuleSink& add, const wxString& folder,
+void addCarvedOut(const ExclusionSources& sources, const RuleSink& add, const wxString& folder,
                   const wchar_t* const (&places)[N])
 {
     for (const wchar_t* const place : places) {
@@ -44,23 +33,21 @@ void addCarvedOut(ExclusionSources& sources, const RuleSink& add, const wxString
     }
 }
 
-void addUserFolders(ExclusionSources& sources, const RuleSink& add, const wchar_t* name)
+void addUserFolders(const ExclusionSources& sources, const RuleSink& add, const wchar_t* name)
 {
     for (const wxString& folder : sources.userFolders(name))
         add(folder, kGrayed);
 }
 
-bool addSpecialFolder(ExclusionSources& sources, const RuleSink& add, SpecialFolder number, wxString* found = nullptr)
+std::optional<wxString> addSpecialFolder(const ExclusionSources& sources, const RuleSink& add, SpecialFolder folder)
 {
-    const auto folder = sources.specialFolder(number);
-    if (folder)
-        add(*folder, kGrayed);
-    if (folder && found)
-        *found = *folder;
-    return folder.has_value();
+    auto path = sources.specialFolder(folder);
+    if (path)
+        add(*path, kGrayed);
+    return path;
 }
 
-void addRegistryFolder(ExclusionSources& sources, const RuleSink& add, const wchar_t* key, const wchar_t* value,
+void addRegistryFolder(const ExclusionSources& sources, const RuleSink& add, const wchar_t* key, const wchar_t* value,
                        const wxString& below = wxString())
 {
     if (const auto folder = sources.registryText(key, value))
@@ -69,7 +56,7 @@ void addRegistryFolder(ExclusionSources& sources, const RuleSink& add, const wch
 
 } // namespace
 
-void addMachineRules(ExclusionSources& sources, const RuleSink& add)
+void addMachineRules(const ExclusionSources& sources, const RuleSink& add)
 {
     for (const wxString& mountPoint : sources.mountPoints()) {
         if (mountPoint.empty())
@@ -77,7 +64,7 @@ void addMachineRules(ExclusionSources& sources, const RuleSink& add)
         for (const wchar_t* const place : kVolumePlaces)
             add(mountPoint + place, kGrayed);
     }
-    // Two sizes follow the name. Without them nothing is left of the text, and that is added as it is.
+    // Two sizes follow the name. A text without sizes leaves an empty path, which is added like any other.
     for (const wxString& file : sources.registryTexts(kMemoryKey, L"PagingFiles"))
         add(file.BeforeLast(L' ').BeforeLast(L' '), kGrayed);
 
@@ -92,7 +79,7 @@ void addMachineRules(ExclusionSources& sources, const RuleSink& add)
         add(inside(windowsFolder, name), kGrayed);
     if (const wxString data = sources.serviceDataFolder(); !data.empty())
         add(data, kGrayed);
-    addSpecialFolder(sources, add, recycleBin);
+    addSpecialFolder(sources, add, SpecialFolder::recycleBin);
     addUserFolders(sources, add, L"CD Burning");
     addUserFolders(sources, add, L"Cache");
     addRegistryFolder(sources, add, L"Software\\Microsoft\\Windows\\CurrentVersion\\Internet Settings",
@@ -103,9 +90,9 @@ void addMachineRules(ExclusionSources& sources, const RuleSink& add)
         addUserRules(sources, add);
 }
 
-void addUserRules(ExclusionSources& sources, const RuleSink& add)
+void addUserRules(const ExclusionSources& sources, const RuleSink& add)
 {
-    addSpecialFolder(sources, add, commonAdminTools);
+    addSpecialFolder(sources, add, SpecialFolder::commonAdminTools);
     for (const wchar_t* const name : {L"Cookies", L"History", L"Local Settings"})
         addUserFolders(sources, add, name);
     for (const wxString& folder : sources.userFolders(L"Local AppData")) {
@@ -114,12 +101,12 @@ void addUserRules(ExclusionSources& sources, const RuleSink& add)
     }
     for (const wchar_t* const name : {L"NetHood", L"PrintHood", L"Recent"})
         addUserFolders(sources, add, name);
-    for (const SpecialFolder number : {system, windows, commonFiles, commonFiles32})
-        addSpecialFolder(sources, add, number);
-    for (const SpecialFolder number : {programFiles, programFiles32}) {
-        wxString folder;
-        if (addSpecialFolder(sources, add, number, &folder))
-            addCarvedOut(sources, add, folder, kProgramUserData);
+    for (const auto folder :
+         {SpecialFolder::system, SpecialFolder::windows, SpecialFolder::commonFiles, SpecialFolder::commonFiles32})
+        addSpecialFolder(sources, add, folder);
+    for (const auto folder : {SpecialFolder::programFiles, SpecialFolder::programFiles32}) {
+        if (const auto path = addSpecialFolder(sources, add, folder))
+            addCarvedOut(sources, add, *path, kProgramUserData);
     }
 }
 

@@ -9,30 +9,40 @@
 
 #include "exclusions/PathTree.h"
 
-// Which places a backup leaves out by default, and what inside them is user data after all. Pure: where the places are
-// is asked of the sources, each of which may have no answer.
+// The rules of the default exclusions: the places that a backup leaves out, and the user data inside them that it
+// keeps. Pure: the sources answer where the places are, or that there is none.
 namespace tavi {
 
-class ExclusionSources {
-  public:
-    virtual ~ExclusionSources() = default;
-    // Ending in a backslash.
-    virtual std::set<wxString> mountPoints() = 0;
-    virtual std::optional<wxString> registryText(const wxString& key, const wxString& value) = 0;
-    virtual std::vector<wxString> registryTexts(const wxString& key, const wxString& value) = 0;
-    // By the shell's number of the folder.
-    virtual std::optional<wxString> specialFolder(int number) = 0;
-    virtual std::optional<wxString> temporaryFolder() = 0;
+// Folders that the shell knows. The values are CSIDL numbers.
+enum class SpecialFolder {
+    recycleBin = 10,
+    windows = 36,
+    system = 37,
+    programFiles = 38,
+    programFiles32 = 42,
+    commonFiles = 43,
+    commonFiles32 = 44,
+    commonAdminTools = 47
+};
+
+struct ExclusionSources {
+    // Each ends in a backslash.
+    std::function<std::set<wxString>()> mountPoints;
+    // A value below HKEY_LOCAL_MACHINE.
+    std::function<std::optional<wxString>(const wxString& key, const wxString& value)> registryText;
+    std::function<std::vector<wxString>(const wxString& key, const wxString& value)> registryTexts;
+    std::function<std::optional<wxString>(SpecialFolder folder)> specialFolder;
+    std::function<std::optional<wxString>()> temporaryFolder;
     // Without a backslash at its end, unless it is a root.
-    virtual wxString windowsFolder() = 0;
+    std::function<wxString()> windowsFolder;
     // Names of the entries that begin with a dollar sign, in the order of the listing.
-    virtual std::vector<wxString> dollarEntries(const wxString& folder) = 0;
-    virtual wxString serviceDataFolder() = 0;
-    // A named shell folder of every user.
-    virtual std::vector<wxString> userFolders(const wxString& name) = 0;
-    virtual bool exists(const wxString& folder) = 0;
-    // The setting that takes the users' places out of the list.
-    virtual bool keepsUserPlaces() = 0;
+    std::function<std::vector<wxString>(const wxString& folder)> dollarEntries;
+    std::function<wxString()> serviceDataFolder;
+    // The value `name` of every user's "Shell Folders" key.
+    std::function<std::vector<wxString>(const wxString& name)> userFolders;
+    std::function<bool(const wxString& folder)> exists;
+    // The setting options.graylist, which leaves the user rules out.
+    std::function<bool()> keepsUserPlaces;
 };
 
 constexpr FolderState kGrayed = FolderState::allOn;
@@ -40,8 +50,8 @@ constexpr FolderState kCarvedOut = FolderState::off;
 
 using RuleSink = std::function<void(const wxString& path, FolderState state)>;
 
-// The order is part of the result: a later rule replaces those below it.
-void addMachineRules(ExclusionSources& sources, const RuleSink& add);
-void addUserRules(ExclusionSources& sources, const RuleSink& add);
+// Each passes its rules to `add`. Their order matters: a rule replaces earlier ones below its path.
+void addMachineRules(const ExclusionSources& sources, const RuleSink& add);
+void addUserRules(const ExclusionSources& sources, const RuleSink& add);
 
 } // namespace tavi

@@ -12,24 +12,25 @@
 
 namespace tavi {
 
-// The folder listings of one build of an exclusion list: no folder is listed twice. One thread.
+// Caches the folder listings of one build of an exclusion list. One thread.
 class FolderListings {
   public:
     struct Folder {
-        // Entries that count: see the constructor.
+        // The constructor says which entries count.
         std::uint32_t entries = 0;
         std::uint32_t folders = 0;
         // Names that begin with a dollar sign, in the order of the listing.
         std::vector<wxString> dollarEntries;
     };
 
-    // Returns a list in force, or null. Called for each listing, since another list may be published during a build.
+    // Returns the list in force, or null. Called for each listing, since another list may be published during a build.
     using CurrentTree = RefPtr<const PathTree> (*)();
 
-    // Entries that `excluded` leaves out with everything beneath do not count, except inside the places of `userData`.
+    // Entries that `excluded` leaves out with everything beneath do not count, except in folders that are on in
+    // `userData`.
     FolderListings(CurrentTree excluded, CurrentTree userData) noexcept : excluded_(excluded), userData_(userData) {}
 
-    // An empty listing if the folder cannot be listed.
+    // Returns an empty listing if the folder cannot be listed. The reference is valid as long as this object.
     const Folder& of(const wxString& path);
 
   private:

@@ -6,6 +6,7 @@
 
 #include "core/CriticalSection.h"
 #include "core/PublishedPointer.h"
+#include "core/ScopeGuard.h"
 #include "exclusions/ExclusionRules.h"
 #include "exclusions/FolderListings.h"
 #include "exclusions/SystemSources.h"
@@ -16,7 +17,7 @@ namespace tavi {
 namespace {
 
 using PathTreeRef = RefPtr<const PathTree>;
-using AddRules = void (*)(ExclusionSources& sources, const RuleSink& add);
+using AddRules = void (*)(const ExclusionSources& sources, const RuleSink& add);
 
 struct PublishedTree {
     const AddRules addRules;
@@ -25,30 +26,15 @@ struct PublishedTree {
 };
 PublishedTree graylist{addMachineRules, {}, {}};
 PublishedTree userData{addUserRules, {}, {}};
-// Held for a whole build, so that one builder's hives are not unloaded under the other. Locked inside a build lock.
+// Held for a whole build, so that one builder does not unload the other's hives. Locked inside a build lock.
 CriticalSection hivesLock;
 
-class UserHives {
-  public:
-    UserHives() : guard_(hivesLock)
-    {
-        loadUserHives();
-    }
-    ~UserHives()
-    {
-        unloadUserHives();
-    }
-    UserHives(const UserHives&) = delete;
-    UserHives& operator=(const UserHives&) = delete;
-
-  private:
-    const std::lock_guard<CriticalSection> guard_;
-};
-
-// Returns the new tree. It is published before the hives are unloaded, which may take its time.
+// Returns the new tree. Publishes it before unloading the hives, which may be slow.
 PathTreeRef buildAndPublish(PublishedTree& published)
 {
-    const UserHives hives;
+    const std::lock_guard guard(hivesLock);
+    loadUserHives();
+    const ScopeGuard unloading(unloadUserHives);
     const auto listings = std::make_shared<FolderListings>([] { return graylist.current.acquire(); },
                                                            [] { return userData.current.acquire(); });
     const RefPtr<PathTree> tree = PathTree::create(false, [listings](const wxString& folder, bool foldersOnly) {
@@ -56,8 +42,8 @@ PathTreeRef buildAndPublish(PublishedTree& published)
         return foldersOnly ? listed.folders : listed.entries;
     });
     volumeTable().refreshVolumes();
-    SystemSources sources(*listings);
-    published.addRules(sources, [&](const wxString& path, FolderState state) { tree->insert(view(path), state); });
+    published.addRules(systemSources(*listings),
+                       [&](const wxString& path, FolderState state) { tree->insert(view(path), state); });
     tree->finish();
     published.current.replace(tree);
     return tree;
@@ -69,7 +55,7 @@ struct Obtained {
     bool waited;
 };
 
-// Returns the current tree, or builds one if there is none or `refresh` asks for a new one.
+// Returns the current tree; builds one if there is none or if `refresh` is set.
 Obtained obtain(PublishedTree& published, bool refresh)
 {
     if (!refresh) {
@@ -95,8 +81,8 @@ FolderState stateOf(PublishedTree& published, const wxString& path)
 const PathTree* getGraylist(bool refresh)
 {
     Obtained obtained = obtain(graylist, refresh);
-    // A caller that waited for another builder gets no reference: callers count on it and release theirs only in the
-    // other case. The published reference keeps the tree until the next refresh.
+    // A caller that waited for another builder gets no reference: callers rely on that and do not release one then. The
+    // published reference keeps the tree until the next refresh.
     return obtained.waited ? obtained.tree.get() : obtained.tree.release();
 }
 
@@ -129,11 +115,10 @@ bool isUserData(const wxString& path)
 
 void dropGraylist() noexcept
 {
-    // At process end the thread that held the lock may have been killed; the pointer can be replaced at any time.
-    const bool locked = graylist.buildLock.try_lock();
+    // At process end the thread that held the lock may have been terminated: this does not wait for it. The pointer can
+    // be replaced without the lock.
+    const std::unique_lock guard(graylist.buildLock, std::try_to_lock);
     graylist.current.replace({});
-    if (locked)
-        graylist.buildLock.unlock();
 }
 
 } // namespace tavi

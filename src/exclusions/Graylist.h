@@ -4,26 +4,27 @@
 
 #include "exclusions/PathTree.h"
 
-// The places that a backup leaves out by default. Any thread; building takes its time and makes only other builders and
-// first readers wait.
+// The default exclusions: the places that a backup leaves out unless the user says otherwise. Any thread. A build is
+// slow and blocks only other builders, and readers while there is no list.
 namespace tavi {
 
-// The current list with one reference for the caller, built if there is none or `refresh` asks for a new one. Only when
-// another thread has built it while this call waited, the caller gets it without a reference of its own.
+// Returns the current list; builds it if there is none or if `refresh` is set. The caller releases one reference,
+// except if another thread built the list while this call waited: then the caller has none.
 const PathTree* getGraylist(bool refresh);
-// The same for its effect alone.
+// Builds the list as getGraylist does, without returning it.
 void buildGraylist(bool refresh);
-// The list of the users' places alone. Readers never release it: without `refresh` it is theirs as it is.
+// Returns the list of the user rules alone, built alike. The caller has no reference; the next refresh releases the
+// list.
 const PathTree* getUserDataTree(bool refresh);
 
-// Left out, as a whole or with exceptions beneath it.
+// Returns whether the path is left out, with or without exceptions beneath it.
 bool isGrayed(const wxString& path);
-// Left out with exceptions beneath it.
+// Returns whether the path is left out with exceptions beneath it.
 bool isPartlyGrayed(const wxString& path);
-// Of the users' places.
+// Returns whether a user rule leaves the path out.
 bool isUserData(const wxString& path);
 
-// Detach only.
+// Releases the current list. Process detach only.
 void dropGraylist() noexcept;
 
 } // namespace tavi

@@ -2,17 +2,18 @@
 
 #include <algorithm>
 #include <utility>
+#include <vector>
 
 namespace tavi {
 namespace {
 
 constexpr wchar_t kSeparator = L'\\';
 
-// What the states of a node's children say together.
+// A summary of the states of a node's children.
 struct Summary {
-    bool plain = false;  // nothing beneath some of them is on
-    bool marked = false; // something beneath some of them is on
-    bool mixed = false;  // something, but not everything, beneath some of them is on
+    bool plain = false;  // beneath some child nothing is on
+    bool marked = false; // beneath some child something is on
+    bool mixed = false;  // beneath some child something, but not everything, is on
 };
 
 // Returns the new state of a node if some entries on disk have no node of their own: those inherit the node's state.
@@ -52,7 +53,7 @@ FolderState withoutOthers(FolderState own, Summary children) noexcept
     return isOn ? FolderState::on : FolderState::off;
 }
 
-// The first component of `rest`, which keeps what follows the separator; `last` when nothing does.
+// Returns the first component of `rest` and removes it with its separator; sets `last` if there was no separator.
 std::wstring_view takeComponent(std::wstring_view& rest, bool& last) noexcept
 {
     const std::size_t end = rest.find(kSeparator);
@@ -84,7 +85,7 @@ PathTree::~PathTree()
     removeChildren(root_);
 }
 
-// Not by recursion: a path may have as many components as it has characters.
+// Without recursion: a path may have as many components as characters.
 void PathTree::removeChildren(Node& node) noexcept
 {
     for (Node* at = &node; at != &node || !node.children.empty();) {
@@ -129,7 +130,7 @@ void PathTree::insert(std::wstring_view path, FolderState state)
             // The rule would change nothing.
             last = true;
         } else {
-            // On the way a new node takes its parent's state, so that its other entries go on inheriting the same.
+            // A new node above the last one gets its parent's state, so that its other entries still inherit the same.
             Node& child = makeChild(node, name, last ? state : node.state);
             if (!last)
                 way.push_back(&child);
@@ -137,12 +138,6 @@ void PathTree::insert(std::wstring_view path, FolderState state)
     }
     for (auto node = way.rbegin(); node != way.rend(); ++node)
         recompute(**node);
-}
-
-void PathTree::insertAll(const std::vector<wxString>& paths, FolderState state)
-{
-    for (const wxString& path : paths)
-        insert(view(path), state);
 }
 
 void PathTree::recompute(Node& node) const
@@ -156,7 +151,7 @@ void PathTree::recompute(Node& node) const
     }
     if (node.entryCount == Node::kNotCounted)
         node.entryCount = node.fullPath.empty() ? 0 : counter_(node.fullPath, node.foldersOnly);
-    // What is not there or cannot be listed keeps the state it was given; so does the root.
+    // A folder that is missing or cannot be listed keeps the state of its rule; so does the root.
     if (node.entryCount == 0)
         return;
     node.state =

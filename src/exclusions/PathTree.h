@@ -5,7 +5,6 @@
 #include <memory>
 #include <string_view>
 #include <unordered_map>
-#include <vector>
 
 #include <wx/string.h>
 
@@ -15,29 +14,28 @@
 
 namespace tavi {
 
-// How many entries a folder has, hidden ones included; 0 also when it cannot be listed. With `foldersOnly` only
+// Returns how many entries a folder has, hidden ones included; 0 also if it cannot be listed. With `foldersOnly` only
 // sub-folders count.
 using EntryCounter = std::function<std::uint32_t(const wxString& folder, bool foldersOnly)>;
 
-// Rules by full path, and the state that applies to any path: its own rule, or what it inherits from the nearest folder
-// that has one. Names are compared exactly. Filled by one thread, then published and never changed again; lookups need
-// no lock.
+// Rules by full path, and the state that applies to any path: that of its own rule, or the one inherited from the
+// nearest folder with a rule. Names are compared exactly. One thread inserts the rules; once published a tree is
+// immutable, and lookups need no lock.
 class PathTree : public RefCounted<PathTree> {
   public:
-    // The counter is used while rules are inserted, at most once for a node.
+    // The counter is called while rules are inserted, at most once for each folder.
     static RefPtr<PathTree> create(bool foldersOnly, EntryCounter counter);
 
-    // A rule on a folder replaces every rule below it.
+    // Inserts a rule. A rule on a folder replaces every rule below it.
     void insert(std::wstring_view path, FolderState state);
-    void insertAll(const std::vector<wxString>& paths, FolderState state);
-    // No rule comes any more: the counter goes.
+    // Releases the counter after the last rule.
     void finish() noexcept
     {
         counter_ = nullptr;
     }
     FolderState lookup(std::wstring_view path) const;
 
-    // Every node but the root, parents first, names in order.
+    // Visits every node but the root, parents first, names in order.
     void forEach(const std::function<void(const wxString& path, FolderState state)>& visit) const;
 
   private:

@@ -12,28 +12,17 @@
 
 namespace tavi {
 
-std::set<wxString> SystemSources::mountPoints()
-{
-    return volumeTable().mountPoints();
-}
+namespace {
 
-std::optional<wxString> SystemSources::registryText(const wxString& key, const wxString& value)
-{
-    return readRegistryText(HKEY_LOCAL_MACHINE, key, value);
-}
-
-std::vector<wxString> SystemSources::registryTexts(const wxString& key, const wxString& value)
-{
-    return readRegistryTexts(HKEY_LOCAL_MACHINE, key, value);
-}
-
-std::optional<wxString> SystemSources::specialFolder(int number)
+std::optional<wxString> specialFolder(SpecialFolder folder)
 {
     wchar_t path[MAX_PATH] = L"";
-    return SHGetSpecialFolderPathW(nullptr, path, number, FALSE) ? std::optional<wxString>(path) : std::nullopt;
+    if (!SHGetSpecialFolderPathW(nullptr, path, static_cast<int>(folder), FALSE))
+        return std::nullopt;
+    return path;
 }
 
-std::optional<wxString> SystemSources::temporaryFolder()
+std::optional<wxString> temporaryFolder()
 {
     const DWORD size = GetEnvironmentVariableW(L"TEMP", nullptr, 0);
     std::vector<wchar_t> text(size + 1);
@@ -45,37 +34,40 @@ std::optional<wxString> SystemSources::temporaryFolder()
     return path.GetFullPath();
 }
 
-wxString SystemSources::windowsFolder()
+wxString windowsFolder()
 {
     wchar_t path[MAX_PATH] = L"";
     GetWindowsDirectoryW(path, MAX_PATH);
     return path;
 }
 
-std::vector<wxString> SystemSources::dollarEntries(const wxString& folder)
+bool isFolder(const wxString& path)
 {
-    return listings_.of(folder).dollarEntries;
-}
-
-wxString SystemSources::serviceDataFolder()
-{
-    return getDataFilePath(kDataDirectory);
-}
-
-std::vector<wxString> SystemSources::userFolders(const wxString& name)
-{
-    return shellFolderPaths(name);
-}
-
-bool SystemSources::exists(const wxString& folder)
-{
-    const DWORD attributes = GetFileAttributesW(folder.wc_str());
+    const DWORD attributes = GetFileAttributesW(path.wc_str());
     return attributes != INVALID_FILE_ATTRIBUTES && (attributes & FILE_ATTRIBUTE_DIRECTORY);
 }
 
-bool SystemSources::keepsUserPlaces()
+} // namespace
+
+ExclusionSources systemSources(FolderListings& listings)
 {
-    return readGraylistEnabled().value_or(false);
+    ExclusionSources sources;
+    sources.mountPoints = [] { return volumeTable().mountPoints(); };
+    sources.registryText = [](const wxString& key, const wxString& value) {
+        return readRegistryText(HKEY_LOCAL_MACHINE, key, value);
+    };
+    sources.registryTexts = [](const wxString& key, const wxString& value) {
+        return readRegistryTexts(HKEY_LOCAL_MACHINE, key, value);
+    };
+    sources.specialFolder = specialFolder;
+    sources.temporaryFolder = temporaryFolder;
+    sources.windowsFolder = windowsFolder;
+    sources.dollarEntries = [&](const wxString& folder) { return listings.of(folder).dollarEntries; };
+    sources.serviceDataFolder = [] { return getDataFilePath(kDataDirectory); };
+    sources.userFolders = shellFolderPaths;
+    sources.exists = isFolder;
+    sources.keepsUserPlaces = [] { return readGraylistEnabled().value_or(false); };
+    return sources;
 }
 
 } // namespace tavi

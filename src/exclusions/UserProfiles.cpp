@@ -18,16 +18,16 @@ namespace {
 
 constexpr const wchar_t* kProfileList = L"Software\\Microsoft\\Windows NT\\CurrentVersion\\ProfileList";
 constexpr const wchar_t* kShellFolders = L"\\Software\\Microsoft\\Windows\\CurrentVersion\\Explorer\\Shell Folders";
-constexpr DWORD kMostSidBytes = 1024;
+constexpr DWORD kMaxSidBytes = 1024;
 
 int loadNesting = 0;
-// Only ever grows: each load of a hive gets a new name.
+// Never reset: each load of a hive gets a new name.
 int hiveCounter = 0;
 std::vector<wxString> loadedHives;
-// To tell whose hive a temporary name stands for.
+// The user's SID of each temporary hive. Only for a debugger.
 std::map<wxString, wxString> hiveOwners;
 
-// Both privileges on for as long as it lives, then as they were found.
+// Enables the two privileges that loading needs, and restores them on destruction.
 class HivePrivileges {
   public:
     HivePrivileges() noexcept
@@ -65,7 +65,7 @@ class HivePrivileges {
     bool held_ = false;
 };
 
-// The names of a key's sub-keys. Read before anything is done with them: loading a hive changes what is enumerated.
+// Returns the names of all sub-keys. All are read first, since loading a hive changes the enumeration.
 std::vector<wxString> subKeys(HKEY root, const wchar_t* path)
 {
     std::vector<wxString> names;
@@ -86,7 +86,7 @@ std::vector<wxString> subKeys(HKEY root, const wchar_t* path)
 bool readOwner(const wxString& profile, wxString& owner)
 {
     RegistryKey key;
-    BYTE sid[kMostSidBytes];
+    BYTE sid[kMaxSidBytes];
     DWORD size = sizeof(sid);
     if (RegOpenKeyExW(HKEY_LOCAL_MACHINE, profile.wc_str(), 0, KEY_READ, key.out()) != ERROR_SUCCESS ||
         RegQueryValueExW(key.get(), L"Sid", nullptr, nullptr, sid, &size) != ERROR_SUCCESS || !IsValidSid(sid))
@@ -107,11 +107,11 @@ void loadHive(const wxString& profile)
     const wxString file = *image + L"\\ntuser.dat";
     if (GetFileAttributesW(file.wc_str()) == INVALID_FILE_ATTRIBUTES)
         return;
-    // Not by Format(), which ends the process where memory runs out.
+    // Without Format(), which ends the process if memory runs out.
     const wxString name(L"tavi" + std::to_wstring(hiveCounter));
-    // Recorded first: a loaded hive that is not in the list would never be unloaded.
+    // Recorded before the load: if memory ran out after it, the hive would never be unloaded.
     loadedHives.push_back(name);
-    // Fails for a user who is logged on, whose hive the system has loaded.
+    // Fails for a user who is logged on, whose hive the system has already loaded.
     if (RegLoadKeyW(HKEY_USERS, name.wc_str(), file.wc_str()) != ERROR_SUCCESS) {
         loadedHives.pop_back();
         return;
@@ -143,7 +143,7 @@ void unloadUserHives() noexcept
     if (--loadNesting != 0)
         return;
     const HivePrivileges privileges;
-    // The hives stay, and the lists that name them.
+    // The hives stay loaded and recorded.
     if (!privileges.held())
         return;
     for (const wxString& name : loadedHives) {

@@ -3,37 +3,22 @@
 #include <algorithm>
 #include <cwchar>
 #include <mutex>
+#include <string_view>
 #include <vector>
 
 #include <wx/log.h>
 
 #include "core/Handles.h"
+#include "core/ScopeGuard.h"
 
 namespace tavi {
 namespace {
 
 constexpr DWORD kVolumeNameCharacters = 1023;
 constexpr DWORD kDeviceCharacters = 1024;
-constexpr std::size_t kVolumePrefix = 4;
+constexpr std::wstring_view kVolumePrefix = L"\\\\?\\";
 constexpr NTSTATUS kBufferTooSmall = static_cast<NTSTATUS>(0xC0000023);
 constexpr ULONG kCaseInsensitive = 0x40;
-
-// Ends what was begun with one of the functions that a table is given.
-template <class Function>
-class Ending {
-  public:
-    Ending(Function function, HANDLE handle) noexcept : function_(function), handle_(handle) {}
-    Ending(const Ending&) = delete;
-    Ending& operator=(const Ending&) = delete;
-    ~Ending()
-    {
-        function_(handle_);
-    }
-
-  private:
-    const Function function_;
-    const HANDLE handle_;
-};
 
 VolumeTable theTable(VolumeFunctions::system());
 
@@ -66,7 +51,7 @@ void VolumeTable::refreshVolumes()
     const HANDLE search = functions_.findFirst(name, kVolumeNameCharacters);
     if (search == INVALID_HANDLE_VALUE)
         return;
-    const Ending closing(functions_.findClose, search);
+    const ScopeGuard closing([&] { functions_.findClose(search); });
     do
         addVolume(name);
     while (functions_.findNext(search, name, kVolumeNameCharacters));
@@ -76,7 +61,7 @@ wxString VolumeTable::resolveLink(const wxString& device) const
 {
     if (!functions_.openLink)
         return device;
-    // The structure counts bytes and wants a writable pointer; it does not write.
+    // The structure counts bytes. Its pointer is not to const, but the kernel only reads.
     UNICODE_STRING name{};
     name.Buffer = const_cast<wchar_t*>(static_cast<const wchar_t*>(device.wc_str()));
     name.Length = static_cast<USHORT>(device.length() * sizeof(wchar_t));
@@ -88,7 +73,7 @@ wxString VolumeTable::resolveLink(const wxString& device) const
     HANDLE link = nullptr;
     if (functions_.openLink(&link, GENERIC_READ, &attributes) < 0)
         return device;
-    const Ending closing(functions_.closeLink, link);
+    const ScopeGuard closing([&] { functions_.closeLink(link); });
     wxString target = device;
     UNICODE_STRING text{};
     ULONG bytes = 0;
@@ -106,7 +91,7 @@ void VolumeTable::addVolume(const wxString& name)
 {
     const wxString bare = name.EndsWith(L"\\") ? name.Left(name.length() - 1) : name;
     wchar_t target[kDeviceCharacters] = L"";
-    if (!functions_.queryDevice(bare.Mid(kVolumePrefix).wc_str(), target, kDeviceCharacters))
+    if (!functions_.queryDevice(bare.Mid(kVolumePrefix.size()).wc_str(), target, kDeviceCharacters))
         target[0] = L'\0';
     const wxString device = resolveLink(target);
     if (functions_.driveType(name.wc_str()) != DRIVE_FIXED)

@@ -14,7 +14,7 @@
 
 namespace tavi {
 
-// The system's functions that the table is made from; tests put others in their place.
+// The system functions that the table calls; tests replace them.
 struct VolumeFunctions {
     decltype(&FindFirstVolumeW) findFirst = FindFirstVolumeW;
     decltype(&FindNextVolumeW) findNext = FindNextVolumeW;
@@ -22,17 +22,16 @@ struct VolumeFunctions {
     decltype(&QueryDosDeviceW) queryDevice = QueryDosDeviceW;
     decltype(&GetDriveTypeW) driveType = GetDriveTypeW;
     decltype(&GetVolumePathNamesForVolumeNameW) pathNames = GetVolumePathNamesForVolumeNameW;
-    // The kernel's own; null where the system does not have them: then device names stay as they are.
+    // Native functions of ntdll.dll. Without openLink device names are not resolved.
     NTSTATUS(NTAPI* openLink)(HANDLE* link, ACCESS_MASK access, OBJECT_ATTRIBUTES* attributes) = nullptr;
     NTSTATUS(NTAPI* queryLink)(HANDLE link, UNICODE_STRING* target, ULONG* bytes) = nullptr;
     NTSTATUS(NTAPI* closeLink)(HANDLE link) = nullptr;
 
-    // With the kernel's three, if it has all of them.
+    // Returns the system's functions, the native ones only if there are all three.
     static VolumeFunctions system();
 };
 
-// The mount points of all fixed volumes, each with the kernel device that backs it. Any thread; a refresh makes readers
-// wait.
+// The mount points of all fixed volumes, each with its kernel device. Any thread; a refresh blocks readers.
 class VolumeTable {
   public:
     explicit VolumeTable(const VolumeFunctions& functions) : functions_(functions) {}
@@ -40,7 +39,7 @@ class VolumeTable {
     void refreshVolumes();
     // Drive roots and folders, ending in a backslash.
     std::set<wxString> mountPoints() const;
-    // The mount point that was last reported for a device; empty for an unknown one.
+    // Returns the mount point that was last reported for a device, or an empty text.
     wxString mountPointOf(const wxString& device) const;
 
   private:
@@ -53,7 +52,7 @@ class VolumeTable {
     std::unordered_map<wxString, wxString, PathHash> devices_;
 };
 
-// The process's table.
+// Returns the table of this process.
 VolumeTable& volumeTable();
 
 } // namespace tavi
