@@ -9,8 +9,8 @@ namespace tavi::test {
 
 enum class Heap { cpp, sqlite };
 
-// While it lives, `failing` allocations of its thread from one heap fail once `succeeding` have succeeded. The
-// operators new and delete are in GraylistTest.cpp.
+// While it lives, `failing` allocations of its thread from one heap fail once `succeeding` have succeeded.
+// Allocations.cpp replaces the operators new and delete.
 class FailingAllocations {
   public:
     explicit FailingAllocations(int succeeding, Heap heap = Heap::cpp, int failing = 1 << 30)
