@@ -1,0 +1,25 @@
+#include "core/Paths.h"
+
+#include <windows.h>
+
+#include <gtest/gtest.h>
+
+#include "tests/support/Registry.h"
+
+namespace tavi {
+namespace {
+
+TEST(longPath, IsTheLongFormWithAnUpperCaseDriveLetterOrEmpty)
+{
+    const test::TemporaryFolder folder;
+    wchar_t shortPath[MAX_PATH];
+    GetShortPathNameW(folder.path().c_str(), shortPath, MAX_PATH);
+    EXPECT_NE(shortPath, folder.path());
+    shortPath[0] = L'c';
+    const wxString path = longPath(shortPath);
+    EXPECT_TRUE(path[0] == L'C' && path.IsSameAs(folder.path(), false)) << path.utf8_string();
+    EXPECT_EQ(longPath(folder.path() + L"\\missing"), L"");
+}
+
+} // namespace
+} // namespace tavi
