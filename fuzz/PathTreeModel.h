@@ -8,10 +8,22 @@
 
 namespace tavi::test {
 
-// The same rules over a flat list of full paths, with every question answered by looking through all of it.
+// Returns a counter of arbitrary numbers, the same for each call with one folder: 0, fewer than the tests have names,
+// as many, or more.
+inline EntryCounter arbitraryEntryCounts(std::size_t seed)
+{
+    return [seed](const wxString& folder, bool) {
+        std::size_t sum = seed;
+        for (const wchar_t character : view(folder))
+            sum = sum * 31 + static_cast<std::size_t>(character);
+        return static_cast<std::uint32_t>(sum % 1009 % 5);
+    };
+}
+
+// An independent model of PathTree: a flat list of full paths, all of which are searched for every answer.
 class PathTreeModel {
   public:
-    // The number of a FolderState.
+    // The numeric value of a FolderState.
     using State = std::uint32_t;
 
     explicit PathTreeModel(EntryCounter counter) : counter_(std::move(counter)) {}
@@ -60,8 +72,8 @@ class PathTreeModel {
                 column |= "1144442210"[state] - '0';
             }
             const std::uint32_t entries = counter_(path, false);
-            // Columns: bit 0 for children of state 0, 1 or 8, bit 1 for 6 or 7, bit 2 for 2 to 5. Rows: own states 0
-            // to 9.
+            // One row for each state 0 to 9 of the folder itself. The bits of the column say which states its children
+            // have: bit 0 for 0, 1 or 8, bit 1 for 6 or 7, bit 2 for 2 to 5.
             static const char* const others[] = {"00222222", "75733333", "00222222", "75733333", "64644444",
                                                  "75755555", "64644444", "75755555", "00222222", "00000000"};
             static const char* const whole[] = {"00622222", "11733333", "00622222", "11733333", "00622222",

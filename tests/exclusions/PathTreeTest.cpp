@@ -1,15 +1,15 @@
-#include <map>
+#include "exclusions/PathTree.h"
+
 #include <random>
 
 #include <gtest/gtest.h>
 
-#include "core/RefCounted.h"
 #include "fuzz/PathTreeModel.h"
 
 namespace tavi {
 namespace {
 
-TEST(PathTree, AnswersAsAnObviousModelDoes)
+TEST(PathTree, AnswersAsTheModelDoes)
 {
     std::mt19937 random(20260714);
     std::vector<std::wstring> paths = {L"a", L"b", L"c"};
@@ -18,11 +18,7 @@ TEST(PathTree, AnswersAsAnObviousModelDoes)
             paths.push_back(paths[i] + name);
     }
     for (int set = 0; set < 6000; ++set) {
-        // How many entries a folder has: none at all, fewer than there are names, as many, or more.
-        const std::size_t seed = random();
-        const EntryCounter counter = [seed](const wxString& folder, bool) {
-            return static_cast<std::uint32_t>((std::hash<std::wstring>()(folder.ToStdWstring()) ^ seed) % 1009 % 5);
-        };
+        const EntryCounter counter = test::arbitraryEntryCounts(random());
         const RefPtr<PathTree> tree = PathTree::create(false, counter);
         test::PathTreeModel model(counter);
         for (unsigned rule = 0, count = random() % 12 + 1; rule < count; ++rule) {
@@ -37,17 +33,24 @@ TEST(PathTree, AnswersAsAnObviousModelDoes)
     }
 }
 
-// Where the model has no say.
-TEST(PathTree, TakesOddPathsAsTheyAreAndCountsAFolderOnce)
+TEST(PathTree, CountsTheEntriesOfEachFolderOnce)
 {
     std::map<wxString, int> counted;
-    const RefPtr<PathTree> tree(PathTree::create(true, [&](const wxString& folder, bool foldersOnly) {
+    const RefPtr<PathTree> tree = PathTree::create(true, [&](const wxString& folder, bool foldersOnly) {
         EXPECT_TRUE(foldersOnly);
         ++counted[folder];
         return 5u;
-    }));
-    for (const wchar_t* const path : {L"C:\\A", L"C:\\B", L"C:\\B\\x", L""})
+    });
+    for (const wchar_t* const path : {L"C:\\A", L"C:\\B", L"C:\\B\\x"})
         tree->insert(path, FolderState::allOn);
+    EXPECT_EQ(counted, (std::map<wxString, int>{{L"C:", 1}, {L"C:\\B", 1}}));
+}
+
+TEST(PathTree, ComparesOddPathsExactly)
+{
+    const RefPtr<PathTree> tree = PathTree::create(false, [](const wxString&, bool) { return 5u; });
+    tree->insert(L"C:\\A", FolderState::allOn);
+    tree->insert(L"", FolderState::allOn);
     const std::pair<const wchar_t*, FolderState> answers[] = {{L"", FolderState::off},
                                                               {L"x", FolderState::allOff},
                                                               {L"\\x", FolderState::allOn},
@@ -55,13 +58,15 @@ TEST(PathTree, TakesOddPathsAsTheyAreAndCountsAFolderOnce)
                                                               {L"c:\\A", FolderState::allOff}};
     for (const auto& [path, state] : answers)
         EXPECT_EQ(tree->lookup(path), state) << wxString(path).utf8_string();
-    EXPECT_EQ(counted, (std::map<wxString, int>{{L"C:", 1}, {L"C:\\B", 1}}));
-    // As deep as a path can be: neither filling nor freeing goes by recursion.
-    const RefPtr<PathTree> deep(PathTree::create(false, [](const wxString&, bool) { return 0u; }));
+}
+
+TEST(PathTree, TakesAndFreesPathsOfManyComponents)
+{
+    const RefPtr<PathTree> tree = PathTree::create(false, [](const wxString&, bool) { return 0u; });
     std::wstring path(60000, L'\\');
     path[0] = L'x';
-    deep->insert(path.substr(0, 2000), FolderState::allOn);
-    EXPECT_EQ(deep->lookup(path), FolderState::allOn);
+    tree->insert(path.substr(0, 2000), FolderState::allOn);
+    EXPECT_EQ(tree->lookup(path), FolderState::allOn);
 }
 
 } // namespace
