@@ -191,38 +191,17 @@ void barePolling()
         Sleep(10);
 }
 
-// The module's own services, but each watcher has a state of its own.
-class Services final : public WatcherServices {
-  public:
-    ManifestRef loadManifest() override
-    {
-        return Manifest::parse(wxString());
-    }
-    bool manifestTime(std::int64_t& milliseconds) override
-    {
-        const auto time = readManifestTime();
-        milliseconds = time.value_or(0);
-        return time.has_value();
-    }
-    std::int64_t now() override
-    {
-        return wxDateTime::Now().GetValue().GetValue();
-    }
-    void sleep(std::uint32_t milliseconds) override
-    {
-        Sleep(milliseconds);
-    }
-    bool isStopping() override
-    {
-        return stopAll;
-    }
-    void buildExclusions(bool) override {}
-};
-
+// Polls as the module does, each call with a state of its own.
 void watch()
 {
     WatcherState state;
-    Services services;
+    WatcherServices services;
+    services.loadManifest = [] { return Manifest::parse(wxString()); };
+    services.manifestTime = readManifestTime;
+    services.now = [] { return wxDateTime::Now().GetValue().GetValue(); };
+    services.sleep = Sleep;
+    services.isStopping = [] { return stopAll.load(); };
+    services.buildExclusions = [](bool) {};
     runManifestWatcher(state, services);
 }
 

@@ -37,45 +37,22 @@ SharedReference retiredManifest;
 // Created before the process entry runs. Serialises the start of the watcher.
 const KernelHandle manifestMutex(CreateMutexW(nullptr, FALSE, nullptr));
 
-class SystemServices : public WatcherServices {
-  public:
-    explicit SystemServices(const BackgroundThread& thread) : thread_(thread) {}
-    ManifestRef loadManifest() override
-    {
-        return readStoredManifest();
-    }
-    bool manifestTime(std::int64_t& milliseconds) override
-    {
-        const auto time = readManifestTime();
-        milliseconds = time.value_or(0);
-        return time.has_value();
-    }
-    std::int64_t now() override
-    {
-        return wxDateTime::Now().GetValue().GetValue();
-    }
-    void sleep(std::uint32_t milliseconds) override
-    {
+void watchManifest(const BackgroundThread& self)
+{
+    WatcherServices services;
+    services.loadManifest = readStoredManifest;
+    services.manifestTime = readManifestTime;
+    services.now = [] { return wxDateTime::Now().GetValue().GetValue(); };
+    services.sleep = [](std::uint32_t milliseconds) {
         Sleep(milliseconds);
         retiredManifest.exchange({});
-    }
-    bool isStopping() override
-    {
-        return thread_.isStopping();
-    }
-    void buildExclusions(bool firstLoad) override
-    {
-        buildGraylist(!firstLoad);
-    }
-
-  private:
-    const BackgroundThread& thread_;
-};
-
-BackgroundThread watcherThread("manifest watcher", [](const BackgroundThread& self) {
-    SystemServices services(self);
+    };
+    services.isStopping = [&] { return self.isStopping(); };
+    services.buildExclusions = [](bool isFirst) { buildGraylist(!isFirst); };
     runManifestWatcher(watcher, services);
-});
+}
+
+BackgroundThread watcherThread("manifest watcher", watchManifest);
 
 } // namespace
 

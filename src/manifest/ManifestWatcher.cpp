@@ -37,7 +37,7 @@ ManifestRef readStoredManifest()
     return Manifest::parse(wxString());
 }
 
-void runManifestWatcher(WatcherState& state, WatcherServices& services)
+void runManifestWatcher(WatcherState& state, const WatcherServices& services)
 {
     const auto load = [&] {
         guarded("manifest load", [&] {
@@ -49,8 +49,8 @@ void runManifestWatcher(WatcherState& state, WatcherServices& services)
     };
     const auto loadIfChanged = [&] {
         guarded("manifest check", [&] {
-            std::int64_t changed = 0;
-            if (services.manifestTime(changed) && changed > state.lastLoad)
+            const auto changed = services.manifestTime();
+            if (changed && *changed > state.lastLoad)
                 load();
         });
     };

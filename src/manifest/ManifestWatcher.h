@@ -1,6 +1,8 @@
 #pragma once
 
 #include <cstdint>
+#include <functional>
+#include <optional>
 
 #include "manifest/Manifest.h"
 #include "core/PublishedPointer.h"
@@ -14,25 +16,22 @@ struct WatcherState {
     std::int64_t lastLoad = 0;
 };
 
-// The system as the watcher sees it. All methods are called on the watcher's thread.
-class WatcherServices {
-  public:
-    virtual ~WatcherServices() = default;
+// The system as the watcher sees it. All functions are called on the watcher's thread.
+struct WatcherServices {
     // Returns null if the stored text is invalid.
-    virtual ManifestRef loadManifest() = 0;
-    // Stores when the service last stored a manifest; returns false if that is not known. Both this time and now() are
-    // milliseconds of local time since 1970.
-    virtual bool manifestTime(std::int64_t& milliseconds) = 0;
-    virtual std::int64_t now() = 0;
-    virtual void sleep(std::uint32_t milliseconds) = 0;
+    std::function<ManifestRef()> loadManifest;
+    // Returns when the service last stored a manifest. This time and now() are milliseconds of local time since 1970.
+    std::function<std::optional<std::int64_t>()> manifestTime;
+    std::function<std::int64_t()> now;
+    std::function<void(std::uint32_t milliseconds)> sleep;
     // Returns whether the watcher is to return.
-    virtual bool isStopping() = 0;
-    virtual void buildExclusions(bool firstLoad) = 0;
+    std::function<bool()> isStopping;
+    std::function<void(bool isFirst)> buildExclusions;
 };
 
 // Loads the manifest, unless an earlier watcher has loaded the stored one, and polls for changes until
 // WatcherServices::isStopping. A failure is logged and ends one poll only.
-void runManifestWatcher(WatcherState& state, WatcherServices& services);
+void runManifestWatcher(WatcherState& state, const WatcherServices& services);
 
 // Returns the stored manifest; an empty one if there is none or the database fails, which is logged; null for an
 // invalid text.
