@@ -1,6 +1,5 @@
 #include <gtest/gtest.h>
 
-#include <algorithm>
 #include <map>
 #include <random>
 #include <thread>
@@ -13,28 +12,25 @@ namespace {
 
 using namespace test;
 
-// Readers keep references beyond later swaps; each manifest they hold must be whole.
 TEST(Manifest, StaysWholeForItsReadersWhileOthersReplaceIt)
 {
     PublishedPointer<const Manifest> published;
-    std::atomic<bool> done{false};
-    std::vector<std::thread> readers;
-    for (int reader = 0; reader < 3; ++reader)
-        readers.emplace_back([&] {
-            std::vector<ManifestRef> kept(4);
-            for (std::size_t turn = 0; !done; ++turn) {
-                kept[turn % kept.size()] = published.acquire();
-                for (const ManifestRef& manifest : kept)
-                    ASSERT_TRUE(!manifest ||
-                                utf8(manifest->hash()) == std::to_string(manifest->patches(0)[0].timestamp()));
-            }
-        });
+    std::atomic<bool> isDone{false};
+    const auto read = [&] {
+        std::vector<ManifestRef> kept(4); // beyond later replacements
+        for (std::size_t turn = 0; !isDone; ++turn) {
+            kept[turn % kept.size()] = published.acquire();
+            for (const ManifestRef& manifest : kept)
+                ASSERT_TRUE(!manifest || utf8(manifest->hash()) == std::to_string(manifest->patches(0)[0].timestamp()));
+        }
+    };
+    std::thread readers[] = {std::thread(read), std::thread(read), std::thread(read)};
     for (int version = 1; version <= 400; ++version) {
         const std::string number = std::to_string(version);
         published.replace(
             Manifest::parse(fromUtf8("USER\n_hash|" + number + "\n\n\nFILES\nC:\\a\n" + number + ":1:2:3:0:x:0:40")));
     }
-    done = true;
+    isDone = true;
     for (std::thread& reader : readers)
         reader.join();
 }
@@ -42,16 +38,13 @@ TEST(Manifest, StaysWholeForItsReadersWhileOthersReplaceIt)
 // UTF-8 with the halves of every character apart: what is a prefix in UTF-16 is one here too.
 std::string inHalves(const wxString& text)
 {
-    std::wstring units;
+    std::string bytes;
     for (const wchar_t unit : view(text)) {
         const auto point = static_cast<char32_t>(unit);
         if (point >= 0x10000)
-            units.push_back(static_cast<wchar_t>(0xD7C0 + (point >> 10)));
-        units.push_back(static_cast<wchar_t>(point >= 0x10000 ? 0xDC00 + (point & 0x3FF) : point));
+            appendUtf8(std::wstring(1, static_cast<wchar_t>(0xD7C0 + (point >> 10))), bytes);
+        appendUtf8(std::wstring(1, static_cast<wchar_t>(point >= 0x10000 ? 0xDC00 + (point & 0x3FF) : point)), bytes);
     }
-    std::string bytes;
-    for (const wchar_t unit : units)
-        appendUtf8({&unit, 1}, bytes);
     return bytes;
 }
 
@@ -66,68 +59,75 @@ std::wstring randomPath(std::mt19937& random, std::size_t longest)
     return path;
 }
 
-// Tells by a file's versions, each as "time:1:2:size:...", whether it is backed up at a time.
-bool existed(const std::string& versions, std::uint32_t time)
-{
-    std::istringstream all(versions);
-    bool exists = time == kAnyTime;
-    for (std::string version; time != kAnyTime && all >> version;) {
-        if (time == 0 || std::stoul(version) <= time)
-            exists = version.find(":1:2:-1:") == std::string::npos;
+struct ModelFile {
+    // As dump() writes them.
+    std::string versions;
+    // Whether the file exists from each version's time on.
+    std::vector<std::pair<std::uint32_t, bool>> changes;
+
+    bool existedAt(std::uint32_t time) const
+    {
+        bool exists = time == kAnyTime;
+        for (const auto& [since, existsNow] : changes)
+            exists = time == kAnyTime || (time != 0 && since > time) ? exists : existsNow;
+        return exists;
     }
-    return exists;
+};
+// By the path in halves.
+using Model = std::map<std::string, ModelFile>;
+
+// A large text has more than a block of everything, and lines longer than a block or a read.
+std::wstring randomText(std::mt19937& random, bool isLarge, Model& model)
+{
+    std::wstring text = L"FILES";
+    for (std::size_t files = isLarge ? 20000 : random() % 300; files-- > 0;) {
+        const std::size_t extra = isLarge && files == 10000 ? 1500000 : 0;
+        if (random() % 20 == 0 && text.back() == L'\n')
+            text += L"\n\nFILES";
+        const std::wstring path = L"C" + std::wstring(extra, L'd') + randomPath(random, isLarge ? 15 : 7);
+        text += L"\n" + path + L"\n";
+        ModelFile& file = model[inHalves(path)] = {};
+        for (std::size_t count = 1 + random() % 3; count-- > 0;) {
+            const std::uint32_t time = random() % 50;
+            const int size = static_cast<int>(random() % 4) - 1;
+            const std::string digest = std::string(32, 'a') + std::to_string(10000000 + random() % 90000000);
+            const std::string aux = extra != 0 ? std::string(extra, 'o') : random() % 4 == 0 ? "odd" : digest;
+            const std::string version = std::to_string(time) + ":1:2:" + std::to_string(size) + ":0:" + aux + ":0:40";
+            text += std::wstring(version.begin(), version.end()) + L"\n";
+            file.versions += version + " ";
+            file.changes.emplace_back(time, size >= 0);
+        }
+    }
+    if (text.back() == L'\n')
+        text.pop_back();
+    return text;
 }
 
-// The first round has more than a block of everything, and lines longer than a block or a read.
 TEST(Manifest, AnswersAsAWalkOverAllEntriesDoes)
 {
     std::mt19937 random(20261121);
     for (int round = 0; round < 60; ++round) {
-        const bool large = round == 0;
-        std::map<std::string, std::string> model;
-        std::wstring text = L"FILES";
-        for (std::size_t files = large ? 20000 : random() % 300; files-- > 0;) {
-            const bool longLines = large && files == 10000;
-            if (random() % 20 == 0 && text.back() == L'\n')
-                text += L"\n\nFILES";
-            const std::wstring path =
-                L"C" + std::wstring(longLines ? 1500000 : 0, L'd') + randomPath(random, large ? 15 : 7);
-            std::string versions;
-            for (std::size_t count = 1 + random() % 3; count-- > 0;) {
-                const std::string time = std::to_string(random() % 50);
-                const std::string size = std::to_string(static_cast<int>(random() % 4) - 1);
-                const std::string digest = std::string(32, 'a') + std::to_string(10000000 + random() % 90000000);
-                const std::string aux = longLines ? std::string(1500000, 'o') : random() % 4 == 0 ? "odd" : digest;
-                versions += time + ":1:2:" + size + ":0:" + aux + ":0:40 ";
-            }
-            std::wstring lines(versions.begin(), versions.end());
-            std::replace(lines.begin(), lines.end(), L' ', L'\n');
-            text += L"\n" + path + L"\n" + lines;
-            model[inHalves(path)] = versions;
-        }
-        if (text.back() == L'\n')
-            text.pop_back();
-        // Stored, with the halves of every character apart, the text is still the same.
+        Model model;
+        const std::wstring text = randomText(random, round == 0, model);
         const ManifestRef manifest = Manifest::parse(text);
-        ASSERT_EQ(dump(stored(packed(inHalves(text)))), dump(manifest));
+        ASSERT_EQ(dump(stored(packed(inHalves(text)))), dump(manifest)) << "characters stored in halves";
         ASSERT_EQ(manifest->fileCount(), model.size());
-
         std::vector<std::string> order;
         for (std::uint32_t file = 0; file < manifest->fileCount(); ++file) {
             const wxString path = manifest->filePath(file);
             order.push_back(inHalves(path));
-            EXPECT_EQ(dump(manifest->findPatches(view(path)).value()), model[order.back()]);
+            EXPECT_EQ(dump(manifest->findPatches(view(path)).value()), model[order.back()].versions);
         }
-        for (int question = 0; question < (large ? 30 : 300); ++question) {
+        for (int question = 0; question < (round == 0 ? 30 : 300); ++question) {
             const std::wstring wide = question == 0 ? L"" : L"C" + randomPath(random, 5);
             const std::string prefix = inHalves(wide);
             const std::uint32_t time = random() % 3 == 0 ? kAnyTime : random() % 60 * (random() % 2);
             std::vector<std::uint32_t> expected, visited;
-            bool backedUp = false;
+            bool isBackedUp = false;
             for (std::uint32_t file = 0; file < order.size(); ++file) {
                 if (order[file].compare(0, prefix.size(), prefix) == 0) {
                     expected.push_back(file);
-                    backedUp = backedUp || existed(model[order[file]], time);
+                    isBackedUp = isBackedUp || model[order[file]].existedAt(time);
                 }
             }
             manifest->forEachUnder(wide, [&](std::uint32_t file) {
@@ -135,8 +135,8 @@ TEST(Manifest, AnswersAsAWalkOverAllEntriesDoes)
                 return true;
             });
             ASSERT_EQ(visited, expected);
-            ASSERT_EQ(manifest->hasBackedUpUnder(wide, time), backedUp);
-            ASSERT_EQ(manifest->isBackedUp(wide, time), model.count(prefix) == 1 && existed(model[prefix], time));
+            ASSERT_EQ(manifest->hasBackedUpUnder(wide, time), isBackedUp);
+            ASSERT_EQ(manifest->isBackedUp(wide, time), model.count(prefix) == 1 && model[prefix].existedAt(time));
         }
     }
 }

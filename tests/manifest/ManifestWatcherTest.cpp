@@ -16,72 +16,65 @@ namespace {
 
 using namespace test;
 
-// The times are what the service's setting says, round by round; the third load is invalid and the fourth fails.
-class ScriptedServices : public WatcherServices {
-  public:
-    ManifestRef loadManifest() override
+class ManifestWatcher : public testing::Test {
+  protected:
+    // Load n happens at n seconds. The third is invalid and the fourth fails.
+    void run(int sleeps)
     {
-        ++loads;
-        if (loads == 4)
-            throw std::runtime_error("no manifest");
-        return loads == 3 ? ManifestRef() : Manifest::parse(wxString::Format("USER\n_hash|%d", loads));
+        WatcherServices services;
+        services.loadManifest = [&] {
+            if (++loads_ == 4)
+                throw std::runtime_error("no manifest");
+            return loads_ == 3 ? ManifestRef() : Manifest::parse(wxString::Format("USER\n_hash|%d", loads_));
+        };
+        services.manifestTime = [&] {
+            constexpr std::optional<std::int64_t> kTimes[] = {{}, 1000, 1001, 1999, 2000, 9000, 9000, {}};
+            return kTimes[std::min(polls_++, std::size(kTimes) - 1)];
+        };
+        services.now = [&] { return 1000 * loads_; };
+        services.sleep = [&](std::uint32_t milliseconds) {
+            EXPECT_EQ(milliseconds, 500u);
+            --sleeps;
+        };
+        services.isStopping = [&] { return sleeps <= 0; };
+        services.buildExclusions = [&](bool isFirst) {
+            builds_.push_back(isFirst ? -1 : static_cast<int>(polls_));
+            throw std::runtime_error("must not end the watcher");
+        };
+        runManifestWatcher(state_, services);
+        EXPECT_EQ(sleeps, 0);
     }
-    bool manifestTime(std::int64_t& milliseconds) override
-    {
-        const std::int64_t times[] = {-1, 1000, 1001, 1999, 2000, 9000, 9000};
-        milliseconds = rounds < std::size(times) ? times[rounds] : -1;
-        ++rounds;
-        return milliseconds >= 0;
-    }
-    std::int64_t now() override
-    {
-        return 1000 * loads;
-    }
-    void sleep(std::uint32_t milliseconds) override
-    {
-        EXPECT_EQ(milliseconds, 500u);
-        --naps;
-    }
-    bool isStopping() override
-    {
-        return naps <= 0;
-    }
-    void buildExclusions(bool firstLoad) override
-    {
-        builds.push_back(firstLoad ? -1 : static_cast<int>(rounds));
-        throw std::runtime_error("must not end the watcher");
-    }
-
-    WatcherState state;
-    int naps = 0, loads = 0;
-    std::uint32_t rounds = 0;
-    std::vector<int> builds;
+    const LogCapture log_;
+    WatcherState state_;
+    int loads_ = 0;
+    std::size_t polls_ = 0;
+    std::vector<int> builds_;
 };
 
-TEST(ManifestWatcher, ReloadsForALaterTimeRebuildsEvery18thRoundAndStopsWithinANap)
+TEST_F(ManifestWatcher, ReloadsForALaterTimeAndKeepsTheLastValidManifest)
 {
-    const LogCapture log;
-    // The n-th load is at n seconds, and a load does not take over the time that the service wrote.
-    ScriptedServices services;
-    services.naps = 10 * 55 + 3;
-    runManifestWatcher(services.state, services);
-    EXPECT_EQ(services.naps, 0);
-    EXPECT_EQ(services.loads, 4);
-    EXPECT_EQ(services.rounds, 55u);
-    EXPECT_EQ(services.builds, (std::vector<int>{-1, 18, 36, 54}));
-    // The invalid and the failing one leave the one in force.
-    EXPECT_EQ(dump(services.state.manifest.acquire()), "2[] ");
+    run(10 * 8);
+    EXPECT_EQ(loads_, 4);
+    EXPECT_EQ(dump(state_.manifest.acquire()), "2[] ");
+}
 
-    // The first load is not skipped. A second run finds the manifest of the first: it loads a changed one only. The
-    // third round's time is later.
-    ScriptedServices stopped;
+TEST_F(ManifestWatcher, RebuildsTheExclusionsEvery18thPoll)
+{
+    run(10 * 55 + 3);
+    EXPECT_EQ(builds_, (std::vector<int>{-1, 18, 36, 54}));
+    EXPECT_EQ(polls_, 55u);
+}
+
+TEST_F(ManifestWatcher, StartedAgainLoadsAChangedManifestOnly)
+{
+    // The time of the third run's poll is later than the first load.
     for (const int loads : {1, 1, 1, 2, 2}) {
-        runManifestWatcher(stopped.state, stopped);
-        EXPECT_EQ(stopped.loads, loads) << stopped.rounds;
+        run(0);
+        EXPECT_EQ(loads_, loads) << "after poll " << polls_;
     }
 }
 
-TEST(readStoredManifest, IsEmptyWhereThereIsNoneAndWarnsOfFailures)
+TEST(readStoredManifest, IsEmptyWhereThereIsNoneAndLogsFailures)
 {
     LogCapture log;
     InstalledService service;

@@ -15,7 +15,7 @@ using namespace std::string_literals;
 
 const std::string kHead = "FILES\nfile\n1:2:0:";
 
-// Texts whose last field is the aux text, so that it shows where they end.
+// The text behind kHead is an aux text, which shows where the whole text ends.
 std::string auxText(const std::string& blob)
 {
     const ManifestRef manifest = stored(blob);
@@ -23,9 +23,9 @@ std::string auxText(const std::string& blob)
     return patches ? utf8((*patches)[0].auxText()) : "none";
 }
 
-TEST(StoredManifest, TheTextEndsAtTheFirstFault)
+TEST(StoredManifest, EndsAtTheFirstZeroOrMalformedSequence)
 {
-    // The first and the last of each length, and of the halves of characters.
+    // The first and the last of each length, and of the surrogates.
     const std::string valid =
         "a\xC2\x80\xDF\xBF\xE0\xA0\x80\xED\x9F\xBF\xED\xA0\x80\xEF\xBF\xBF\xF0\x90\x80\x80\xF4\x8F\xBF\xBF";
     const std::string later = std::string(100000, 'x') + "\xC3\xA4\n1:2:3:4:5:6:7:8:9";
@@ -33,7 +33,7 @@ TEST(StoredManifest, TheTextEndsAtTheFirstFault)
                                   "\xFF",     "\xFB\xBF\xBF\xBF\xBF", "\xE6\x97z",        "\xC3\xC3\xA4",     "\0b\0"s,
                                   "\0\xFF"s,  "\0"s + later};
     for (const std::string& fault : faults) {
-        // Also far behind the first write, at every place of the machine's word.
+        // Also behind the first read, at every offset in a machine word.
         for (const std::size_t length : {0u, 100000u, 100001u, 100002u, 100003u}) {
             const std::string before = std::string(length, 'x') + valid;
             EXPECT_EQ(auxText(packed(kHead + before + fault + "z")), before) << fault;
@@ -42,22 +42,27 @@ TEST(StoredManifest, TheTextEndsAtTheFirstFault)
     }
 }
 
-TEST(StoredManifest, ACharacterCutByAWriteGoesOnInTheNext)
+TEST(StoredManifest, KeepsACharacterThatAReadCutsInTwo)
 {
     for (const std::string whole : {"\xC3\xA4", "\xE6\x97\xA5", "\xF0\x9F\x98\x80"}) {
         for (std::size_t behind = 1; behind <= whole.size(); ++behind) {
             const std::string text = std::string(64 * 1024 - kHead.size() - behind, 'x') + whole + "end";
             EXPECT_EQ(auxText(packed(kHead + text)), text);
         }
-        // What one text leaves behind begins the next; a text from elsewhere neither takes nor clears it.
+    }
+}
+
+TEST(StoredManifest, BeginsWithTheCharacterThatTheFormerTextLeftCut)
+{
+    for (const std::string whole : {"\xC3\xA4", "\xE6\x97\xA5", "\xF0\x9F\x98\x80"}) {
         for (std::size_t cut = 1; cut < whole.size(); ++cut) {
             EXPECT_EQ(auxText(packed(kHead + "a" + whole.substr(0, cut))), "a");
-            EXPECT_EQ(dump(Manifest::parse("FILES\nb\n1")), "b = 0:1:0:0:0::0:0 ");
+            EXPECT_EQ(dump(Manifest::parse("FILES\nb\n1")), "b = 0:1:0:0:0::0:0 ") << "not stored, so not affected";
             const ManifestRef next = stored(packed(whole.substr(cut) + "x\n\n\n" + kHead + "b"));
             EXPECT_EQ(next->fileCount(), 1u);
             EXPECT_EQ(next->textLength(), (whole.size() == 4 ? 2u : 1u) + 4 + kHead.size() + 1 + 1);
 
-            // Also from behind a zero; and what does not go on ends the next text at once, and is gone with it.
+            // Also behind a zero. A text that does not continue the character ends at once.
             EXPECT_EQ(auxText(packed(kHead + "a\0"s + whole.substr(0, cut))), "a");
             EXPECT_EQ(stored(packed(kHead + "b"))->textLength(), 1u);
             EXPECT_EQ(auxText(packed(kHead + "b")), "b");
@@ -65,14 +70,18 @@ TEST(StoredManifest, ACharacterCutByAWriteGoesOnInTheNext)
     }
 }
 
-TEST(StoredManifest, HeadersAndBrokenBlobs)
+TEST(StoredManifest, TakesGzipAndEmptyTextsInSilence)
 {
     LogCapture log;
     EXPECT_EQ(auxText(packed(kHead + "gzip", wxZLIB_GZIP)), "gzip");
     EXPECT_EQ(dump(stored("")) + dump(stored(packed(""))), "");
     EXPECT_TRUE(log.take().empty());
-    EXPECT_EQ(dump(stored("no compressed data")) + dump(stored(packed(kHead).substr(0, 1))), "");
+}
 
+TEST(StoredManifest, HoldsWhatABrokenBlobInflatesTo)
+{
+    LogCapture log;
+    EXPECT_EQ(dump(stored("no compressed data")) + dump(stored(packed(kHead).substr(0, 1))), "");
     std::mt19937 random(1);
     std::string noise;
     while (noise.size() < 300000)
