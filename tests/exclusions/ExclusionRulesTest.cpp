@@ -38,29 +38,19 @@ std::string rulesOf(const ExclusionSources& sources)
     return text;
 }
 
-const std::string kMachineRules =
-    R"(C:\System Volume Information|C:\RECYCLER|C:\MSOCache|C:\Config.msi|C:\hiberfil.sys|)"
-    R"(D:\m\System Volume Information|D:\m\RECYCLER|D:\m\MSOCache|D:\m\Config.msi|D:\m\hiberfil.sys|)"
-    R"(Memory Management PagingFiles|C:\p.sys||W\PrefetchParameters.RootDirPath|tmp|W\Temp|W\assembly|)"
-    R"(W\$bW|W\$a|data|#10|CD Burning1|CD Burning2|Cache1|Cache2|Internet Settings.ActiveXCache|)"
-    R"(SchedulingAgent.TasksFolder|Recording.RecordPath\TempRec|)";
-
 TEST(ExclusionRules, AreTheMachinesAndThenTheUsersPlacesInOrder)
 {
     EXPECT_EQ(rulesOf(namedSources()),
-              kMachineRules +
-                  R"(#47|Cookies1|Cookies2|History1|History2|Local Settings1|Local Settings2|Local AppData1|)"
-                  R"(Local AppData1\Microsoft\Outlook+|Local AppData2|Local AppData2\Identities+|NetHood1|NetHood2|)"
-                  R"(PrintHood1|PrintHood2|Recent1|Recent2|#37|#36|#43|#44|#38|#38\Intuit\QuickBooks+|)"
-                  R"(#38\Intuit\QuickBooks Pro+|#38\Intuit\Quicken+|#38\Quicken+|#42|#42\Intuit\QuickBooks+|)"
-                  R"(#42\Intuit\QuickBooks Pro+|#42\Intuit\Quicken+|#42\Quicken+|)");
-}
-
-TEST(ExclusionRules, LeaveTheUsersPlacesOutByTheSetting)
-{
-    ExclusionSources sources = namedSources();
-    sources.keepsUserPlaces = [] { return true; };
-    EXPECT_EQ(rulesOf(sources), kMachineRules);
+              R"(C:\System Volume Information|C:\RECYCLER|C:\MSOCache|C:\Config.msi|C:\hiberfil.sys|)"
+              R"(D:\m\System Volume Information|D:\m\RECYCLER|D:\m\MSOCache|D:\m\Config.msi|D:\m\hiberfil.sys|)"
+              R"(Memory Management PagingFiles|C:\p.sys||W\PrefetchParameters.RootDirPath|tmp|W\Temp|W\assembly|)"
+              R"(W\$bW|W\$a|data|#10|CD Burning1|CD Burning2|Cache1|Cache2|Internet Settings.ActiveXCache|)"
+              R"(SchedulingAgent.TasksFolder|Recording.RecordPath\TempRec|)"
+              R"(#47|Cookies1|Cookies2|History1|History2|Local Settings1|Local Settings2|Local AppData1|)"
+              R"(Local AppData1\Microsoft\Outlook+|Local AppData2|Local AppData2\Identities+|NetHood1|NetHood2|)"
+              R"(PrintHood1|PrintHood2|Recent1|Recent2|#37|#36|#43|#44|#38|#38\Intuit\QuickBooks+|)"
+              R"(#38\Intuit\QuickBooks Pro+|#38\Intuit\Quicken+|#38\Quicken+|#42|#42\Intuit\QuickBooks+|)"
+              R"(#42\Intuit\QuickBooks Pro+|#42\Intuit\Quicken+|#42\Quicken+|)");
 }
 
 TEST(ExclusionRules, SkipSourcesWithoutAnAnswer)
@@ -71,11 +61,8 @@ TEST(ExclusionRules, SkipSourcesWithoutAnAnswer)
     sources.specialFolder = [](SpecialFolder) { return std::nullopt; };
     sources.temporaryFolder = [] { return std::nullopt; };
     sources.serviceDataFolder = [] { return L""; };
-    EXPECT_EQ(rulesOf(sources),
-              R"(Memory Management PagingFiles|C:\p.sys||W\Temp|W\assembly|W\$bW|W\$a|CD Burning1|CD Burning2|)"
-              R"(Cache1|Cache2|Cookies1|Cookies2|History1|History2|Local Settings1|Local Settings2|Local AppData1|)"
-              R"(Local AppData1\Microsoft\Outlook+|Local AppData2|Local AppData2\Identities+|NetHood1|NetHood2|)"
-              R"(PrintHood1|PrintHood2|Recent1|Recent2|)");
+    sources.userFolders = [](auto&) { return std::vector<wxString>(); };
+    EXPECT_EQ(rulesOf(sources), R"(Memory Management PagingFiles|C:\p.sys||W\Temp|W\assembly|W\$bW|W\$a|)");
 }
 
 } // namespace

@@ -16,7 +16,8 @@ namespace tavi {
 namespace {
 
 using namespace test;
-using List = RefPtr<const PathTree>;
+
+constexpr auto adopt = RefPtr<const PathTree>::adopt;
 
 // Users whose folders get every odd state, by which they are named. Each build logs one line, since the install key
 // names no data folder.
@@ -51,7 +52,7 @@ TEST_F(Graylists, HoldTheSystemsPlacesAndTheUsersUnlessSwitchedOff)
     service_.install().SetValue(L"DataPath", L"C:\\served");
     for (const bool keeps : {true, false}) {
         wxRegKey(getSettingsKeyName()).SetValue(L"options.graylist", long{keeps});
-        const auto list = List::adopt(getGraylist(true));
+        getGraylist(true)->Release();
         const std::pair<wxString, bool> places[] = {{wxString(windows) + L"\\Temp\\x", true},
                                                     {L"C:\\served", true},
                                                     {L"C:\\scratch\\x", true},
@@ -67,10 +68,10 @@ TEST_F(Graylists, HoldTheSystemsPlacesAndTheUsersUnlessSwitchedOff)
 
 TEST_F(Graylists, StayWholeForTheirHoldersWhenReplaced)
 {
-    const auto first = List::adopt(getGraylist(true)), same = List::adopt(getGraylist(false));
-    EXPECT_EQ(same.get(), first.get());
+    const auto first = adopt(getGraylist(true));
+    EXPECT_EQ(adopt(getGraylist(false)).get(), first.get());
     const Counts counts = countNow();
-    const auto next = List::adopt(getGraylist(true));
+    const auto next = adopt(getGraylist(true));
     EXPECT_NE(next.get(), first.get());
     EXPECT_EQ(first->lookup(L"C:\\users\\x\\y"), next->lookup(L"C:\\users\\x\\y"));
     EXPECT_TRUE(temporaryHives().empty());
@@ -93,7 +94,7 @@ TEST_F(Graylists, AnswerByState)
 
 TEST_F(Graylists, CountNoEntryThatTheListInForceLeavesOut)
 {
-    const auto list = List::adopt(getGraylist(true));
+    getGraylist(true)->Release();
     // The folder 7 and the cache do not count, so each entry left has a rule of its own.
     const PathTree* const users = getUserDataTree(true);
     for (const wchar_t* const name : {L"", L"\\3", L"\\5"})
@@ -101,7 +102,7 @@ TEST_F(Graylists, CountNoEntryThatTheListInForceLeavesOut)
     // In the users' places all count, also if another list is published during the build.
     log_.take();
     log_.onNextLine([] { getGraylist(false)->Release(); });
-    EXPECT_EQ(List::adopt(getGraylist(true))->lookup(view(here_)), FolderState::onMostOn);
+    EXPECT_EQ(adopt(getGraylist(true))->lookup(view(here_)), FolderState::onMostOn);
     EXPECT_EQ(log_.take().size(), 2u) << "one for each list";
 }
 

@@ -56,8 +56,8 @@ TEST_F(UserProfiles, LeaveThePrivilegesAsTheyWere)
 {
     const KernelHandle token = processToken();
     loadUserHives();
-    for (const wchar_t* const name : {L"SeBackupPrivilege", L"SeRestorePrivilege"})
-        EXPECT_FALSE(isPrivilegeEnabled(token.get(), name)) << name;
+    EXPECT_FALSE(isPrivilegeEnabled(token.get(), L"SeBackupPrivilege"));
+    EXPECT_FALSE(isPrivilegeEnabled(token.get(), L"SeRestorePrivilege"));
     setPrivilege(token.get(), L"SeRestorePrivilege", true);
     unloadUserHives();
     EXPECT_TRUE(isPrivilegeEnabled(token.get(), L"SeRestorePrivilege"));

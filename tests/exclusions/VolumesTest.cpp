@@ -56,14 +56,12 @@ BOOL WINAPI pathNames(LPCWSTR, LPWSTR paths, DWORD size, PDWORD length)
     SetLastError(volume.errors[size > 0]);
     return volume.errors[size > 0] == ERROR_SUCCESS;
 }
-NTSTATUS NTAPI openLink(HANDLE* link, ACCESS_MASK access, OBJECT_ATTRIBUTES* attributes)
+NTSTATUS NTAPI openLink(HANDLE* link, ACCESS_MASK, OBJECT_ATTRIBUTES* attributes)
 {
-    EXPECT_EQ(access, GENERIC_READ);
-    EXPECT_EQ(attributes->Attributes, 0x40u);
-    *link = GetProcessHeap();
-    const std::wstring name(attributes->ObjectName->Buffer, attributes->ObjectName->Length / sizeof(wchar_t));
-    const bool isLink = name == L"\\Device\\Volume{1}";
+    const UNICODE_STRING& name = *attributes->ObjectName;
+    const bool isLink = std::wstring_view(name.Buffer, name.Length / sizeof(wchar_t)) == L"\\Device\\Volume{1}";
     openHandles += isLink;
+    *link = GetProcessHeap();
     return isLink ? 0 : static_cast<NTSTATUS>(0xC0000024);
 }
 NTSTATUS NTAPI queryLink(HANDLE, UNICODE_STRING* target, ULONG* bytes)
@@ -72,8 +70,7 @@ NTSTATUS NTAPI queryLink(HANDLE, UNICODE_STRING* target, ULONG* bytes)
     *bytes = kName.size() * sizeof(wchar_t);
     if (target->MaximumLength < *bytes)
         return static_cast<NTSTATUS>(0xC0000023);
-    std::copy(kName.begin(), kName.end(), target->Buffer);
-    target->Length = static_cast<USHORT>(*bytes);
+    target->Length = static_cast<USHORT>(kName.copy(target->Buffer, kName.size()) * sizeof(wchar_t));
     return 0;
 }
 
