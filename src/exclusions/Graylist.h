@@ -17,9 +17,9 @@ void buildGraylist(bool refresh);
 // list.
 const PathTree* getUserDataTree(bool refresh);
 
-// Returns whether the path is left out, with or without exceptions beneath it.
+// Returns whether the path is left out and so is something beneath it, or everything.
 bool isGrayed(const wxString& path);
-// Returns whether the path is left out with exceptions beneath it.
+// Returns whether the path is left out, but not everything beneath it.
 bool isPartlyGrayed(const wxString& path);
 // Returns whether a user rule leaves the path out.
 bool isUserData(const wxString& path);

@@ -161,7 +161,7 @@ Manifest::FileRanges Manifest::filesUnder(std::wstring_view prefix) const
     FileRange(&ranges)[4] = found.ranges;
     std::string low = toUtf8(prefix);
     between(low, low + kAboveAll, ranges[0], ranges[2]);
-    if (!prefix.empty() && isHighSurrogate(prefix.back())) {
+    if (!prefix.empty() && isHighSurrogate(static_cast<char32_t>(prefix.back()))) {
         // The prefix ends within a character: paths with any character that begins with this half match too.
         const std::wstring whole(prefix);
         low = toUtf8(whole + kFirstLowSurrogate);
