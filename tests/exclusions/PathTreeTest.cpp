@@ -33,7 +33,7 @@ TEST(PathTree, AnswersAsTheModelDoes)
     }
 }
 
-TEST(PathTree, CountsTheEntriesOfEachFolderOnce)
+TEST(PathTree, ComparesOddPathsExactlyAndCountsAFolderOnce)
 {
     std::map<wxString, int> counted;
     const RefPtr<PathTree> tree = PathTree::create(true, [&](const wxString& folder, bool foldersOnly) {
@@ -41,23 +41,14 @@ TEST(PathTree, CountsTheEntriesOfEachFolderOnce)
         ++counted[folder];
         return 5u;
     });
-    for (const wchar_t* const path : {L"C:\\A", L"C:\\B", L"C:\\B\\x"})
+    for (const wchar_t* const path : {L"C:\\A", L"C:\\B", L"C:\\B\\x", L""})
         tree->insert(path, FolderState::allOn);
+    EXPECT_EQ(tree->lookup(L""), FolderState::off);
+    EXPECT_EQ(tree->lookup(L"x"), FolderState::allOff);
+    EXPECT_EQ(tree->lookup(L"\\x"), FolderState::allOn);
+    EXPECT_EQ(tree->lookup(L"C:\\"), FolderState::offSomeOn);
+    EXPECT_EQ(tree->lookup(L"c:\\A"), FolderState::allOff);
     EXPECT_EQ(counted, (std::map<wxString, int>{{L"C:", 1}, {L"C:\\B", 1}}));
-}
-
-TEST(PathTree, ComparesOddPathsExactly)
-{
-    const RefPtr<PathTree> tree = PathTree::create(false, [](const wxString&, bool) { return 5u; });
-    tree->insert(L"C:\\A", FolderState::allOn);
-    tree->insert(L"", FolderState::allOn);
-    const std::pair<const wchar_t*, FolderState> answers[] = {{L"", FolderState::off},
-                                                              {L"x", FolderState::allOff},
-                                                              {L"\\x", FolderState::allOn},
-                                                              {L"C:\\", FolderState::offSomeOn},
-                                                              {L"c:\\A", FolderState::allOff}};
-    for (const auto& [path, state] : answers)
-        EXPECT_EQ(tree->lookup(path), state) << wxString(path).utf8_string();
 }
 
 TEST(PathTree, TakesAndFreesPathsOfManyComponents)
