@@ -30,7 +30,7 @@ inline std::string utf8(const wxString& text)
     return toUtf8(view(text));
 }
 
-// The versions as the fields of the longest layout, attributes in octal.
+// Returns the versions in the layout of eight fields.
 inline std::string dump(const ManifestPatchList& patches)
 {
     std::ostringstream out;
@@ -43,7 +43,7 @@ inline std::string dump(const ManifestPatchList& patches)
     return out.str();
 }
 
-// "hash[user]" if either is not the initial one, then each file and its versions.
+// Returns "hash[user]" if either is not the initial one, then each file and its versions.
 inline std::string dump(const ManifestRef& manifest)
 {
     if (!manifest)

@@ -35,7 +35,7 @@ TEST(Manifest, StaysWholeForItsReadersWhileOthersReplaceIt)
         reader.join();
 }
 
-// UTF-8 with the halves of every character apart: what is a prefix in UTF-16 is one here too.
+// Converts to UTF-8 with surrogates in three-byte form, so that every prefix in UTF-16 is a prefix in bytes too.
 std::string inHalves(const wxString& text)
 {
     std::string bytes;
@@ -48,7 +48,7 @@ std::string inHalves(const wxString& text)
     return bytes;
 }
 
-// Few characters, so that paths, folders and prefixes meet; halves of characters among them.
+// Uses few characters, so that paths, folders and prefixes coincide. Surrogates are among them.
 std::wstring randomPath(std::mt19937& random, std::size_t longest)
 {
     constexpr wchar_t kCharacters[] = {L'a',   L'b',   L'\\',  L'\\',  0xE4,   0x65E5,
@@ -67,7 +67,7 @@ bool existed(const ManifestPatchList& patches, std::uint32_t time)
     return exists;
 }
 
-// The versions of each path in halves, as dump() writes them.
+// The versions of each path, as dump() writes them.
 using Model = std::map<std::string, std::string>;
 
 // A large text has more than a block of everything, and lines longer than a block or a read.
