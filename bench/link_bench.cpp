@@ -31,10 +31,13 @@ Bytes streamOf(unsigned messages)
     const auto none = std::make_shared<wxString>();
     Bytes stream;
     for (unsigned i = 0; i < messages; ++i) {
-        constexpr std::uint32_t kTypes[] = {54, 56, 56, 55};
-        const std::uint32_t type = i == 0 ? 51 : i == 1 ? 53 : kTypes[i % 4];
+        constexpr EventType kTypes[] = {EventType::restoreItem, EventType::restoreDone, EventType::restoreDone,
+                                        EventType::restoreItemEnded};
+        const EventType type = i == 0 ? EventType::restoreStarted : i == 1 ? EventType::restoreTotal : kTypes[i % 4];
         const auto frame = MessageBuffer::create();
-        EventMessage(type, 0, type == 53 ? 1u << 30 : 65536, 0, type == 54 ? path : none).serialise(*frame);
+        EventMessage(type, 0, type == EventType::restoreTotal ? 1u << 30 : 65536, 0,
+                     type == EventType::restoreItem ? path : none)
+            .serialise(*frame);
         stream.insert(stream.end(), frame->data(), frame->data() + frame->length());
     }
     return stream;
@@ -52,16 +55,11 @@ class UnpacedSource final : public ByteSource {
         return open;
     }
     void pause() override {}
-    bool startRead(unsigned char* into, std::uint32_t size) override
+    bool read(unsigned char* into, std::uint32_t size) override
     {
         DWORD count = 0;
         return ReadFile(pipe_, into, size, &count, nullptr);
     }
-    bool finishRead() override
-    {
-        return true;
-    }
-    void abandonRead() override {}
 
   private:
     const HANDLE pipe_;

@@ -20,7 +20,7 @@ class Peer : public ByteSource {
         return length_ > 0;
     }
     void pause() override {}
-    bool startRead(unsigned char* into, std::uint32_t size) override
+    bool read(unsigned char* into, std::uint32_t size) override
     {
         const std::size_t count = std::min({std::size_t{size}, length_, part_});
         std::memcpy(into, bytes_, count);
@@ -29,11 +29,6 @@ class Peer : public ByteSource {
         part_ = length_ > 0 ? std::size_t{bytes_[0]} + 1 : 1;
         return count > 0;
     }
-    bool finishRead() override
-    {
-        return true;
-    }
-    void abandonRead() override {}
 
   private:
     const std::uint8_t* bytes_;
@@ -66,7 +61,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t len
         payload->ensure(once->length());
         payload->setLength(once->length() - kFrameHeaderSize);
         std::memcpy(payload->data(), once->data() + kFrameHeaderSize, payload->length());
-        createMessage(message->type(), *payload)->serialise(*again);
+        createMessage(static_cast<std::uint32_t>(message->type()), *payload)->serialise(*again);
         if (once->length() != again->length() || std::memcmp(once->data(), again->data(), once->length()) != 0)
             std::abort();
     }

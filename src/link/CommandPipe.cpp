@@ -10,7 +10,6 @@ namespace tavi {
 namespace {
 
 constexpr const wchar_t* kCommandPipe = L"\\\\.\\pipe\\tavibackup";
-constexpr std::uint32_t kCancelRestore = 52;
 
 } // namespace
 
@@ -29,7 +28,7 @@ bool CommandPipe::sendCommand(std::unique_ptr<PipeMessage>& message)
 
 std::unique_ptr<PipeMessage> CommandPipe::cancelRestore()
 {
-    return std::make_unique<EventMessage>(kCancelRestore);
+    return std::make_unique<EventMessage>(EventType::restoreEnded);
 }
 
 } // namespace tavi

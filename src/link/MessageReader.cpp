@@ -17,7 +17,7 @@ std::unique_ptr<PipeMessage> readFrame(ByteSource& source, const StopCheck& stop
     const auto stopped = [&] { return stopCheck && stopCheck(); };
     const auto buffer = MessageBuffer::create();
 
-    // One pause even when bytes are there already: it also limits how fast a peer can make the reader work.
+    // Pauses once even if bytes are available: this limits how often a peer can wake the reader.
     std::uint32_t available = 0;
     while (available == 0) {
         if (!source.peek(available))
@@ -27,16 +27,11 @@ std::unique_ptr<PipeMessage> readFrame(ByteSource& source, const StopCheck& stop
             return nullptr;
     }
     unsigned char header[kFrameHeaderSize] = {};
-    if (!source.startRead(header, sizeof(header)))
-        return nullptr;
-    if (stopped()) {
-        source.abandonRead();
-        return nullptr;
-    }
-    if (!source.finishRead() || stopped())
+    if (!source.read(header, sizeof(header)) || stopped())
         return nullptr;
 
-    // A read would wait for a payload that never comes, deaf to the stop request. No kind has an empty one.
+    // Reading at once could wait without end for a payload that the peer never sends, and no stop request ends a read.
+    // No kind of message has an empty payload.
     const std::uint32_t length = u32At(header + 4);
     if (length == 0 || !source.peek(available))
         return nullptr;
@@ -45,12 +40,11 @@ std::unique_ptr<PipeMessage> readFrame(ByteSource& source, const StopCheck& stop
         if (stopped() || !source.peek(available))
             return nullptr;
     }
-    // A text count may reach to the end of the buffer: room for bytes that are not there would become text.
+    // A text may extend to the end of the buffer, so a buffer beyond the bytes received would add zeros to it.
     buffer->ensure(std::min(length, available));
-    if (!buffer->data() || !source.startRead(buffer->data(), std::min(length, buffer->capacity())) ||
-        !source.finishRead())
+    if (!buffer->data() || !source.read(buffer->data(), std::min(length, buffer->capacity())))
         return nullptr;
-    // As announced: what was delivered is not counted, and the rest reads as whatever the buffer holds.
+    // The announced length, not the number of bytes received: a payload cut short is read with zeros for the rest.
     buffer->setLength(length);
     return createMessage(u32At(header), *buffer);
 }

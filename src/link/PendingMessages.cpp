@@ -7,8 +7,8 @@ namespace {
 
 bool isKept(const PipeMessage& message) noexcept
 {
-    return message.kind() == MessageKind::snapshot || message.type() == EventMessage::kRestoreStarted ||
-           message.type() == EventMessage::kRestoreEnded;
+    const EventType type = message.type();
+    return type == EventType::snapshot || type == EventType::restoreStarted || type == EventType::restoreEnded;
 }
 
 std::size_t textBytes(const PipeMessage& message) noexcept
@@ -81,7 +81,7 @@ std::unique_ptr<PipeMessage> PendingMessages::takeCounted()
 {
     const auto counted = counted_.begin();
     std::unique_ptr<PipeMessage> message;
-    if (counted->first == SnapshotMessage::kType)
+    if (counted->first == EventType::snapshot)
         message = std::make_unique<SnapshotMessage>(0, 0, 0, 0, 0);
     else
         message = std::make_unique<EventMessage>(counted->first);

@@ -44,7 +44,7 @@ class PendingMessages {
     std::deque<Pending> droppable_;
     // Starts, ends and snapshots beyond the bound, older than all others. They carry nothing but their type, and their
     // order among themselves makes no difference to the window.
-    std::map<std::uint32_t, std::uint64_t> counted_;
+    std::map<EventType, std::uint64_t> counted_;
     std::size_t textBytes_ = 0;
     std::uint64_t nextNumber_ = 0;
     const PipeMessage* notification_ = nullptr;

@@ -3,7 +3,7 @@
 namespace tavi {
 namespace {
 
-constexpr DWORD kPollMilliseconds = 10;
+constexpr DWORD kPollMs = 10;
 
 bool isUsable(HANDLE pipe) noexcept
 {
@@ -12,7 +12,7 @@ bool isUsable(HANDLE pipe) noexcept
 
 class PipeSource final : public ByteSource {
   public:
-    PipeSource(HANDLE pipe, OVERLAPPED* overlapped) noexcept : pipe_(pipe), overlapped_(overlapped) {}
+    explicit PipeSource(HANDLE pipe) noexcept : pipe_(pipe) {}
     bool peek(std::uint32_t& available) override
     {
         DWORD count = 0;
@@ -22,43 +22,28 @@ class PipeSource final : public ByteSource {
     }
     void pause() override
     {
-        Sleep(kPollMilliseconds);
+        Sleep(kPollMs);
     }
-    bool startRead(unsigned char* into, std::uint32_t size) override
+    bool read(unsigned char* into, std::uint32_t size) override
     {
         DWORD count = 0;
-        return ReadFile(pipe_, into, size, overlapped_ ? nullptr : &count, overlapped_) ||
-               (overlapped_ && GetLastError() == ERROR_IO_PENDING);
-    }
-    bool finishRead() override
-    {
-        DWORD count = 0;
-        return !overlapped_ || GetOverlappedResult(pipe_, overlapped_, &count, TRUE);
-    }
-    void abandonRead() override
-    {
-        // The system must have let go of the bytes before they go.
-        if (overlapped_) {
-            CancelIo(pipe_);
-            finishRead();
-        }
+        return ReadFile(pipe_, into, size, &count, nullptr);
     }
 
   private:
     const HANDLE pipe_;
-    OVERLAPPED* const overlapped_;
 };
 
 } // namespace
 
-bool readMessage(HANDLE pipe, std::unique_ptr<PipeMessage>* message, const StopCheck& stopCheck, OVERLAPPED* overlapped)
+bool readMessage(HANDLE pipe, std::unique_ptr<PipeMessage>* message, const StopCheck& stopCheck)
 {
     if (!message)
         return false;
     message->reset();
     if (!isUsable(pipe))
         return false;
-    PipeSource source(pipe, overlapped);
+    PipeSource source(pipe);
     *message = readFrame(source, stopCheck);
     return *message != nullptr;
 }

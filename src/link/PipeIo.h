@@ -9,13 +9,11 @@
 
 namespace tavi {
 
-// Waits for one message of the pipe; false, with no message, when the pipe failed, the frame was none, or the check
-// said stop. Without a check only the pipe ends the wait: no thread of the module belongs to a framework that could be
-// asked instead. With `overlapped`, whose event is the caller's, the handle must have been opened for overlapped use.
-bool readMessage(HANDLE pipe, std::unique_ptr<PipeMessage>* message, const StopCheck& stopCheck,
-                 OVERLAPPED* overlapped = nullptr);
+// Waits for one message from the pipe. Returns false, with no message, if the pipe failed, the frame was malformed or
+// the check returned true. With an empty check only the pipe ends the wait.
+bool readMessage(HANDLE pipe, std::unique_ptr<PipeMessage>* message, const StopCheck& stopCheck);
 
-// Writes the message in one piece. On success the message is destroyed; on failure it stays with the caller.
+// Writes the message with one call. Destroys it on success; on failure the caller keeps it.
 bool writeMessage(HANDLE pipe, std::unique_ptr<PipeMessage>& message);
 
 } // namespace tavi

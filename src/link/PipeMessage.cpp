@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <cstring>
 #include <initializer_list>
-#include <optional>
 #include <string>
 #include <string_view>
 
@@ -12,18 +11,10 @@
 namespace tavi {
 namespace {
 
-constexpr std::uint32_t kLastType = 57;
-
-// Codes within the range that no message goes by.
-constexpr struct {
-    std::uint32_t first;
-    std::uint32_t last;
-} kUnusedTypes[] = {{26, 31}, {37, 38}, {41, 50}};
-
 // Fills a buffer with one frame. Writes nothing when the buffer could not grow.
 class FrameWriter {
   public:
-    FrameWriter(MessageBuffer& buffer, std::uint32_t type, std::uint32_t fixedPayload,
+    FrameWriter(MessageBuffer& buffer, EventType type, std::uint32_t fixedPayload,
                 std::initializer_list<std::string_view> texts = {})
     {
         std::uint64_t size = std::uint64_t{kFrameHeaderSize} + fixedPayload;
@@ -34,7 +25,7 @@ class FrameWriter {
             buffer.ensure(static_cast<std::uint32_t>(size));
         at_ = fits ? buffer.data() : nullptr;
         buffer.setLength(at_ ? static_cast<std::uint32_t>(size) : 0);
-        u32(type);
+        u32(static_cast<std::uint32_t>(type));
         u32(static_cast<std::uint32_t>(size - kFrameHeaderSize));
     }
     void u32(std::uint32_t value) noexcept
@@ -90,22 +81,16 @@ class PayloadReader {
     std::uint32_t at_ = 0;
 };
 
-std::optional<MessageKind> kindOf(std::uint32_t type) noexcept
+MessageKind kindOf(EventType type) noexcept
 {
-    if (type > kLastType)
-        return std::nullopt;
-    for (const auto& unused : kUnusedTypes) {
-        if (type >= unused.first && type <= unused.last)
-            return std::nullopt;
-    }
     switch (type) {
-    case SnapshotMessage::kType:
+    case EventType::snapshot:
         return MessageKind::snapshot;
-    case ItemMessage::kType:
+    case EventType::item:
         return MessageKind::item;
-    case TextTripleMessage::kType:
+    case EventType::textTriple:
         return MessageKind::textTriple;
-    case CounterMessage::kType:
+    case EventType::counter:
         return MessageKind::counter;
     default:
         return MessageKind::event;
@@ -136,9 +121,9 @@ std::string bytesOf(const MessageText& text)
 
 } // namespace
 
-EventMessage::EventMessage(std::uint32_t type) : EventMessage(type, 0, 0, 0, std::make_shared<const wxString>()) {}
+EventMessage::EventMessage(EventType type) : EventMessage(type, 0, 0, 0, std::make_shared<const wxString>()) {}
 
-EventMessage::EventMessage(std::uint32_t type, std::uint32_t code_, std::uint64_t value_, std::uint32_t flag_,
+EventMessage::EventMessage(EventType type, std::uint32_t code_, std::uint64_t value_, std::uint32_t flag_,
                            MessageText text_)
     : PipeMessage(MessageKind::event, type), code(code_), value(value_), flag(flag_), text(std::move(text_))
 {
@@ -162,7 +147,7 @@ std::unique_ptr<PipeMessage> EventMessage::clone() const
 
 SnapshotMessage::SnapshotMessage(std::uint32_t state_, std::uint64_t counter0_, std::uint64_t counter1_,
                                  std::uint64_t counter2_, std::uint64_t counter3_)
-    : PipeMessage(MessageKind::snapshot, kType), state(state_), counter0(counter0_), counter1(counter1_),
+    : PipeMessage(MessageKind::snapshot, EventType::snapshot), state(state_), counter0(counter0_), counter1(counter1_),
       counter2(counter2_), counter3(counter3_)
 {
 }
@@ -181,7 +166,7 @@ std::unique_ptr<PipeMessage> SnapshotMessage::clone() const
 }
 
 ItemMessage::ItemMessage(std::uint64_t value_, bool flag_, MessageText text_)
-    : PipeMessage(MessageKind::item, kType), value(value_), flag(flag_), text(std::move(text_))
+    : PipeMessage(MessageKind::item, EventType::item), value(value_), flag(flag_), text(std::move(text_))
 {
 }
 
@@ -201,7 +186,7 @@ std::unique_ptr<PipeMessage> ItemMessage::clone() const
 }
 
 TextTripleMessage::TextTripleMessage(MessageText text1_, MessageText text2_, MessageText text3_)
-    : PipeMessage(MessageKind::textTriple, kType), text1(std::move(text1_)), text2(std::move(text2_)),
+    : PipeMessage(MessageKind::textTriple, EventType::textTriple), text1(std::move(text1_)), text2(std::move(text2_)),
       text3(std::move(text3_))
 {
 }
@@ -222,7 +207,7 @@ std::unique_ptr<PipeMessage> TextTripleMessage::clone() const
 }
 
 CounterMessage::CounterMessage(std::uint32_t code_, std::uint64_t value1_, std::uint64_t value2_, std::uint32_t flag_)
-    : PipeMessage(MessageKind::counter, kType), code(code_), value1(value1_), value2(value2_), flag(flag_)
+    : PipeMessage(MessageKind::counter, EventType::counter), code(code_), value1(value1_), value2(value2_), flag(flag_)
 {
 }
 
@@ -240,13 +225,16 @@ std::unique_ptr<PipeMessage> CounterMessage::clone() const
     return std::make_unique<CounterMessage>(code, value1, value2, flag);
 }
 
-std::unique_ptr<PipeMessage> createMessage(std::uint32_t type, const MessageBuffer& buffer)
+std::unique_ptr<PipeMessage> createMessage(std::uint32_t number, const MessageBuffer& buffer)
 {
-    const auto kind = kindOf(type);
-    if (!kind || !buffer.data() || buffer.length() < smallestPayload(*kind))
+    if (!isEventType(number) || !buffer.data())
+        return nullptr;
+    const auto type = static_cast<EventType>(number);
+    const MessageKind kind = kindOf(type);
+    if (buffer.length() < smallestPayload(kind))
         return nullptr;
     PayloadReader payload(buffer);
-    switch (*kind) {
+    switch (kind) {
     case MessageKind::event: {
         const std::uint32_t code = payload.u32();
         const std::uint64_t value = payload.u64();

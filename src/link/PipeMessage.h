@@ -5,6 +5,7 @@
 
 #include <wx/string.h>
 
+#include "link/EventType.h"
 #include "link/MessageBuffer.h"
 
 // The framed messages of both pipes. A frame is an 8-byte header (type, number of payload bytes) and the payload; every
@@ -33,29 +34,26 @@ class PipeMessage {
     {
         return kind_;
     }
-    std::uint32_t type() const noexcept
+    EventType type() const noexcept
     {
         return type_;
     }
 
   protected:
-    PipeMessage(MessageKind kind, std::uint32_t type) noexcept : kind_(kind), type_(type) {}
+    PipeMessage(MessageKind kind, EventType type) noexcept : kind_(kind), type_(type) {}
 
   private:
     const MessageKind kind_;
-    const std::uint32_t type_;
+    const EventType type_;
 };
 
 class EventMessage final : public PipeMessage {
   public:
     static constexpr std::uint32_t kSmallestPayload = 20;
-    // The types that a progress window acts on: a restore has begun, it has ended, its next item.
-    static constexpr std::uint32_t kRestoreStarted = 51;
-    static constexpr std::uint32_t kRestoreEnded = 52;
-    static constexpr std::uint32_t kItemText = 54;
 
-    explicit EventMessage(std::uint32_t type);
-    EventMessage(std::uint32_t type, std::uint32_t code, std::uint64_t value, std::uint32_t flag, MessageText text);
+    // With 0 in every number and an empty text.
+    explicit EventMessage(EventType type);
+    EventMessage(EventType type, std::uint32_t code, std::uint64_t value, std::uint32_t flag, MessageText text);
     void serialise(MessageBuffer& buffer) const override;
     std::unique_ptr<PipeMessage> clone() const override;
 
@@ -67,7 +65,6 @@ class EventMessage final : public PipeMessage {
 
 class SnapshotMessage final : public PipeMessage {
   public:
-    static constexpr std::uint32_t kType = 20;
     static constexpr std::uint32_t kSmallestPayload = 36;
 
     SnapshotMessage(std::uint32_t state, std::uint64_t counter0, std::uint64_t counter1, std::uint64_t counter2,
@@ -84,7 +81,6 @@ class SnapshotMessage final : public PipeMessage {
 
 class ItemMessage final : public PipeMessage {
   public:
-    static constexpr std::uint32_t kType = 21;
     static constexpr std::uint32_t kSmallestPayload = 16;
 
     ItemMessage(std::uint64_t value, bool flag, MessageText text);
@@ -98,7 +94,6 @@ class ItemMessage final : public PipeMessage {
 
 class TextTripleMessage final : public PipeMessage {
   public:
-    static constexpr std::uint32_t kType = 22;
     static constexpr std::uint32_t kSmallestPayload = 12;
 
     TextTripleMessage(MessageText text1, MessageText text2, MessageText text3);
@@ -112,7 +107,6 @@ class TextTripleMessage final : public PipeMessage {
 
 class CounterMessage final : public PipeMessage {
   public:
-    static constexpr std::uint32_t kType = 23;
     static constexpr std::uint32_t kSmallestPayload = 24;
 
     CounterMessage(std::uint32_t code, std::uint64_t value1, std::uint64_t value2, std::uint32_t flag);

@@ -15,7 +15,7 @@ constexpr std::int32_t kLongSpan = 60000;
 // From bytes per millisecond to bits per second.
 constexpr double kBitsPerSecond = 8000;
 
-// Amounts come from outside: sums wrap instead of being undefined.
+// The amounts are the service's and may be anything: sums wrap around, which is defined for unsigned numbers only.
 std::int64_t sum(std::int64_t value, std::uint64_t added) noexcept
 {
     return static_cast<std::int64_t>(static_cast<std::uint64_t>(value) + added);
@@ -33,13 +33,13 @@ void addUpTo(const std::atomic<std::int64_t>& total, std::atomic<std::int64_t>& 
     done = result > limit ? limit : result;
 }
 
-// Of the codes of events and of the states of snapshots alike.
-bool endsBackup(std::uint32_t code) noexcept
+// Applies to the types of events and to the states of snapshots alike.
+bool endsBackup(EventType type) noexcept
 {
-    return code <= 10 && code != 1 && code != 7;
+    return type <= EventType::backupEnded10 && type != EventType::backupReset && type != EventType::ignored7;
 }
 
-// Truncation that is defined for every number.
+// Truncates; out-of-range numbers become the nearest limit and NaN becomes 0.
 template <class Integer>
 Integer truncated(double value) noexcept
 {
@@ -66,8 +66,8 @@ wxString PublishedText::get() const
 }
 
 TransferStatus::TransferStatus(bool samplingOn, TickSource clock)
-    : ringA(samplingOn ? kSmallRing : 1, clock), ringB(samplingOn ? kLargeRing : 1, clock),
-      restoreRing(samplingOn ? kLargeRing : 1, clock), sampling(samplingOn)
+    : restoreRing(samplingOn ? kLargeRing : 1, clock), ringA(samplingOn ? kSmallRing : 1, clock),
+      ringB(samplingOn ? kLargeRing : 1, clock), sampling(samplingOn)
 {
 }
 
@@ -89,7 +89,7 @@ void TransferStatus::resetBackup()
         *rate = 0;
     for (auto* const amount : {&totalA, &totalB, &doneA, &doneB})
         *amount = 0;
-    // All but restoreStarted: a restore goes on while backups come and go.
+    // All flags but restoreStarted: backups start and end while a restore runs.
     for (auto* const flag : {&ended, &ended3, &switch34, &switch32, &switch39, &switch24, &mark10, &ended10, &ended4,
                              &ended6, &ended8, &ended5, &ended9})
         *flag = false;
@@ -106,22 +106,22 @@ void TransferStatus::resetRestore()
     restoreStarted = false;
 }
 
-std::atomic<bool>* TransferStatus::outcomeOf(std::uint32_t code) noexcept
+std::atomic<bool>* TransferStatus::outcomeOf(EventType type) noexcept
 {
-    switch (code) {
-    case 3:
+    switch (type) {
+    case EventType::backupEnded3:
         return &ended3;
-    case 4:
+    case EventType::backupEnded4:
         return &ended4;
-    case 5:
+    case EventType::backupEnded5:
         return &ended5;
-    case 6:
+    case EventType::backupEnded6:
         return &ended6;
-    case 8:
+    case EventType::backupEnded8:
         return &ended8;
-    case 9:
+    case EventType::backupEnded9:
         return &ended9;
-    case 10:
+    case EventType::backupEnded10:
         return &ended10;
     default:
         return nullptr;
@@ -137,89 +137,89 @@ void TransferStatus::endWith(std::atomic<bool>* outcome) noexcept
 
 void TransferStatus::applyEvent(const EventMessage& event)
 {
-    if (endsBackup(event.type())) {
+    const EventType type = event.type();
+    if (endsBackup(type)) {
         resetBackup();
-        // No outcome for 2, although a snapshot's state 2 has one.
-        endWith(outcomeOf(event.type()));
+        endWith(outcomeOf(type));
     }
-    switch (event.type()) {
-    case 1:
+    switch (type) {
+    case EventType::backupReset:
         resetBackup();
         break;
-    case 10:
+    case EventType::backupEnded10:
         mark10 = true;
         totalB = static_cast<std::int64_t>(event.value);
         totalA = static_cast<std::int64_t>(event.value);
         break;
-    case 11:
+    case EventType::textA:
         statusTextA.set(*event.text);
         break;
-    case 12:
+    case EventType::textAEnded:
         statusTextA.clear();
         break;
-    case 13:
+    case EventType::textB:
         statusTextB.set(*event.text);
         break;
-    case 14:
+    case EventType::textBEnded:
         statusTextB.clear();
         break;
-    case 16:
+    case EventType::doneA:
         addUpTo(totalA, doneA, event.value);
         if (sampling)
             ringA.addSample(event.value);
         break;
-    case 17:
+    case EventType::doneB:
         addUpTo(totalB, doneB, event.value);
         if (sampling && event.flag != 0)
             ringB.addSample(event.value);
         break;
-    case 18:
+    case EventType::moreA:
         add(totalA, event.value);
         break;
-    case 19:
+    case EventType::moreB:
         add(totalB, event.value);
         break;
-    case 24:
-    case 25:
-        switch24 = event.type() == 24;
+    case EventType::switch24On:
+    case EventType::switch24Off:
+        switch24 = type == EventType::switch24On;
         break;
-    case 32:
-    case 33:
-        switch32 = event.type() == 32;
+    case EventType::switch32On:
+    case EventType::switch32Off:
+        switch32 = type == EventType::switch32On;
         break;
-    case 34:
-    case 35:
-        switch34 = event.type() == 34;
+    case EventType::switch34On:
+    case EventType::switch34Off:
+        switch34 = type == EventType::switch34On;
         break;
-    case 36:
+    case EventType::mark10Off:
         mark10 = false;
         break;
-    case 39:
-    case 40:
-        switch39 = event.type() == 39;
+    case EventType::switch39On:
+    case EventType::switch39Off:
+        switch39 = type == EventType::switch39On;
         break;
-    case 51:
+    case EventType::restoreStarted:
         resetRestore();
         restoreStarted = true;
         break;
-    case 52:
+    case EventType::restoreEnded:
         resetRestore();
         break;
-    case 53:
+    case EventType::restoreTotal:
         restoreTotal = static_cast<std::int64_t>(event.value);
         break;
-    case 54:
+    case EventType::restoreItem:
         restoreText.set(*event.text);
         break;
-    case 55:
+    case EventType::restoreItemEnded:
         restoreText.clear();
         break;
-    case 56:
+    case EventType::restoreDone:
         addUpTo(restoreTotal, restoreDone, event.value);
         if (sampling)
             restoreRing.addSample(event.value);
         break;
-    case 57:
+    case EventType::restoreMore:
         add(restoreTotal, event.value);
         break;
     default:
@@ -240,20 +240,21 @@ void TransferStatus::applySnapshot(const SnapshotMessage& snapshot)
     totalA = static_cast<std::int64_t>(snapshot.counter0);
     doneB = static_cast<std::int64_t>(snapshot.counter3);
 
-    if (endsBackup(snapshot.state))
-        endWith(snapshot.state == 2 ? &ended3 : outcomeOf(snapshot.state));
-    switch (snapshot.state) {
-    case 1:
+    const auto state = static_cast<EventType>(snapshot.state);
+    if (endsBackup(state))
+        endWith(state == EventType::backupEnded2 ? &ended3 : outcomeOf(state));
+    switch (state) {
+    case EventType::backupReset:
         // Also zeroes the amounts that were just set.
         resetBackup();
         break;
-    case 10:
+    case EventType::backupEnded10:
         mark10 = true;
         break;
-    case 51:
+    case EventType::restoreStarted:
         restoreStarted = true;
         break;
-    case 52:
+    case EventType::restoreEnded:
         resetRestore();
         break;
     default:
@@ -263,7 +264,7 @@ void TransferStatus::applySnapshot(const SnapshotMessage& snapshot)
 
 void TransferStatus::renewRate(std::atomic<float>& rate, std::int32_t span) noexcept
 {
-    // A finished restore, or one with no known total, has no speed.
+    // A finished restore, or one whose total is not known, has no speed.
     rate = restoreDone < restoreTotal ? static_cast<float>(restoreRing.rateOver(span) * kBitsPerSecond) : 0.0F;
 }
 
@@ -280,6 +281,7 @@ void TransferStatus::timerTick() noexcept
 
 std::optional<std::uint32_t> TransferStatus::remainingSeconds() const noexcept
 {
+    // This number of seconds means "unknown".
     constexpr std::uint32_t unknown = UINT32_MAX;
     const double rate = restoreRateLong;
     if (!(rate * 0.001 >= 1.0))

@@ -287,17 +287,17 @@ void RestoreProgressWindow::handlePipeMessage(const PipeMessage& message)
     }
 }
 
-void RestoreProgressWindow::handleEvent(std::uint32_t type)
+void RestoreProgressWindow::handleEvent(EventType type)
 {
     switch (type) {
-    case EventMessage::kRestoreEnded:
+    case EventType::restoreEnded:
         release();
         [[fallthrough]];
-    case EventMessage::kRestoreStarted:
+    case EventType::restoreStarted:
         beginAnew();
         awaitingFirstItem_ = true;
         break;
-    case EventMessage::kItemText:
+    case EventType::restoreItem:
         // The speed counts from the first item and not from the search for it.
         if (std::exchange(awaitingFirstItem_, false))
             transferStatus().restoreRing.clearRing();

@@ -77,7 +77,7 @@ class RestoreProgressWindow {
     std::unique_ptr<PipeMessage> takePending();
     void handlePending();
     void handlePipeMessage(const PipeMessage& message);
-    void handleEvent(std::uint32_t type);
+    void handleEvent(EventType type);
     void beginAnew();
     void refresh();
     void showText(int control, wxString& shown, const wxString& text);

@@ -8,7 +8,7 @@
 // Messages and frames in short form.
 namespace tavi::test {
 
-// Bytes as a readable table: two hexadecimal digits a byte, blanks anywhere.
+// Converts two hexadecimal digits per byte, with blanks anywhere.
 inline std::string bytes(std::string digits)
 {
     digits.erase(std::remove(digits.begin(), digits.end(), ' '), digits.end());
@@ -23,7 +23,7 @@ inline MessageText text(const wxString& content)
     return std::make_shared<const wxString>(content);
 }
 
-inline std::unique_ptr<EventMessage> event(std::uint32_t type, std::uint64_t value = 0,
+inline std::unique_ptr<EventMessage> event(EventType type, std::uint64_t value = 0,
                                            const wxString& content = wxString(), std::uint32_t flag = 0)
 {
     return std::make_unique<EventMessage>(type, 0, value, flag, text(content));

@@ -36,7 +36,8 @@ TEST(StatusListener, FollowsTheServiceThroughWhateverItSends)
     {
         const Listener listener;
         ASSERT_TRUE(first.waitClient());
-        first.write(serialised(*event(53, 7)) + serialised(*event(57, 1)) + serialised(CounterMessage(1, 1, 1, 1)));
+        first.write(serialised(*event(EventType::restoreTotal, 7)) + serialised(*event(EventType::restoreMore, 1)) +
+                    serialised(CounterMessage(1, 1, 1, 1)));
         EXPECT_TRUE(waitUntil([&] { return status.restoreTotal == 8; }));
         // A bad frame makes it hang up and come again at once; what it knows stays.
         first.write(bytes("34000000 00000000"));
@@ -44,7 +45,7 @@ TEST(StatusListener, FollowsTheServiceThroughWhateverItSends)
         ASSERT_TRUE(second.waitClient());
         EXPECT_LT(GetTickCount() - start, 4000u) << "only a failed open waits";
         EXPECT_EQ(status.restoreTotal, 8);
-        second.write(serialised(*event(55)) + serialised(*event(57, 2)));
+        second.write(serialised(*event(EventType::restoreItemEnded)) + serialised(*event(EventType::restoreMore, 2)));
         EXPECT_TRUE(waitUntil([&] { return status.restoreTotal == 10; }));
         // A peer that stops in mid-frame holds the listener, but not its end.
         second.write(bytes("34000000 14000000"));
@@ -52,7 +53,7 @@ TEST(StatusListener, FollowsTheServiceThroughWhateverItSends)
     }
     EXPECT_EQ(passedOn, 5);
     setMessageSink(nullptr);
-    dispatch(event(52));
+    dispatch(event(EventType::restoreEnded));
     EXPECT_EQ(status.restoreTotal, 0);
 }
 
@@ -69,10 +70,10 @@ TEST(StatusListener, WaitsForAServiceThatIsNotThereAndAfterAnException)
         EXPECT_TRUE(first.waitClient());
         EXPECT_GT(GetTickCount() - start, 4500u);
         start = GetTickCount();
-        first.write(serialised(*event(52)));
+        first.write(serialised(*event(EventType::restoreEnded)));
         EXPECT_TRUE(second.waitClient());
         EXPECT_GT(GetTickCount() - start, 4500u);
-        second.write(serialised(*event(53, 9)));
+        second.write(serialised(*event(EventType::restoreTotal, 9)));
         EXPECT_TRUE(waitUntil([] { return transferStatus().restoreTotal == 9; }));
         start = GetTickCount();
     }
@@ -93,7 +94,7 @@ TEST(CommandPipe, SendsOneFrameAndHangsUp)
         EXPECT_TRUE(CommandPipe::sendCommand(command));
         EXPECT_FALSE(command);
         command = CommandPipe::cancelRestore();
-        EXPECT_EQ(server.readAll(), serialised(*event(52)));
+        EXPECT_EQ(server.readAll(), serialised(*event(EventType::restoreEnded)));
     }
     // A write that fails: nobody reads, and then nobody is there.
     const PipeServer deaf(kCommand, PIPE_ACCESS_INBOUND, 1, 0);

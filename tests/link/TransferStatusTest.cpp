@@ -13,13 +13,15 @@
 namespace tavi {
 namespace {
 
+using E = EventType;
+
 std::atomic<std::uint32_t> now{0};
 std::uint32_t tick()
 {
     return now;
 }
 
-void apply(TransferStatus& status, std::uint32_t type, std::uint64_t value = 0, std::uint32_t flag = 0,
+void apply(TransferStatus& status, EventType type, std::uint64_t value = 0, std::uint32_t flag = 0,
            const wxString& text = "new")
 {
     status.apply(*test::event(type, value, text, flag));
@@ -119,7 +121,7 @@ TEST(TransferStatus, EveryEventAndSnapshotHasItsEffect)
             // Its flag tells whether there is a sample.
             if (code == 17 && flags)
                 expected["ringB"] = 100;
-            apply(status, code, 900, flags ? 1 : 0);
+            apply(status, E{code}, 900, flags ? 1 : 0);
         }
         EXPECT_EQ(pictureOf(status), expected) << (snapshot ? "snapshot " : "event ") << code;
     }
@@ -128,13 +130,13 @@ TEST(TransferStatus, EveryEventAndSnapshotHasItsEffect)
 TEST(TransferStatus, AmountsThatMakeNoSenseStayDefined)
 {
     TransferStatus status(false, tick);
-    apply(status, 57, UINT64_MAX);
-    apply(status, 57, 1);
+    apply(status, E::restoreMore, UINT64_MAX);
+    apply(status, E::restoreMore, 1);
     EXPECT_EQ(status.restoreTotal, 0);
-    apply(status, 53, 1ull << 63);
-    apply(status, 56, 5);
+    apply(status, E::restoreTotal, 1ull << 63);
+    apply(status, E::restoreDone, 5);
     EXPECT_EQ(status.restoreDone, INT64_MIN) << "the sum is larger than the total";
-    apply(status, 53, 1);
+    apply(status, E::restoreTotal, 1);
     EXPECT_EQ(status.barPosition(), INT32_MIN);
 }
 
@@ -154,8 +156,8 @@ TEST(TransferStatus, RatesAndEstimatesFollowTheClock)
         // Finished.
         {1 << 20, 0, 40, 0, 250, {}}};
     for (const auto& [total, added, ticks, speed, position, seconds] : steps) {
-        apply(status, 53, total);
-        apply(status, 56, added);
+        apply(status, E::restoreTotal, total);
+        apply(status, E::restoreDone, added);
         for (int i = 0; i < ticks; ++i) {
             now += 250;
             status.timerTick();
@@ -180,7 +182,7 @@ TEST(TransferStatus, EstimatesNeedARateOfAKilobit)
         {0x100000001ull * 1000, 8000.0F, 1u},
         {0xffffffffull * 1000, 8000.0F, {}}};
     for (const auto& [total, rate, seconds] : cases) {
-        apply(status, 53, total);
+        apply(status, E::restoreTotal, total);
         status.restoreRateLong = rate;
         EXPECT_EQ(status.remainingSeconds(), seconds) << rate;
     }
@@ -218,7 +220,7 @@ TEST(TransferStatus, IsReadWhileItChanges)
     std::thread listener([&] {
         for (std::uint32_t round = 0; round < 100000; ++round) {
             const wxString text(static_cast<wchar_t>(L'a' + round % 26), round % 40 + 1);
-            apply(status, round % 500 == 0 ? 51 + round / 500 % 7 : 54 + (round % 64 == 63), 1000, 1, text);
+            apply(status, E{round % 500 == 0 ? 51 + round / 500 % 7 : 54 + (round % 64 == 63)}, 1000, 1, text);
         }
         status.apply(SnapshotMessage(51, 1, 2, 3, 4));
         done = true;

@@ -32,9 +32,9 @@ LRESULT CALLBACK watch(HWND window, UINT message, WPARAM wParam, LPARAM lParam)
 struct RestoreProgressWindowTest : UiTest {
     RestoreProgressWindowTest()
     {
-        tell(52);
+        tell(EventType::restoreEnded);
     }
-    static void tell(std::uint32_t type, std::uint64_t value = 0, const wxString& item = wxString())
+    static void tell(EventType type, std::uint64_t value = 0, const wxString& item = wxString())
     {
         dispatch(event(type, value, item));
     }
@@ -66,17 +66,17 @@ TEST_F(RestoreProgressWindowTest, FollowsARestoreToItsEnd)
     shows(dialog, TAVI_PROGRESS_STATUS, L"Waiting to begin restore...");
     shows(dialog, TAVI_PROGRESS_REMAINING, L"Unknown");
     shows(dialog, TAVI_PROGRESS_SPEED, L"0.0 b/s");
-    tell(51);
+    tell(EventType::restoreStarted);
     shows(dialog, TAVI_PROGRESS_STATUS, L"Finding file on server...");
-    tell(56, 1 << 30); // found before the first item: not part of its speed
-    tell(53, 1000);
-    tell(54, 0, "C:\\d\\A & B.txt");
+    tell(EventType::restoreDone, 1 << 30); // found before the first item: not part of its speed
+    tell(EventType::restoreTotal, 1000);
+    tell(EventType::restoreItem, 0, "C:\\d\\A & B.txt");
     shows(dialog, TAVI_PROGRESS_STATUS, L"C:\\d\\A & B.txt");
     EXPECT_EQ(transferStatus().restoreRing.rateOver(60000), 0);
-    tell(56, 500);
+    tell(EventType::restoreDone, 500);
     const auto position = [&] { return SendDlgItemMessageW(dialog, TAVI_PROGRESS_BAR, PBM_GETPOS, 0, 0); };
     EXPECT_TRUE(waitUntil([&] { return position() == 125; }));
-    tell(54, 0, "C:\\d\\B.txt");
+    tell(EventType::restoreItem, 0, "C:\\d\\B.txt");
     shows(dialog, TAVI_PROGRESS_STATUS, L"C:\\d\\B.txt");
     EXPECT_TRUE(waitUntil([&] { return transferStatus().restoreSpeed() > 0; })) << "only the first item clears it";
     transferStatus().restoreRateLong = 1000;
@@ -87,17 +87,17 @@ TEST_F(RestoreProgressWindowTest, FollowsARestoreToItsEnd)
 
     // A second restore joins; its start leaves the bar where it is until an amount moves it.
     RestoreProgressWindow::getOrCreate();
-    tell(54, 0, "last");
+    tell(EventType::restoreItem, 0, "last");
     shows(dialog, TAVI_PROGRESS_STATUS, L"last");
-    tell(52);
-    tell(51);
+    tell(EventType::restoreEnded);
+    tell(EventType::restoreStarted);
     shows(dialog, TAVI_PROGRESS_STATUS, L"Finding file on server...");
     EXPECT_EQ(position(), 125);
     // Others know the message number too.
     SendMessageW(dialog, WM_USER + 1, 0, 0x1234);
     SendMessageW(dialog, DM_SETDEFID, TAVI_PROGRESS_CANCEL, 0);
     EXPECT_EQ(LOWORD(SendMessageW(dialog, DM_GETDEFID, 0, 0)), TAVI_PROGRESS_CANCEL);
-    tell(52);
+    tell(EventType::restoreEnded);
     EXPECT_TRUE(gone(dialog));
 }
 
@@ -110,7 +110,7 @@ TEST_F(RestoreProgressWindowTest, StaysRegisteredThoughItsDialogCannotBeMade)
     EXPECT_TRUE(waitUntil([&] { return countThreads() == before; }));
     EXPECT_EQ(log.take().size(), 1u);
     const auto item = text(L"item");
-    dispatch(std::make_unique<EventMessage>(54, 0, 0, 0, item));
+    dispatch(std::make_unique<EventMessage>(EventType::restoreItem, 0, 0, 0, item));
     EXPECT_EQ(item.use_count(), 1);
     EXPECT_EQ(moduleRefCount(), 2);
     RestoreProgressWindow::current()->handleMessage(nullptr, WM_DESTROY, 0, 0);
@@ -126,7 +126,8 @@ TEST_F(RestoreProgressWindowTest, HoldsFewMessagesWhileNobodyReadsItsCancel)
     ASSERT_TRUE(server.waitClient());
     const auto item = text(L"item");
     for (int round = 0; round < 50000; ++round)
-        dispatch(std::make_unique<EventMessage>(round % 100 == 0 ? 51 : 54, 0, 0, 0, item));
+        dispatch(std::make_unique<EventMessage>(round % 100 == 0 ? EventType::restoreStarted : EventType::restoreItem,
+                                                0, 0, 0, item));
     EXPECT_GT(item.use_count(), 1) << "it is stuck in its write";
     EXPECT_LE(item.use_count(), 1001);
     server.hangUp();
@@ -144,16 +145,16 @@ TEST_F(RestoreProgressWindowTest, CatchesUpInOneGoAfterItWasBusy)
     procedure = reinterpret_cast<WNDPROC>(SetWindowLongPtrW(dialog, GWLP_WNDPROC, reinterpret_cast<LONG_PTR>(&watch)));
     SendNotifyMessageW(dialog, kWait, 0, 0);
     ASSERT_TRUE(waitUntil([] { return waits.load(); }));
-    tell(52);
+    tell(EventType::restoreEnded);
     for (int round = 0; round < 5000; ++round)
-        tell(56, 1);
-    tell(51);
+        tell(EventType::restoreDone, 1);
+    tell(EventType::restoreStarted);
     waits = false;
     shows(dialog, TAVI_PROGRESS_STATUS, L"Sucht die Datei...");
     EXPECT_EQ(notified, 1);
     {
         const auto last = RestoreProgressWindow::current();
-        tell(52);
+        tell(EventType::restoreEnded);
         SendMessageW(dialog, WM_NULL, 0, 0); // it has handled the end
         EXPECT_EQ(last->dialog(), dialog);
     }
@@ -178,14 +179,14 @@ TEST_F(RestoreProgressWindowTest, ButtonsCloseItAtOnceAndOnlyCancelCancels)
             server.emplace(kCommand, DWORD{PIPE_ACCESS_INBOUND});
         RestoreProgressWindow::getOrCreate();
         const HWND dialog = opened();
-        tell(51);
+        tell(EventType::restoreStarted);
         PostMessageW(dialog, message, command, 0);
         EXPECT_TRUE(gone(dialog));
         EXPECT_EQ(log.take().size(), serviceRuns ? 0u : 2u);
         EXPECT_TRUE(transferStatus().restoreStarted);
-        tell(54, 0, "later"); // nobody is there to take it
+        tell(EventType::restoreItem, 0, "later"); // nobody is there to take it
         if (server && command == TAVI_PROGRESS_CANCEL) {
-            EXPECT_EQ(server->readAll(), serialised(*event(52)));
+            EXPECT_EQ(server->readAll(), serialised(*event(EventType::restoreEnded)));
         } else if (server) {
             EXPECT_TRUE(WaitNamedPipeW(kCommand, 1)) << "nobody has come";
         }
@@ -204,7 +205,7 @@ TEST_F(RestoreProgressWindowTest, SurvivesEveryOrderOfEnds)
     std::atomic<bool> done{false};
     std::thread ends([&] {
         for (int round = 0; round < 3000; ++round)
-            tell(round % 3 == 0 ? 52 : 51);
+            tell(round % 3 == 0 ? EventType::restoreEnded : EventType::restoreStarted);
         done = true;
     });
     for (int round = 0; !done; ++round) {
