@@ -17,21 +17,20 @@ const char* const kInsertRestore =
     "INSERT INTO restores(request_time, machine_id, machine_alias, encryption_key) VALUES (?,?,?,?)";
 const char* const kInsertFile = "INSERT INTO restore_files(restore_id, manifest_path, file_size, timestamp, ctime, "
                                 "attributes, target_path, overwrite) VALUES(?,?,?,?,?,?,?,?)";
-constexpr int kPlainTransaction = 0;
 
-// Tells whether something stands at a path. Files come folder by folder, and a missing file in a large folder may take
-// the system a millisecond to miss: each parent folder is looked up once, and nothing stands below a missing one.
+// Returns whether a path exists. In a large folder the system needs up to a millisecond for a file that is missing, so
+// the parent, which files in a row share, is looked up first: nothing exists below a missing folder.
 class TargetProbe {
   public:
     bool operator()(const std::string& path)
     {
-        // With its separator, without which the root of a drive is no folder.
+        // With its separator: "C:" is not the root of the drive.
         const std::string_view parent = std::string_view(path).substr(0, path.rfind('\\') + 1);
         if (parent.empty())
             return lookUp(path) == ERROR_SUCCESS;
         if (parent != parent_) {
             parent_ = parent;
-            // A folder that may not be looked at may still hold files that can be.
+            // The files of a folder without access may be accessible.
             const DWORD answer = lookUp(parent_);
             parentMayHold_ = answer == ERROR_SUCCESS || answer == ERROR_ACCESS_DENIED;
         }
@@ -56,7 +55,7 @@ void RestoreRequestWriter::open()
     try {
         connection_ = std::make_unique<DbConnection>();
         connection_->open(getDataFilePath(kStateDatabase));
-        connection_->beginTransaction(kPlainTransaction);
+        transaction_.emplace(*connection_);
     } catch (const DbException& error) {
         wxLogError("Failed to open state db for restores: %s", error.message());
         connection_.reset();
@@ -89,28 +88,30 @@ bool RestoreRequestWriter::requestRestore(const RestorePlan& files, const wxStri
             insertFile.bind(8, std::int32_t{entry.overwrite});
             insertFile.execDML();
         }
-        connection_->commitTransaction();
+        transaction_->commit();
         insertRestore.finalize();
         insertFile.finalize();
-        connection_->beginTransaction(kPlainTransaction);
+        transaction_.emplace(*connection_);
         return true;
     } catch (const DbException& error) {
         wxLogError("Error requesting restore: %s", error.message());
-        recover();
+        beginAgain();
         return false;
     }
 }
 
-void RestoreRequestWriter::recover() noexcept
+void RestoreRequestWriter::beginAgain() noexcept
 {
     try {
-        connection_->rollbackTransaction();
-        connection_->beginTransaction(kPlainTransaction);
+        if (transaction_ && transaction_->rollback()) {
+            transaction_.emplace(*connection_);
+            return;
+        }
     } catch (...) {
-        // The rows may still be in an open transaction, which the commit in close() would store. Closing the connection
-        // rolls it back. SQLite may also have rolled back by itself; then close() has nothing to commit.
-        connection_.reset();
+        // As if the rollback had failed.
     }
+    // The rows may still be in an open transaction, which close() would commit. Closing the connection rolls it back.
+    disconnect();
 }
 
 void RestoreRequestWriter::close()
@@ -118,10 +119,16 @@ void RestoreRequestWriter::close()
     if (!connection_)
         return;
     try {
-        connection_->commitTransaction();
+        transaction_->commit();
     } catch (const DbException& error) {
         wxLogError("Error committing restore information: %s", error.message());
     }
+    disconnect();
+}
+
+void RestoreRequestWriter::disconnect() noexcept
+{
+    transaction_.reset();
     connection_.reset();
 }
 

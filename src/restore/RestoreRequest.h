@@ -1,31 +1,33 @@
 #pragma once
 
 #include <memory>
+#include <optional>
 
 #include "statedb/Database.h"
 #include "restore/RestorePlanner.h"
 
 namespace tavi {
 
-// Stores one request in the service's state database: all of it or nothing. Used by one thread; every failure is
-// logged.
+// Stores a request in the service's state database, whole or not at all. Belongs to one thread; failures are logged.
 class RestoreRequestWriter {
   public:
     // Opens the database and begins a transaction. On failure requestRestore writes nothing.
     void open();
-    // True when the rows have been written and the next transaction begun. A failure that cannot be rolled back closes
-    // the connection.
+    // Returns true if the rows were committed and the next transaction has begun. A failure that cannot be rolled back
+    // closes the connection.
     bool requestRestore(const RestorePlan& files, const wxString& machineId, const wxString& machineAlias,
                         const wxString& encryptionKey);
     void close();
 
   private:
-    void recover() noexcept;
+    void beginAgain() noexcept;
+    void disconnect() noexcept;
 
     std::unique_ptr<DbConnection> connection_;
+    std::optional<Transaction> transaction_;
 };
 
-// Plans the request, writes it into the state database and empties its path set. What fails in the database is logged.
+// Plans the request, stores it in the state database and empties its path set. Failures of the database are logged.
 void performRestore(RestoreRequest& request, const Manifest& manifest);
 
 } // namespace tavi

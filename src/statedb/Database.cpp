@@ -1,6 +1,5 @@
 #include "statedb/Database.h"
 
-#include <iterator>
 #include <utility>
 
 #include <sqlite3.h>
@@ -46,47 +45,13 @@ const CodeName kCodeNames[] = {
     {kOwnDbError, L"WDB_ERROR"},
 };
 
-// The wrapper's own messages; those from kOutOfMemory on belong to operations that nothing needs yet.
-enum OwnMessage {
-    kNoDatabase,
-    kNoStatement,
-    kBadIndex,
-    kBadString,
-    kBadInt,
-    kBadInt64,
-    kOutOfMemory,
-    kBadBinary,
-    kBadFieldName,
-    kBadRowIndex,
-    kBadScalar,
-    kNoResults,
-    kBadDouble,
-    kBadBlob,
-    kBadDate,
-    kBadNull,
-    kBadClearing,
-    kOwnMessageCount
-};
-constexpr const wchar_t* kOwnMessages[] = {
-    L"No Database opened",
-    L"Statement not accessible",
-    L"Invalid field index",
-    L"Error binding string param",
-    L"Error binding int param",
-    L"Error binding int64 param",
-    L"Out of memory",
-    L"Cannot decode binary",
-    L"Invalid field name",
-    L"Invalid row index",
-    L"Invalid scalar query",
-    L"Null Results pointer",
-    L"Error binding double param",
-    L"Error binding blob param",
-    L"Error binding date/time param",
-    L"Error binding NULL param",
-    L"Error clearing bindings",
-};
-static_assert(std::size(kOwnMessages) == kOwnMessageCount);
+// The wrapper's own messages.
+constexpr const wchar_t* kNoDatabase = L"No Database opened";
+constexpr const wchar_t* kNoStatement = L"Statement not accessible";
+constexpr const wchar_t* kBadIndex = L"Invalid field index";
+constexpr const wchar_t* kBadString = L"Error binding string param";
+constexpr const wchar_t* kBadInt = L"Error binding int param";
+constexpr const wchar_t* kBadInt64 = L"Error binding int64 param";
 
 const wchar_t* nameOf(int code)
 {
@@ -109,15 +74,15 @@ void throwIf(int result, sqlite3* connection)
         throw DbException(result, errorText(connection));
 }
 
-void throwIf(int result, OwnMessage message)
+void throwIf(int result, const wchar_t* message)
 {
     if (result != SQLITE_OK)
-        throw DbException(result, kOwnMessages[message]);
+        throw DbException(result, message);
 }
 
-[[noreturn]] void throwOwn(OwnMessage message)
+[[noreturn]] void throwOwn(const wchar_t* message)
 {
-    throw DbException(kOwnDbError, kOwnMessages[message]);
+    throw DbException(kOwnDbError, message);
 }
 
 int finalizeSlot(const StatementSlot& slot) noexcept
@@ -188,7 +153,7 @@ sqlite3_stmt* DbQuery::statementWith(int index) const
 bool DbQuery::nextRow()
 {
     sqlite3_stmt* const held = statement();
-    // Another step behind the last row would begin a new run.
+    // A step after the last row would start a new run.
     if (std::exchange(firstRowPending_, false) || atEnd_)
         return !atEnd_;
     int result = sqlite3_step(held);
@@ -205,7 +170,7 @@ int DbQuery::fieldText(int index, const char*& text)
 {
     sqlite3_stmt* const held = statementWith(index);
     text = reinterpret_cast<const char*>(sqlite3_column_text(held, index));
-    // Null stands for NULL too; SQLite reports a failed conversion by the connection's error code only.
+    // A NULL column is null too; SQLite reports a failed conversion only by the connection's error code.
     if (!text && sqlite3_errcode(connection_) == SQLITE_NOMEM)
         throw DbException(SQLITE_NOMEM, errorText(connection_));
     return sqlite3_column_bytes(held, index);
@@ -311,7 +276,7 @@ void DbStatement::finalize()
 }
 
 DbConnection::DbConnection(DbConnection&& other) noexcept
-    : connection_(std::exchange(other.connection_, nullptr)), busyTimeout_(other.busyTimeout_)
+    : connection_(std::exchange(other.connection_, nullptr)), busyTimeoutMs_(other.busyTimeoutMs_)
 {
 }
 
@@ -320,7 +285,7 @@ DbConnection& DbConnection::operator=(DbConnection&& other) noexcept
     if (this != &other) {
         close();
         connection_ = std::exchange(other.connection_, nullptr);
-        busyTimeout_ = other.busyTimeout_;
+        busyTimeoutMs_ = other.busyTimeoutMs_;
     }
     return *this;
 }
@@ -335,12 +300,13 @@ void DbConnection::open(const wxString& path)
     close();
     const int result = sqlite3_open(toUtf8(view(path)).c_str(), &connection_);
     throwIf(result, connection_);
-    sqlite3_busy_timeout(connection_, busyTimeout_);
+    sqlite3_busy_timeout(connection_, busyTimeoutMs_);
 }
 
 void DbConnection::close() noexcept
 {
-    // The second form: a statement may outlive the connection, and the first would then keep the file open for good.
+    // Unlike sqlite3_close, sqlite3_close_v2 also closes a connection whose statements outlive it, with the last of
+    // them.
     sqlite3_close_v2(std::exchange(connection_, nullptr));
 }
 
@@ -371,7 +337,7 @@ StatementSlot DbConnection::prepare(const char* sql) const
 {
     check();
     auto slot = std::make_shared<sqlite3_stmt*>(nullptr);
-    // The detail stays empty: readers of the log know the failure by that.
+    // The detail stays empty, because scripts that read the log recognise this failure by the empty detail.
     if (const int result = sqlite3_prepare(connection_, sql, -1, slot.get(), nullptr); result != SQLITE_OK)
         throw DbException(result, wxString());
     return slot;
@@ -401,31 +367,49 @@ std::int64_t DbConnection::lastRowId() const
     return sqlite3_last_insert_rowid(connection_);
 }
 
-void DbConnection::beginTransaction(int mode)
+void DbConnection::beginTransaction(TransactionMode mode)
 {
-    switch (mode) {
-    case 1:
-        execDML(wxString(L"begin deferred transaction"));
-        break;
-    case 2:
-    case 3: // no exclusive flavour: it would lock the service out of reading
-        execDML(wxString(L"begin immediate transaction"));
-        break;
-    default:
-        execDML(wxString(L"begin transaction"));
-        break;
-    }
+    execDML(mode == TransactionMode::deferred    ? "begin deferred transaction"
+            : mode == TransactionMode::immediate ? "begin immediate transaction"
+                                                 : "begin transaction");
 }
 
+// Narrow texts, which need no conversion: a transaction ends even when no memory is left.
 void DbConnection::commitTransaction()
 {
-    // As narrow text it allocates nothing: the lock goes even where no memory is left.
     execDML("commit transaction");
 }
 
 void DbConnection::rollbackTransaction()
 {
-    execDML(wxString(L"rollback transaction"));
+    execDML("rollback transaction");
+}
+
+Transaction::Transaction(DbConnection& connection, TransactionMode mode) : connection_(connection)
+{
+    connection_.beginTransaction(mode);
+}
+
+Transaction::~Transaction()
+{
+    rollback();
+}
+
+void Transaction::commit()
+{
+    connection_.commitTransaction();
+    isOpen_ = false;
+}
+
+bool Transaction::rollback() noexcept
+{
+    try {
+        if (std::exchange(isOpen_, false))
+            connection_.rollbackTransaction();
+        return true;
+    } catch (...) {
+        return false;
+    }
 }
 
 } // namespace tavi

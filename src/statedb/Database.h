@@ -10,13 +10,13 @@
 struct sqlite3;
 struct sqlite3_stmt;
 
-// The only way to the service's two databases. None of these objects locks: each is used on the thread that made it.
-// Every failure is a DbException; destructors never throw.
+// The module's access to the service's two databases. None of these objects locks: each belongs to the thread that
+// created it. Every failure is a DbException; destructors never throw.
 namespace tavi {
 
 constexpr int kOwnDbError = 1000;
 
-// A result code of the library, or kOwnDbError, with a text of the form NAME[code]: detail.
+// A result code of SQLite, or kOwnDbError, with a text of the form NAME[code]: detail.
 class DbException : public std::exception {
   public:
     DbException(int code, const wxString& detail);
@@ -41,13 +41,13 @@ class DbException : public std::exception {
     std::string utf8_;
 };
 
-// Gives back what the database library holds for the process. Only when no connection is open and none will be opened.
+// Releases what SQLite holds for the process. No connection may be open, and none may be opened later.
 void shutDownDatabaseLibrary() noexcept;
 
-// A statement handle that a statement and its cursors share: whoever finalizes it, the others find it empty.
+// The handle that a statement and its cursors share. Once one of them has finalized it, it is null for all.
 using StatementSlot = std::shared_ptr<sqlite3_stmt*>;
 
-// A cursor over the rows of one run. The first step is taken when it is made, so that an empty result is known at once.
+// A cursor over the rows of one run of a statement. The first row has been read when the cursor is created.
 class DbQuery {
   public:
     DbQuery() noexcept = default;
@@ -55,10 +55,10 @@ class DbQuery {
     DbQuery& operator=(DbQuery&& other) noexcept;
     ~DbQuery();
 
-    // True when the cursor stands on a row; call it before the first one too.
+    // Moves to the next row, the first one included. Returns false after the last.
     bool nextRow();
-    // Points `text` to the column as UTF-8, or to a blob's bytes, valid until the next step; null for NULL. Returns the
-    // length in bytes.
+    // Stores a pointer to the column's UTF-8 text or blob, valid until the next row; null for NULL. Returns the length
+    // in bytes.
     int fieldText(int index, const char*& text);
     int fieldType(int index);
     int fieldInt(int index, int valueIfNull);
@@ -79,7 +79,7 @@ class DbQuery {
     bool ownsStatement_ = false;
 };
 
-// A prepared statement that is run again and again. Runs keep the bindings.
+// A prepared statement, for any number of runs. Runs keep the bindings.
 class DbStatement {
   public:
     DbStatement() noexcept = default;
@@ -91,7 +91,7 @@ class DbStatement {
     void bind(int index, const wxString& value);
     void bind(int index, std::int32_t value);
     void bind(int index, std::int64_t value);
-    // For texts that are in UTF-8 already; ends at the first zero, as the others do.
+    // Binds a text that is in UTF-8 already. This text too ends at its first zero.
     void bindUtf8(int index, const std::string& value);
     // Returns the number of changed rows.
     int execDML();
@@ -108,6 +108,10 @@ class DbStatement {
     StatementSlot statement_;
 };
 
+// How a transaction locks the database: plain and deferred ones when they first read or write, immediate ones at once
+// for writing. There is no exclusive mode: it would lock the service out of reading.
+enum class TransactionMode { plain, deferred, immediate };
+
 class DbConnection {
   public:
     DbConnection() noexcept = default;
@@ -115,7 +119,7 @@ class DbConnection {
     DbConnection& operator=(DbConnection&& other) noexcept;
     ~DbConnection();
 
-    // Creates the file when it is missing.
+    // Creates the file if it is missing.
     void open(const wxString& path);
     void close() noexcept;
     int execDML(const char* sql);
@@ -123,8 +127,7 @@ class DbConnection {
     DbStatement compileStatement(const char* sql);
     DbQuery execQuery(const char* sql);
     std::int64_t lastRowId() const;
-    // 1 begins a deferred transaction, 2 and 3 an immediate one, every other mode a plain one.
-    void beginTransaction(int mode);
+    void beginTransaction(TransactionMode mode = TransactionMode::plain);
     void commitTransaction();
     void rollbackTransaction();
 
@@ -133,7 +136,26 @@ class DbConnection {
     StatementSlot prepare(const char* sql) const;
 
     sqlite3* connection_ = nullptr;
-    int busyTimeout_ = 60000;
+    int busyTimeoutMs_ = 60000;
+};
+
+// A transaction of a connection, which must outlive it. The destructor rolls back what was neither committed nor rolled
+// back.
+class Transaction {
+  public:
+    explicit Transaction(DbConnection& connection, TransactionMode mode = TransactionMode::plain);
+    Transaction(const Transaction&) = delete;
+    Transaction& operator=(const Transaction&) = delete;
+    ~Transaction();
+
+    // After a failure the transaction may still be open.
+    void commit();
+    // Returns false if SQLite refuses: the transaction then ends with the connection, if SQLite has not ended it.
+    bool rollback() noexcept;
+
+  private:
+    DbConnection& connection_;
+    bool isOpen_ = true;
 };
 
 } // namespace tavi

@@ -15,11 +15,7 @@ const char* const kFolderReplace = "INSERT OR REPLACE INTO filesystem(state,fold
 const char* const kFolderDelete = "DELETE FROM filesystem WHERE folder=?";
 const char* const kFileSelect = "SELECT state FROM file_states WHERE filename=?";
 
-CriticalSection& fileStateLock()
-{
-    static CriticalSection lock;
-    return lock;
-}
+CriticalSection fileStateLock;
 
 } // namespace
 
@@ -27,7 +23,7 @@ FolderStateTable::FolderStateTable()
 {
     connection_.open(getConfigFilePath(kConfigDatabase));
     select_ = connection_.compileStatement(kFolderSelect);
-    // Prepared and never run: a table without these columns is refused at once.
+    // Prepared but never run: this fails at once for a table without these columns.
     replace_ = connection_.compileStatement(kFolderReplace);
     delete_ = connection_.compileStatement(kFolderDelete);
 }
@@ -38,29 +34,22 @@ FolderStateTable::~FolderStateTable()
         select_.finalize();
         replace_.finalize();
     } catch (...) {
-        // Their last run failed, which its caller has been told. What is not finalized yet goes with the members.
+        // Finalizing reports a failure of the last run, which was thrown then. The members' destructors finalize the
+        // rest.
     }
-    // The delete statement goes after the connection, with the members.
     connection_.close();
 }
 
-FolderStateTable::ReadScope::ReadScope(FolderStateTable& table) : table_(table)
+FolderStateTable::ReadScope::ReadScope(FolderStateTable& table) : table_(table), transaction_(table.connection_)
 {
-    table_.connection_.beginTransaction(0);
     table_.knownParent_.clear();
-    table_.reading_ = true;
+    table_.isReading_ = true;
 }
 
 FolderStateTable::ReadScope::~ReadScope()
 {
-    table_.reading_ = false;
+    table_.isReading_ = false;
     table_.knownParent_.clear();
-    try {
-        table_.connection_.commitTransaction();
-    } catch (...) {
-        // Nothing was written. Either SQLite has ended the transaction by itself, or the lock lasts until the table is
-        // destroyed.
-    }
 }
 
 std::optional<FolderState> FolderStateTable::recordedState(const wxString& folder)
@@ -71,7 +60,7 @@ std::optional<FolderState> FolderStateTable::recordedState(const wxString& folde
     if (!rows.nextRow())
         return std::nullopt;
     const auto state = static_cast<FolderState>(rows.fieldInt(0, 0));
-    // A statement left on its row would keep the service from writing for as long as the object lives.
+    // A statement that is not reset holds a lock that keeps the service from writing.
     select_.reset();
     return state;
 }
@@ -83,18 +72,18 @@ FolderState FolderStateTable::getFolderState(const wxString& path)
     if (const auto state = recordedState(path))
         return *state;
     const wxString parent = path.BeforeLast(L'\\');
-    if (reading_ && !parent.empty() && parent == knownParent_)
-        return passedOn_;
-    FolderState passedOn = FolderState::allOff;
+    if (isReading_ && !parent.empty() && parent == knownParent_)
+        return inherited_;
+    FolderState result = FolderState::allOff;
     for (wxString folder = parent; !folder.empty(); folder = folder.BeforeLast(L'\\')) {
         if (const auto state = recordedState(folder)) {
-            passedOn = inherited(*state);
+            result = inherited(*state);
             break;
         }
     }
     knownParent_ = parent;
-    passedOn_ = passedOn;
-    return passedOn;
+    inherited_ = result;
+    return result;
 }
 
 std::int32_t FileStateLookup::getFileState(const wxString& path)
@@ -110,7 +99,7 @@ std::int32_t FileStateLookup::getFileState(const wxString& path)
             return state;
         }
     }
-    const std::lock_guard<CriticalSection> hold(fileStateLock());
+    const std::lock_guard<CriticalSection> hold(fileStateLock);
     try {
         DbStatement select = connection_->compileStatement(kFileSelect);
         select.bind(1, path);

@@ -11,7 +11,7 @@
 
 namespace tavi {
 
-// The service's states of folders. One per shell object, used by its thread only; keeps its connection open.
+// The service's states of folders. Each shell object has one, which belongs to its thread and stays connected.
 class FolderStateTable {
   public:
     // Throws DbException when the configuration database cannot be used.
@@ -20,12 +20,12 @@ class FolderStateTable {
     FolderStateTable& operator=(const FolderStateTable&) = delete;
     ~FolderStateTable();
 
-    // The state recorded for the path, or what the nearest recorded ancestor passes on; allOff where none is recorded.
-    // Exact comparison, letter case included. Throws DbException.
+    // Returns the state recorded for the path, or what it inherits from the nearest recorded ancestor; allOff if there
+    // is none. Letter case counts. Throws DbException.
     FolderState getFolderState(const wxString& path);
 
-    // Holds the database for reading, so that many lookups in a row lock it once: the locks are most of what a lookup
-    // costs. Throws DbException when it cannot.
+    // Locks the database for reading, once for many lookups: the lock is most of what a lookup costs. The constructor
+    // throws DbException.
     class ReadScope {
       public:
         explicit ReadScope(FolderStateTable& table);
@@ -35,27 +35,29 @@ class FolderStateTable {
 
       private:
         FolderStateTable& table_;
+        // Nothing is written: the rollback at the end only unlocks.
+        Transaction transaction_;
     };
 
   private:
     std::optional<FolderState> recordedState(const wxString& folder);
 
-    // While a ReadScope lives: the folder of the last path and what it passes on.
-    bool reading_ = false;
+    // Within a ReadScope: the folder of the last path and the state that its entries inherit.
+    bool isReading_ = false;
     wxString knownParent_;
-    FolderState passedOn_ = FolderState::off;
+    FolderState inherited_ = FolderState::off;
     DbConnection connection_;
     DbStatement select_;
     DbStatement replace_;
     DbStatement delete_;
 };
 
-// The service's state of one file; made for one question and destroyed after it. Any thread.
+// Looks up the service's state of a file. Created for each lookup; any thread.
 class FileStateLookup {
   public:
     static constexpr std::int32_t kUnknown = 15;
 
-    // kUnknown when nothing is recorded or the database fails, which is logged.
+    // Returns kUnknown if no state is recorded or the database fails; a failure is logged.
     std::int32_t getFileState(const wxString& path);
 
   private:

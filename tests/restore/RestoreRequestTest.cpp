@@ -79,14 +79,14 @@ TEST_F(RestoreRequests, AFailureLeavesNothingHalfWrittenAndOneLine)
         waited += microseconds;
         return microseconds;
     });
-    for (const int mode : {0, 2}) {
+    for (const auto mode : {TransactionMode::plain, TransactionMode::immediate}) {
         database_.beginTransaction(mode);
         EXPECT_EQ(count(), 0);
         waited = 0;
         EXPECT_EQ(perform(L"C:\\one"), "1: Error: Error requesting restore: DB_BUSY[5]: database is locked");
         EXPECT_EQ(waited, 60000000);
         database_.commitTransaction();
-        EXPECT_EQ(count(), 0) << mode;
+        EXPECT_EQ(count(), 0) << static_cast<int>(mode);
     }
     system->xSleep = sleep;
     service_.install().SetValue(L"DataPath", wxString(L"C:\\no such folder"));
