@@ -12,7 +12,7 @@ void BackgroundThread::start() noexcept
             continue;
         if (seen == State::stopping)
             return;
-        // Suspended until its handle is stored: a stop that waits for the thread needs it.
+        // Suspended until its handle is stored, for which a stop may wait.
         const HANDLE thread = startModuleThread(run, this, true);
         if (!thread) {
             state_ = State::ended;
@@ -37,7 +37,7 @@ bool BackgroundThread::end(bool hasFailed) noexcept
         state_ = State::ended;
         return true;
     }
-    // Fails if the stop request was withdrawn after the body had seen it.
+    // Fails if the stop request was withdrawn after the body had seen it: the body then runs again.
     State stopping = State::stopping;
     return state_.compare_exchange_strong(stopping, State::ended);
 }

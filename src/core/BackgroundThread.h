@@ -6,12 +6,12 @@
 
 namespace tavi {
 
-// A thread of the module that exists at most once, and that can be asked to stop and then, until it has ended, to carry
-// on. The host may answer a permission to unload by using the module again: a second thread beside one that is still
-// stopping would compete with it for the same pipe, and would load again what is already in memory.
+// A thread of the module that runs at most once at a time. A stop request can be withdrawn until the thread has ended:
+// a host that may unload the module may also use it again, and a second thread beside one that is still stopping would
+// compete with it for the same pipe and load the same data again.
 //
-// Lock-free: the detach at the end of a process may use it although another thread was killed at any instruction.
-// Every member may be called by any thread. Objects must outlive the thread, so they are static.
+// Lock-free: when a process ends, the kernel kills the other threads at any instruction before the detach uses this
+// object. Any thread may call every member. Objects must outlive the thread, so they are static.
 class BackgroundThread {
   public:
     // Runs on the thread and returns soon after isStopping() has become true.
@@ -21,15 +21,15 @@ class BackgroundThread {
     BackgroundThread(const BackgroundThread&) = delete;
     BackgroundThread& operator=(const BackgroundThread&) = delete;
 
-    // Starts the thread, or withdraws a stop request that it has not acted on yet. If the thread cannot be created the
-    // next call tries again.
+    // Starts the thread, or withdraws a stop request that the thread has not acted on. If the thread cannot be created,
+    // the next call tries again.
     void start() noexcept;
     void requestStop() noexcept;
     bool isStopping() const noexcept
     {
         return state_ == State::stopping;
     }
-    // False before the first start and once the body has returned for good.
+    // Returns false before the first start and after the thread's last run of the body.
     bool isActive() const noexcept
     {
         return state_ != State::ended;

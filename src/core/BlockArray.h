@@ -9,8 +9,8 @@
 
 namespace tavi {
 
-// An array in blocks of 2^kLog elements, which never move: it grows without copying and needs no large piece of the
-// address space. Elements are plain and start undefined.
+// An array in blocks of 2^kLog elements, which never move: it grows without copying and needs no large contiguous range
+// of the address space. Elements are trivially copyable and start uninitialized.
 template <class Element, unsigned kLog>
 class BlockArray {
     static_assert(std::is_trivially_copyable_v<Element>);
@@ -36,7 +36,7 @@ class BlockArray {
         (*this)[size_] = element;
         ++size_;
     }
-    // Makes an empty array one of `size` elements that will not grow.
+    // Gives an empty array exactly `size` elements. It must not grow afterwards.
     void allocate(std::uint32_t size)
     {
         for (std::size_t done = 0; done < size; done += kBlock)

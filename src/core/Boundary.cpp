@@ -8,8 +8,8 @@ namespace tavi {
 
 void logEscaped(const char* entry) noexcept
 {
-    // Out of memory or a failing log must not undo the boundary. Not by the formatting calls: a destructor of theirs
-    // allocates, so that they would end the process where no memory is left.
+    // Lack of memory or a failing log must not break the boundary. wxWidgets' formatting calls are avoided: a
+    // destructor of theirs allocates, so they end the process if no memory is left.
     try {
         wxString text = L"Unhandled exception in " + wxString::FromUTF8(entry);
         try {

@@ -4,12 +4,11 @@
 
 namespace tavi {
 
-// Writes the exception being handled to the log under the entry's name. Never throws; call inside a catch block only.
+// Logs the exception being handled under the entry's name. To be called only inside a catch block.
 void logEscaped(const char* entry) noexcept;
 
-// The outermost handler of every way into the module: exports, COM methods, window procedures, thread routines and
-// callbacks. Whatever the body throws is logged and answered with the neutral result, so that nothing unwinds into the
-// host.
+// Runs the body of an entry point: an export, COM method, window procedure, thread routine or callback. Logs whatever
+// it throws and returns the neutral result, so that no exception unwinds into the host.
 template <class Result, class Body>
 Result guarded(const char* entry, Result neutral, Body&& body) noexcept
 {

@@ -4,7 +4,8 @@
 
 namespace tavi {
 
-// Not the library's mutex: what that one makes stays behind when the module is unloaded.
+// A lock for std::lock_guard. The mutex of the C++ runtime never frees the semaphore that it creates when threads
+// contend.
 class CriticalSection {
   public:
     CriticalSection() noexcept

@@ -17,7 +17,7 @@ struct Replacement {
     const wchar_t* conversion;
 };
 
-// The third row repairs what the second did to the first one's result.
+// In this order: the third row restores what the second one damages in the result of the first.
 const Replacement kTimePictures[] = {{L"HH", L"%H"}, {L"H", L"%H"},  {L"%%H", L"%H"}, {L"hh", L"%I"},
                                      {L"h", L"%I"},  {L"mm", L"%M"}, {L"m", L"%M"},   {L"ss", L"%S"},
                                      {L"s", L"%S"},  {L"tt", L"%p"}, {L"t", L"%p"}};
@@ -60,7 +60,7 @@ wxString formatRate(std::uint64_t amountPerSecond)
 
 wxString formatDuration(std::uint32_t seconds)
 {
-    // Strictly greater: a full unit that is all there is stays in the smaller one, so that 86400 reads 24 hours.
+    // Strictly greater, as users know it: 86400 seconds read "24 hours", not "1 day".
     const auto split = [&](std::uint32_t unit) {
         if (seconds <= unit)
             return 0ul;

@@ -4,19 +4,19 @@
 
 #include <wx/string.h>
 
-// Display texts of numbers. Pure functions; words come from the active message catalogue. Any thread.
+// Display texts of numbers. Pure functions; the words come from the active message catalogue. Any thread.
 namespace tavi {
 
-// A byte count. A value equal to a unit's threshold stays in the smaller unit.
+// Formats a number of bytes. A value equal to a unit is shown in the smaller one, "1024 bytes".
 wxString formatSize(std::int64_t bytes);
 
-// An amount per second, in the lower-case bit units: the caller passes bits.
+// Formats a number of bits per second.
 wxString formatRate(std::uint64_t amountPerSecond);
 
-// A number of seconds, as its largest unit and the next smaller one.
+// Formats a number of seconds by its largest unit and the next smaller one.
 wxString formatDuration(std::uint32_t seconds);
 
-// The wxDateTime pattern of a locale's pictures: the short date, one blank, the time without its seconds.
+// Converts a locale's pictures to a wxDateTime pattern: short date, one blank, time without seconds.
 wxString dateTimePattern(wxString timePicture, const wxString& timeSeparator, wxString datePicture);
 
 } // namespace tavi

@@ -5,8 +5,8 @@
 namespace tavi {
 
 // The state of a folder in the service's configuration, and of a node in the tree of default exclusions: whether the
-// rule of the folder itself is on, and a summary of what is beneath it. Odd: the rule is on. The service may store
-// other numbers; they are passed on unchanged.
+// rule of the folder itself is on, and a summary of what is beneath it. The service may store other numbers, which
+// entries inherit unchanged.
 enum class FolderState : std::uint32_t {
     off = 0,       // off, and nothing beneath is on
     on = 1,        // on, and nothing beneath is on

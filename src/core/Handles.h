@@ -56,7 +56,7 @@ class UniqueHandle {
     Handle handle_ = Traits::none();
 };
 
-// The value that means "no handle" differs from kind to kind.
+// The value that means "no handle" depends on the kind.
 template <class Type>
 struct NullIsNone {
     using Handle = Type;

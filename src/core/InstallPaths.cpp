@@ -13,15 +13,15 @@ const wchar_t* const kDataFiles[] = {L"\\tavistate.dat",  L"\\tavi.log",      L"
                                      L"\\filter_raw.log", L"\\tavicache.dat", L"\\tavimap.dat", L""};
 
 template <std::size_t N>
-wxString filePath(const wchar_t* directoryValue, const wchar_t* const (&names)[N], int selector)
+wxString filePath(const wchar_t* directoryValue, const wchar_t* const (&names)[N], std::size_t file)
 {
-    if (selector < 0 || static_cast<std::size_t>(selector) >= N)
+    if (file >= N)
         return wxString();
     wxString directory;
     const wxRegKey key(getInstallKeyName());
     if (key.Exists() && !key.QueryValue(directoryValue, directory))
         directory.clear();
-    return directory + names[selector];
+    return directory + names[file];
 }
 
 } // namespace
@@ -36,14 +36,14 @@ wxString getSettingsKeyName()
     return getInstallKeyName() + L"\\params";
 }
 
-wxString getConfigFilePath(int selector)
+wxString getConfigFilePath(ConfigFile file)
 {
-    return filePath(L"ConfigPath", kConfigFiles, selector);
+    return filePath(L"ConfigPath", kConfigFiles, static_cast<std::size_t>(file));
 }
 
-wxString getDataFilePath(int selector)
+wxString getDataFilePath(DataFile file)
 {
-    return filePath(L"DataPath", kDataFiles, selector);
+    return filePath(L"DataPath", kDataFiles, static_cast<std::size_t>(file));
 }
 
 } // namespace tavi

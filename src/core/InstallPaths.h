@@ -2,27 +2,28 @@
 
 #include <wx/string.h>
 
-// Where the backup service keeps its files. Read from the registry afresh at every call; any thread.
+// The paths of the backup service's files. Each call reads the registry; any thread.
 namespace tavi {
 
 wxString getInstallKeyName();
 wxString getSettingsKeyName();
 
-enum ConfigFile { kConfigDatabase = 0, kKeyFile = 1 };
-enum DataFile {
-    kStateDatabase = 0,
-    kLogFile = 1,
-    kLogDatabase = 2,
-    kChangesFile = 3,
-    kFilterLog = 4,
-    kCacheFile = 5,
-    kMapFile = 6,
-    kDataDirectory = 7,
+// The service's files, by the numbers that it uses for them.
+enum class ConfigFile { database = 0, key = 1 };
+enum class DataFile {
+    stateDatabase = 0,
+    log = 1,
+    logDatabase = 2,
+    changes = 3,
+    filterLog = 4,
+    cache = 5,
+    map = 6,
+    directory = 7, // the directory itself
 };
 
-// Full path of a service file. With the directory value missing it is the bare file name; empty for a selector not
-// listed above. Ask for kDataDirectory to learn whether the directory is known.
-wxString getConfigFilePath(int selector);
-wxString getDataFilePath(int selector);
+// Returns the full path of a file, or its bare name with a backslash if the service's directory is not known: then
+// DataFile::directory gives an empty path. Empty for any other number.
+wxString getConfigFilePath(ConfigFile file);
+wxString getDataFilePath(DataFile file);
 
 } // namespace tavi

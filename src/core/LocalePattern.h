@@ -4,8 +4,8 @@
 
 namespace tavi {
 
-// The pattern, in the date-time class's %-conversions, of the user's short date and time without seconds. Read afresh
-// at each call; any thread.
+// Returns the wxDateTime pattern of the user's short date and time without seconds. Each call reads the settings; any
+// thread.
 wxString localeDateTimePattern();
 
 } // namespace tavi

@@ -15,11 +15,12 @@ namespace {
 
 constexpr int kInstallReads = 31;
 constexpr unsigned long kInstallReadIntervalMs = 1000;
-constexpr std::size_t kLongestMessage = 4095;
-// Above the longest line in bytes, so that each line is one write and processes that share the file do not tear it.
-constexpr std::size_t kFileBuffer = 32768;
+constexpr std::size_t kMaxMessageLength = 4095;
+// More than the longest line: each line is one write, so lines of the processes that share the file stay whole.
+constexpr std::size_t kFileBufferBytes = 32768;
 
-// The library's target of last resort is a message box, which would hold up the host, and in process attach for good.
+// Without a target wxWidgets creates one that opens a message box, which would block the host, in process attach
+// forever.
 [[maybe_unused]] const bool noTargetOfLastResort = [] {
     wxLog::DontCreateOnDemand();
     return true;
@@ -47,8 +48,8 @@ class FileLogTarget : public wxLogStderr {
     void DoLogRecord(wxLogLevel level, const wxString& message, const wxLogRecordInfo& info) override
     {
         const std::lock_guard<CriticalSection> hold(lock_);
-        wxLogStderr::DoLogRecord(level, message.length() > kLongestMessage ? message.Left(kLongestMessage) : message,
-                                 info);
+        wxLogStderr::DoLogRecord(
+            level, message.length() > kMaxMessageLength ? message.Left(kMaxMessageLength) : message, info);
     }
 
   private:
@@ -65,15 +66,16 @@ bool openLog(unsigned long level)
 
 bool openLog(unsigned long level, const std::function<void(unsigned long)>& sleep)
 {
-    // The host may be up before the service has been installed; the wait inside process attach is deliberate.
-    for (int reads = 1; getDataFilePath(kDataDirectory).empty(); ++reads) {
+    // The host may start before the service is installed. Without this wait, deliberately in process attach, support
+    // would have no log of that session.
+    for (int reads = 1; getDataFilePath(DataFile::directory).empty(); ++reads) {
         if (reads == kInstallReads)
             return false;
         sleep(kInstallReadIntervalMs);
     }
-    const wxString path = getDataFilePath(kLogFile);
+    const wxString path = getDataFilePath(DataFile::log);
     if (std::FILE* file = _wfopen(path.wc_str(), L"a")) {
-        std::setvbuf(file, nullptr, _IOFBF, kFileBuffer);
+        std::setvbuf(file, nullptr, _IOFBF, kFileBufferBytes);
         wxLog* const before = wxLog::SetActiveTarget(new FileLogTarget(file));
         if (!targetInstalled)
             previousTarget = before;
@@ -96,8 +98,7 @@ void closeLog() noexcept
 
 LogSilencer::LogSilencer()
 {
-    // The library's flag is one for the process: two plain save-and-restore pairs that overlap could leave it off for
-    // good.
+    // wxWidgets' flag is one for the process: two plain pairs of save and restore that overlap could leave it off.
     const std::lock_guard<CriticalSection> hold(silencerLock);
     if (silencers++ == 0)
         loggingBefore = wxLog::EnableLogging(false);

@@ -7,15 +7,14 @@
 
 namespace tavi {
 
-// The module's own instance, set at attach before any other use and never changed. Resources and the module path come
-// from it.
+// The module's own instance, for its resources and its path. Set once, at attach, before any other use.
 HINSTANCE moduleInstance() noexcept;
 void setModuleInstance(HINSTANCE instance) noexcept;
 
-// Live COM objects, class factories and windows. The host may unload the module while it is 0.
+// The number of COM objects, class factories and windows. While it is 0 the host may unload the module.
 std::atomic<std::int32_t>& moduleRefCount() noexcept;
 
-// Counts as one object of the module for as long as it lives. Any thread.
+// Counts as one object of the module during its lifetime. Any thread.
 class ModuleLock {
   public:
     ModuleLock() noexcept

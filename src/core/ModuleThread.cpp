@@ -13,7 +13,7 @@ namespace {
 struct ThreadStart {
     ThreadBody body;
     void* argument;
-    // The mapping that the thread runs in; null in a program that is not loaded and freed as a module.
+    // The module's reference to itself, which the thread releases as it ends.
     HMODULE mapping;
 };
 
@@ -26,11 +26,10 @@ DWORD WINAPI runModuleThread(void* parameter)
         owned.reset();
         start.body(start.argument);
     });
-    // The library keeps texts for each thread that it has translated for or logged from, and frees those of its own
-    // only.
+    // wxWidgets keeps texts for each thread that translated or logged, and frees them only for threads of its own.
     guarded("thread clean-up", [] { wxThreadSpecificInfo::ThreadCleanUp(); });
     releaseThreadRuntime();
-    // A plain return would run through code that this very release may unmap.
+    // This release may unmap the module, so the thread cannot return into it.
     FreeLibraryAndExitThread(start.mapping, 0);
 }
 

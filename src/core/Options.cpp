@@ -17,11 +17,11 @@ std::optional<Value> readOption(const wchar_t* name, Read read)
     wxRegKey settings(getSettingsKeyName());
     if (!settings.Exists())
         return std::nullopt;
-    // A failed read may leave a part of the value behind: only a true answer makes it one.
+    // A failed read may store a part of the value.
     Value value{};
     if (read(settings, value))
         return value;
-    // The service writes a fresh value when it finds none: deleting is the repair.
+    // The service writes a new value when it finds none.
     settings.DeleteValue(name);
     return std::nullopt;
 }

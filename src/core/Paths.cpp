@@ -10,7 +10,7 @@ wxString longPath(const wxString& path)
 {
     std::vector<wchar_t> buffer(path.length() + 1);
     DWORD length = 0;
-    // Once more after growing; a path that changes meanwhile may need it again.
+    // Repeated after growing; a path that changes meanwhile may need more.
     while ((length = GetLongPathNameW(path.wc_str(), buffer.data(), static_cast<DWORD>(buffer.size()))) >=
            buffer.size())
         buffer.resize(length + 1);

@@ -16,7 +16,7 @@ namespace tavi {
 // pointer replaced releases the reference that was added for it. The reader may do so before the other thread has added
 // it: a published object therefore holds a reserve of references until it has been replaced.
 //
-// Object is a RefCounted with an atomic count. An object may be published once only.
+// Object is a RefCounted with an atomic count. An object may be published only once.
 template <class Object>
 class PublishedPointer {
   public:
@@ -63,7 +63,7 @@ class PublishedPointer {
 
   private:
     using Word = std::uint64_t;
-    // User-space pointers fit in 48 bits; the rest counts readers, of which there are at most as many as threads.
+    // User-space pointers have at most 48 bits. The rest counts readers, of which each thread is one at most.
     static constexpr unsigned kCountBits = 16;
     static constexpr Word kReaders = (Word{1} << kCountBits) - 1;
     static constexpr int kReserve = 1 << kCountBits;

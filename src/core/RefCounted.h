@@ -7,9 +7,9 @@
 
 namespace tavi {
 
-// The count of an object that RefPtr holds. Starts at 0; the object is destroyed when the last reference is released.
-// With an atomic count any thread may hold references; with a plain one, a single thread. The two methods bear COM's
-// names so that RefPtr holds COM interfaces too.
+// The base of objects that RefPtr holds. The count starts at 0; the release of the last reference destroys the object.
+// With an atomic count any thread may hold references, with a plain one a single thread. The methods have COM's names
+// so that RefPtr holds COM interfaces too.
 template <class Derived, class Count = std::atomic<std::int32_t>>
 class RefCounted {
   public:

@@ -6,7 +6,7 @@
 
 #include "core/ThreadLocals.h"
 
-// Of the C++ runtime, which declares it in no header.
+// A function of the C++ runtime that no header declares.
 namespace __gnu_cxx { // NOLINT(bugprone-reserved-identifier)
 void __freeres();     // NOLINT(bugprone-reserved-identifier)
 } // namespace __gnu_cxx
@@ -14,9 +14,9 @@ void __freeres();     // NOLINT(bugprone-reserved-identifier)
 namespace tavi {
 namespace {
 
-// Created before every other object and so destroyed after them all, when the module is unmapped. The loader no longer
-// runs the runtime's clean-up for the thread that unloads the module, and the runtime never frees its reserve for
-// exceptions when memory has run out.
+// Constructed before every other static object and so destroyed after them, when the module is unmapped. For the thread
+// that unloads the module the loader does not run the runtime's clean-up, and the runtime never frees the memory that
+// it reserves for exceptions when none is left.
 struct LastRelease {
     ~LastRelease()
     {
@@ -31,15 +31,15 @@ struct LastRelease {
 
 void releaseThreadRuntime() noexcept
 {
-    // The runtime's part holds the exceptions in flight: a handler further up would read freed memory.
+    // The data of the runtime include the exceptions in flight, which a handler further up will read.
     if (std::uncaught_exceptions() != 0 || std::current_exception())
         return;
     HMODULE module = nullptr;
     if (!GetModuleHandleExW(GET_MODULE_HANDLE_EX_FLAG_FROM_ADDRESS | GET_MODULE_HANDLE_EX_FLAG_UNCHANGED_REFCOUNT,
                             reinterpret_cast<const wchar_t*>(&releaseThreadRuntime), &module))
         return;
-    // The runtime frees a thread's part in the callbacks that the loader runs as the thread ends, which it does not do
-    // for a module that is gone by then.
+    // The runtime frees a thread's data in callbacks that the loader runs when the thread ends. It cannot run those of
+    // a module that is unmapped by then, so they run here.
     const auto* const base = reinterpret_cast<const BYTE*>(module);
     const auto* const dos = reinterpret_cast<const IMAGE_DOS_HEADER*>(base);
     const auto* const headers = reinterpret_cast<const IMAGE_NT_HEADERS*>(base + dos->e_lfanew);

@@ -13,17 +13,17 @@
 
 namespace {
 
-// A variable as the compiler describes it, in its layout.
+// The compiler's description of a variable, in the compiler's layout.
 struct Variable {
     std::size_t size;
     std::size_t alignment;
-    // 0 until the variable is used for the first time.
+    // 0 until the first use of the variable.
     std::atomic<std::uintptr_t> number;
     const void* initial;
 };
 
-// The variables of one thread, by number; in a list, so that the module can free those of threads that go on without
-// it.
+// The variables of one thread, by number. The threads form a list: when the module is unmapped it frees the variables
+// of threads that still run.
 struct ThreadVariables {
     ThreadVariables* next;
     ThreadVariables** link;
@@ -31,7 +31,7 @@ struct ThreadVariables {
     void* variables[1];
 };
 
-// Needs no clean-up, unlike a critical section.
+// Unlike a critical section it needs no clean-up.
 SRWLOCK lock = SRWLOCK_INIT;
 ThreadVariables* allThreads = nullptr;
 std::atomic<std::uintptr_t> lastNumber{0};
@@ -60,7 +60,7 @@ std::uintptr_t numberOf(Variable& variable) noexcept
     return variable.number.compare_exchange_strong(number, next) ? next : number;
 }
 
-// Takes the thread out of the list. Under the lock.
+// The caller holds the lock.
 void removeFromList(const ThreadVariables& thread) noexcept
 {
     *thread.link = thread.next;
@@ -68,7 +68,7 @@ void removeFromList(const ThreadVariables& thread) noexcept
         thread.next->link = thread.link;
 }
 
-// Room for a few more than asked for; grows once or twice in the life of a thread.
+// Returns a copy with room for a few more variables than needed, or null. A thread needs this once or twice.
 ThreadVariables* grow(ThreadVariables* before, std::uintptr_t count) noexcept
 {
     const std::size_t capacity = count + 4;
@@ -116,7 +116,7 @@ void* variableOfThread(Variable& variable) noexcept
     auto* thread = static_cast<ThreadVariables*>(TlsGetValue(index));
     if (!thread || thread->count < number) {
         thread = grow(thread, number);
-        // Like the compiler's own: nothing can be thrown without these variables.
+        // Like the compiler's own store: without these variables not even an exception can be thrown.
         if (!thread || !TlsSetValue(index, thread))
             std::abort();
     }
@@ -153,15 +153,15 @@ void NTAPI endOfThread(void*, DWORD reason, void*)
 extern "C" void* __emutls_get_address(void* variable); // NOLINT(bugprone-reserved-identifier)
 extern "C" void* __emutls_get_address(void* variable)  // NOLINT(bugprone-reserved-identifier)
 {
-    // The code around it may be about to ask for the error of the call before.
+    // The caller may read the error of a system call it made before.
     const DWORD error = GetLastError();
     void* const found = variableOfThread(*static_cast<Variable*>(variable));
     SetLastError(error);
     return found;
 }
 
-// The loader calls what stands in this section; the letters behind the $ order it behind the runtime's own callbacks,
-// whose destructors may still use the variables.
+// The loader calls the functions in this section, ordered by the letters after the $. The runtime's own callbacks,
+// whose destructors may use the variables, come earlier.
 extern "C" {
 [[gnu::section(".CRT$XLX"), gnu::used]] const PIMAGE_TLS_CALLBACK tavishellEndOfThread = endOfThread;
 }

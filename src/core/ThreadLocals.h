@@ -1,11 +1,11 @@
 #pragma once
 
-// The thread-local variables of the module, which are those of the static C++ runtime: above all the exceptions in
-// flight. The compiler's own store for them never frees its locks, two semaphores and a dozen heap blocks: each unload
-// of the module would leave them in the host. This store frees everything.
+// A store for the module's thread-local variables, which belong to the static C++ runtime: above all the exceptions in
+// flight. The compiler's own store never frees its locks, so each unload of the module would leave two semaphores and a
+// dozen heap blocks in the host. This store frees everything.
 namespace tavi {
 
-// Frees the variables of every thread. Only when no other thread can run code of the module any more.
+// Frees the variables of every thread. No other thread may run code of the module any more.
 void releaseAllThreadLocals() noexcept;
 
 } // namespace tavi

@@ -41,7 +41,7 @@ void appendWide(char32_t point, std::wstring& out)
     out.push_back(static_cast<wchar_t>(point));
 }
 
-// The length of a sequence by its lead byte; 0 for a byte that leads none.
+// Returns the length of the sequence that a byte leads, or 0 if it leads none.
 constexpr std::size_t sequenceLength(unsigned char lead) noexcept
 {
     return lead < 0x80 ? 1 : lead < 0xC0 ? 0 : lead < 0xE0 ? 2 : lead < 0xF0 ? 3 : lead < 0xF8 ? 4 : 0;

@@ -33,23 +33,23 @@ void appendUtf8(std::wstring_view text, std::string& out);
 // Converts to a wide string. Each malformed byte becomes U+FFFD.
 wxString fromUtf8(std::string_view text);
 
-// The sequence at the start of a text.
+// The first sequence of a text.
 struct Utf8Sequence {
     enum class Form { whole, truncated, malformed };
     Form form;
-    // The bytes of a whole sequence, or those that are there of a truncated one.
+    // The bytes of a whole sequence, or those present of a truncated one.
     std::size_t length;
-    // Of a whole sequence.
+    // The code point of a whole sequence.
     char32_t point;
 };
 
 // Decodes the first sequence of a non-empty text.
 Utf8Sequence decodeUtf8(std::string_view text) noexcept;
 
-// The UTF-16 units of well-formed UTF-8.
+// Returns the number of UTF-16 units of well-formed UTF-8.
 std::uint32_t countUtf16Units(std::string_view text) noexcept;
 
-// How many bytes the first `units` characters (wchar_t) of a well-formed text take.
+// Returns the number of bytes of the first `units` wide characters of a well-formed text.
 std::size_t utf8PrefixLength(std::string_view text, std::size_t units) noexcept;
 
 } // namespace tavi

@@ -63,7 +63,7 @@ ExclusionSources systemSources(FolderListings& listings)
     sources.temporaryFolder = temporaryFolder;
     sources.windowsFolder = windowsFolder;
     sources.dollarEntries = [&](const wxString& folder) { return listings.of(folder).dollarEntries; };
-    sources.serviceDataFolder = [] { return getDataFilePath(kDataDirectory); };
+    sources.serviceDataFolder = [] { return getDataFilePath(DataFile::directory); };
     sources.userFolders = shellFolderPaths;
     sources.exists = isFolder;
     sources.keepsUserPlaces = [] { return readGraylistEnabled().value_or(false); };

@@ -6,15 +6,15 @@
 
 namespace tavi {
 
-// The only way to tell the service to do something: one message per connection, nothing read back, no waiting for a
-// busy or absent service. Any thread.
+// The pipe for commands to the service: one message per connection and no reply. Never waits for a busy or absent
+// service. Any thread.
 class CommandPipe {
   public:
-    // True when the message was written. It is destroyed, written or not, unless the pipe cannot be opened: that is
-    // logged, and the message is left as it is.
+    // Returns true if the message was written. Destroys the message, unless the pipe cannot be opened: this is logged,
+    // and the caller keeps the message.
     static bool sendCommand(std::unique_ptr<PipeMessage>& message);
 
-    // The command that stops the running restore.
+    // Returns the command that ends the running restore.
     static std::unique_ptr<PipeMessage> cancelRestore();
 };
 

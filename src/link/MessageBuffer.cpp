@@ -6,14 +6,14 @@
 namespace tavi {
 namespace {
 
-constexpr std::uint32_t kFirstCapacity = 1024;
-constexpr std::uint32_t kHeadroom = 1024;
+constexpr std::uint32_t kInitialBytes = 1024;
+constexpr std::uint32_t kHeadroomBytes = 1024;
 
 } // namespace
 
 MessageBuffer::MessageBuffer() noexcept
 {
-    grow(kFirstCapacity);
+    grow(kInitialBytes);
 }
 
 MessageBuffer::~MessageBuffer()
@@ -24,12 +24,12 @@ MessageBuffer::~MessageBuffer()
 void MessageBuffer::ensure(std::uint32_t size) noexcept
 {
     if (size > capacity_)
-        grow(size > UINT32_MAX - kHeadroom ? UINT32_MAX : size + kHeadroom);
+        grow(size > UINT32_MAX - kHeadroomBytes ? UINT32_MAX : size + kHeadroomBytes);
 }
 
 void MessageBuffer::grow(std::uint32_t capacity) noexcept
 {
-    // The last kilobyte below 4 GB has no room for the headroom: as good as refused.
+    // This capacity means that the size and its headroom exceed 4 GB.
     void* const block = capacity == UINT32_MAX ? nullptr : std::realloc(data_, capacity);
     if (!block)
         std::free(data_);

@@ -6,7 +6,7 @@
 
 namespace tavi {
 
-// The growable block that carries one frame. The count is plain: a buffer never leaves the thread that created it.
+// A growable block for one frame. The reference count is not atomic: a buffer stays on the thread that created it.
 class MessageBuffer : public RefCounted<MessageBuffer, std::uint32_t> {
   public:
     static RefPtr<MessageBuffer> create()
@@ -14,10 +14,10 @@ class MessageBuffer : public RefCounted<MessageBuffer, std::uint32_t> {
         return RefPtr<MessageBuffer>(new MessageBuffer);
     }
 
-    // Makes room for `size` bytes. When that fails the old block is gone too and data() is null.
+    // Grows the block to at least `size` bytes. On failure the old block is freed too, and data() is null.
     void ensure(std::uint32_t size) noexcept;
 
-    // Every byte up to capacity() may be read; those that nobody wrote are 0. Null after a failed growth.
+    // Returns the block, null after a failed growth. All capacity() bytes can be read; new ones are 0.
     unsigned char* data() const noexcept
     {
         return data_;
@@ -26,7 +26,7 @@ class MessageBuffer : public RefCounted<MessageBuffer, std::uint32_t> {
     {
         return capacity_;
     }
-    // The bytes in use, as announced: it may be larger than what was delivered, and larger than the capacity.
+    // Returns the number of bytes in use. The peer announces it: it may exceed the bytes received and the capacity.
     std::uint32_t length() const noexcept
     {
         return length_;

@@ -34,7 +34,7 @@ const PipeMessage* PendingMessages::put(std::unique_ptr<PipeMessage> message)
 {
     const bool kept = isKept(*message);
     const std::size_t bytes = textBytes(*message);
-    // The text of a start or an end has no meaning, and the bound on texts could not drop it.
+    // A start or an end needs no text, and the bound on texts could not drop it.
     if (kept && bytes > 0)
         message = std::make_unique<EventMessage>(message->type());
     const PipeMessage* const added = message.get();

@@ -10,11 +10,11 @@
 
 namespace tavi {
 
-// The messages that one window has yet to handle, oldest first, within bounds however long the window is busy. Beyond
-// a bound the oldest texts and amounts are dropped: the transfer status holds their sum. Starts and ends of restores
-// and snapshots are kept. Each operation has constant cost. Not synchronised.
+// The pending messages of a window, oldest first, bounded however long the window is busy. Beyond a bound the oldest
+// texts and amounts are dropped: the transfer status contains them. Starts and ends of restores and snapshots are kept.
+// Each operation takes constant time. Not synchronised.
 //
-// At most one notification is in flight, so that the system's queue of a busy window stays short too.
+// At most one notification is in flight, so that the window's message queue stays short too.
 class PendingMessages {
   public:
     static constexpr std::size_t kMaxCount = 1000;
@@ -42,8 +42,8 @@ class PendingMessages {
 
     std::deque<Pending> kept_;
     std::deque<Pending> droppable_;
-    // Starts, ends and snapshots beyond the bound, older than all others. They carry nothing but their type, and their
-    // order among themselves makes no difference to the window.
+    // The number of starts, ends and snapshots beyond the bound, which are older than all others. Only their types
+    // matter to the window, not their order.
     std::map<EventType, std::uint64_t> counted_;
     std::size_t textBytes_ = 0;
     std::uint64_t nextNumber_ = 0;

@@ -11,7 +11,7 @@
 namespace tavi {
 namespace {
 
-// Fills a buffer with one frame. Writes nothing when the buffer could not grow.
+// Writes one frame into a buffer. Writes nothing if the buffer could not grow.
 class FrameWriter {
   public:
     FrameWriter(MessageBuffer& buffer, EventType type, std::uint32_t fixedPayload,
@@ -52,7 +52,7 @@ class FrameWriter {
     unsigned char* at_;
 };
 
-// Reads a payload in order. The buffer's capacity, not the announced length, is what bounds it.
+// Reads a payload in order, within the buffer's capacity: the announced length is the peer's and may be false.
 class PayloadReader {
   public:
     explicit PayloadReader(const MessageBuffer& buffer) noexcept : buffer_(buffer) {}

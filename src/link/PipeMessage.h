@@ -8,9 +8,8 @@
 #include "link/EventType.h"
 #include "link/MessageBuffer.h"
 
-// The framed messages of both pipes. A frame is an 8-byte header (type, number of payload bytes) and the payload; every
-// integer is little-endian, a text is a count of bytes and its UTF-8. Pure code. Only one thread at a time touches a
-// message; it is handed on whole.
+// The framed messages of both pipes. A frame is an 8-byte header (type, number of payload bytes) and the payload.
+// Integers are little-endian; a text is a number of bytes and so much UTF-8. A message belongs to one thread at a time.
 namespace tavi {
 
 enum class MessageKind : std::uint32_t { event = 0, snapshot = 1, item = 2, textTriple = 3, counter = 4 };
@@ -25,7 +24,7 @@ class PipeMessage {
     PipeMessage(const PipeMessage&) = delete;
     PipeMessage& operator=(const PipeMessage&) = delete;
 
-    // Writes header and payload; the buffer's length is then the frame's size, or 0 when it could not grow.
+    // Writes header and payload. The buffer's length becomes the size of the frame, or 0 if the buffer could not grow.
     virtual void serialise(MessageBuffer& buffer) const = 0;
     virtual std::unique_ptr<PipeMessage> clone() const = 0;
     virtual ~PipeMessage() = default;
@@ -119,8 +118,8 @@ class CounterMessage final : public PipeMessage {
     const std::uint32_t flag;
 };
 
-// The message of a received frame, whose payload the buffer holds; null when the type stands for no message or the
-// announced payload is below what its kind needs. Text counts are believed, but nothing outside the buffer is read.
+// Creates the message of a received frame from its type and payload. Returns null if the type is not one of EventType
+// or the announced length is too small for its kind. A text may extend beyond that length, but not beyond the buffer.
 std::unique_ptr<PipeMessage> createMessage(std::uint32_t type, const MessageBuffer& payload);
 
 } // namespace tavi

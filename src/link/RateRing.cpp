@@ -11,7 +11,7 @@ RateRing::RateRing(std::int32_t capacity, TickSource clock)
 
 void RateRing::addSample(std::uint64_t amount) noexcept
 {
-    // The clock is read between the two looks at the last tick, so that time never runs backwards between threads.
+    // The clock is read again after each failed exchange, so that the last tick never decreases.
     std::uint32_t last = lastTick_.load(std::memory_order_relaxed);
     std::uint32_t now = clock_();
     while (!lastTick_.compare_exchange_weak(last, now, std::memory_order_relaxed))
@@ -41,7 +41,7 @@ double RateRing::rateOver(std::int32_t span) const noexcept
     std::uint32_t milliseconds = 0;
     std::uint64_t bytes = 0;
     std::int32_t slot = (capacity_ + end - 1) % capacity_;
-    // A ring that has not wrapped goes through slots still all zeros before it comes round.
+    // In a ring that has not wrapped yet the oldest slots are 0.
     while (static_cast<std::int32_t>(milliseconds) < span && slot != end) {
         milliseconds += elapsed_[static_cast<std::size_t>(slot)].load(std::memory_order_relaxed);
         bytes += samples_[static_cast<std::size_t>(slot)].load(std::memory_order_relaxed);

@@ -6,12 +6,11 @@
 
 namespace tavi {
 
-// Milliseconds since some start, wrapping at 32 bits.
+// Returns milliseconds since any start; wraps at 32 bits.
 using TickSource = std::uint32_t (*)();
 
-// The newest amounts of a transfer with the time between them, for rates over the last seconds. Lock-free for any
-// number of threads: a sample added or a clear done while a rate is summed may or may not be in it. Allocates only when
-// made.
+// The newest amounts of a transfer and the times between them, for rates over the last seconds. Lock-free; any thread.
+// A rate may miss a sample or a clear of the same moment. Only the constructor allocates.
 class RateRing {
   public:
     RateRing(std::int32_t capacity, TickSource clock);
@@ -20,12 +19,12 @@ class RateRing {
 
     void addSample(std::uint64_t amount) noexcept;
     void clearRing() noexcept;
-    // Bytes per millisecond over at least the newest `span` milliseconds, or all there is.
+    // Returns bytes per millisecond over at least the newest `span` milliseconds, or over all samples.
     double rateOver(std::int32_t span) const noexcept;
 
   private:
     std::unique_ptr<std::atomic<std::uint64_t>[]> samples_;
-    // Milliseconds from the sample before to this one.
+    // The milliseconds between the previous sample and each sample.
     std::unique_ptr<std::atomic<std::uint32_t>[]> elapsed_;
     const std::int32_t capacity_;
     std::atomic<std::int32_t> next_{0};

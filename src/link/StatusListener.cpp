@@ -12,13 +12,14 @@ namespace tavi {
 namespace {
 
 constexpr const wchar_t* kStatusPipe = L"\\\\.\\pipe\\tavistatus";
-constexpr DWORD kRetryMilliseconds = 5000;
-constexpr DWORD kStopPollMilliseconds = 50;
-constexpr DWORD kHangUpMilliseconds = 10;
+constexpr DWORD kRetryMs = 5000;
+constexpr DWORD kStopPollMs = 50;
+constexpr DWORD kHangUpMs = 10;
 
 std::atomic<MessageSink> messageSink{nullptr};
 
-// Two threads may be first: both make one, and one of the two stays.
+// Creates the status on its first use. Not a local static: threads that meet in its guard make the C++ runtime create
+// two semaphores and an event, which would outlive the module. Here both create a status, and one of the two is kept.
 class LazyStatus {
   public:
     ~LazyStatus()
@@ -29,10 +30,10 @@ class LazyStatus {
     {
         TransferStatus* status = status_.load();
         if (!status) {
-            auto made =
+            auto created =
                 std::make_unique<TransferStatus>(true, [] { return static_cast<std::uint32_t>(GetTickCount()); });
-            if (status_.compare_exchange_strong(status, made.get()))
-                status = made.release();
+            if (status_.compare_exchange_strong(status, created.get()))
+                status = created.release();
         }
         return *status;
     }
@@ -50,11 +51,11 @@ FileHandle openStatusPipe() noexcept
 
 void waitForRetry(const StopCheck& stopCheck)
 {
-    for (DWORD waited = 0; waited < kRetryMilliseconds && !stopCheck(); waited += kStopPollMilliseconds)
-        Sleep(kStopPollMilliseconds);
+    for (DWORD waited = 0; waited < kRetryMs && !stopCheck(); waited += kStopPollMs)
+        Sleep(kStopPollMs);
 }
 
-// Until the connection fails, brings something that is no message, or is no longer wanted.
+// Dispatches messages until the connection fails, a frame is malformed or the check returns true.
 void followConnection(HANDLE pipe, const StopCheck& stopCheck)
 {
     std::unique_ptr<PipeMessage> message;
@@ -92,7 +93,7 @@ void listenToStatus(const StopCheck& stopCheck)
             pipe = openStatusPipe();
         }
         const DWORD start = GetTickCount();
-        // One message too many for the memory there is must not silence the rest.
+        // If memory runs out for one message, the next connection still brings the others.
         const bool survived = guarded("status connection", false, [&] {
             followConnection(pipe.get(), stopCheck);
             return true;
@@ -100,12 +101,12 @@ void listenToStatus(const StopCheck& stopCheck)
         pipe = FileHandle();
         if (stopCheck())
             return;
-        // The next attempt follows at once, unless this one has logged an error: its cause is likely still there. A
-        // peer that hangs up before the first pause of the reader must not make that a busy loop.
+        // Reconnects at once, but waits after an exception, whose cause probably persists, and pauses after a peer that
+        // hung up before the reader's first pause: that would be a busy loop.
         if (!survived)
             waitForRetry(stopCheck);
         else if (GetTickCount() == start)
-            Sleep(kHangUpMilliseconds);
+            Sleep(kHangUpMs);
     }
 }
 

@@ -7,20 +7,20 @@
 
 namespace tavi {
 
-// The process-wide picture of the running transfer, made on first use; lives as long as the module is loaded. Any
+// Returns the transfer status of the process. The first call creates it; it lives until the module is unmapped. Any
 // thread.
 TransferStatus& transferStatus();
 
-// Where messages go once the status has taken them: owns what it is given. Called on the listener's thread, which must
-// not be made to wait. Null: nowhere.
+// Receives each message after the status has applied it, on the listener's thread, and must not wait.
 using MessageSink = void (*)(std::unique_ptr<PipeMessage> message);
+// With null, messages are destroyed instead.
 void setMessageSink(MessageSink sink) noexcept;
 
-// Applies one message to the status and passes it on.
+// Applies a message to the status and passes it to the sink.
 void dispatch(std::unique_ptr<PipeMessage> message);
 
-// The listener's thread routine: keeps the service's status pipe open and dispatches what arrives until the check says
-// stop.
+// Runs the listener: connects to the service's status pipe again and again and dispatches its messages, until the check
+// returns true.
 void listenToStatus(const StopCheck& stopCheck);
 
 } // namespace tavi

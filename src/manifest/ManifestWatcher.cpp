@@ -23,7 +23,7 @@ ManifestRef readStoredManifest()
 {
     try {
         DbConnection database;
-        database.open(getDataFilePath(kStateDatabase));
+        database.open(getDataFilePath(DataFile::stateDatabase));
         DbQuery rows = database.execQuery("SELECT contents FROM manifest LIMIT 1");
         if (rows.nextRow()) {
             const char* blob = nullptr;

@@ -54,7 +54,7 @@ void RestoreRequestWriter::open()
 {
     try {
         connection_ = std::make_unique<DbConnection>();
-        connection_->open(getDataFilePath(kStateDatabase));
+        connection_->open(getDataFilePath(DataFile::stateDatabase));
         transaction_.emplace(*connection_);
     } catch (const DbException& error) {
         wxLogError("Failed to open state db for restores: %s", error.message());

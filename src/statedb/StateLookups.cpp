@@ -21,7 +21,7 @@ CriticalSection fileStateLock;
 
 FolderStateTable::FolderStateTable()
 {
-    connection_.open(getConfigFilePath(kConfigDatabase));
+    connection_.open(getConfigFilePath(ConfigFile::database));
     select_ = connection_.compileStatement(kFolderSelect);
     // Prepared but never run: this fails at once for a table without these columns.
     replace_ = connection_.compileStatement(kFolderReplace);
@@ -92,7 +92,7 @@ std::int32_t FileStateLookup::getFileState(const wxString& path)
     if (!connection_) {
         try {
             auto connection = std::make_unique<DbConnection>();
-            connection->open(getDataFilePath(kStateDatabase));
+            connection->open(getDataFilePath(DataFile::stateDatabase));
             connection_ = std::move(connection);
         } catch (const DbException& error) {
             wxLogError("Failed to open file-state db (%d: %s)", error.code(), error.message());
