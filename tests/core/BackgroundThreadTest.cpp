@@ -1,7 +1,5 @@
 #include "core/BackgroundThread.h"
 
-#include <stdexcept>
-
 #include <gtest/gtest.h>
 #include <wx/log.h>
 
@@ -23,17 +21,17 @@ BackgroundThread subject("test", [](const BackgroundThread& self) {
     WaitForSingleObject(leave.get(), 10000);
     sawStop = self.isStopping();
     if (body == 3)
-        throw std::runtime_error("a failing body");
+        throw 1;
 });
 
-TEST(BackgroundThread, ExistsOnceAndTakesAStopRequestBack)
+TEST(BackgroundThread, RunsOnceAndItsStopCanBeWithdrawn)
 {
     subject.requestStop(); // nothing to stop
     subject.start();
     subject.start();
     ASSERT_EQ(WaitForSingleObject(entered.get(), 10000), WAIT_OBJECT_0);
 
-    // Withdrawn before the body has looked: it never notices, and runs again since it has returned all the same.
+    // A stop withdrawn before the body has looked at it: the body runs again, because it returned.
     const DWORD first = thread;
     subject.requestStop();
     EXPECT_TRUE(subject.isStopping());
@@ -45,7 +43,7 @@ TEST(BackgroundThread, ExistsOnceAndTakesAStopRequestBack)
     EXPECT_EQ(thread, first) << "a second thread would compete with the first";
     subject.requestStop();
 
-    // One that has ended, by request or by a failure, is started anew.
+    // Once the thread has ended, by request or by an exception, it can be started again.
     const wxLogNull quiet;
     for (int body = 2; body <= 3; ++body) {
         const KernelHandle ended(subject.releaseHandle());

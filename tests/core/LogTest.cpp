@@ -15,7 +15,7 @@
 namespace tavi {
 namespace {
 
-// The lines with "@" for their times, while the log is still open: what is written must be there at once.
+// Returns the lines with "@" for their times. The log is still open: each line is in the file at once.
 std::vector<std::string> linesOf(const std::wstring& path)
 {
     std::ifstream file(toUtf8(path));
@@ -26,25 +26,35 @@ std::vector<std::string> linesOf(const std::wstring& path)
     return lines;
 }
 
-TEST(Log, LinesOfAnyThreadReachTheFileAtOnceOrThePreviousTarget)
-{
+struct Log : testing::Test {
+    ~Log() override
+    {
+        closeLog();
+        wxLog::SetLogLevel(levelBefore);
+    }
     const unsigned long levelBefore = wxLog::GetLogLevel();
     test::InstalledService service;
-    ASSERT_TRUE(openLog(3));
+    const std::wstring path = service.file(L"tavi.log");
+};
 
+TEST_F(Log, LinesAreInTheFileAtOnce)
+{
+    ASSERT_TRUE(openLog(3));
     wxLogWarning("at once: %d", 7);
     wxLogInfo("Attaching to %s", "nobody");
     wxLogError("%s", wxString(L'x', 5000));
     EXPECT_EQ(guarded("another", 4, []() -> int { throw 1; }), 4);
-    const std::vector<std::string> expected = {"@ Warning: at once: 7", "@ Error: " + std::string(4095, 'x'),
+    const std::string longest(4095, 'x');
+    const std::vector<std::string> expected = {"@ Warning: at once: 7", "@ Error: " + longest,
                                                "@ Error: Unhandled exception in another"};
-    const std::wstring path = service.file(L"tavi.log");
     EXPECT_EQ(linesOf(path), expected);
+    closeLog();
+    EXPECT_TRUE(DeleteFileW(path.c_str()));
+}
 
-    {
-        const LogSilencer outer, inner;
-    }
-    EXPECT_TRUE(wxLog::IsEnabled()) << "silences that overlap must not leave the log off";
+TEST_F(Log, LinesOfManyThreadsStayWhole)
+{
+    ASSERT_TRUE(openLog(3));
     std::thread threads[3];
     for (std::thread& thread : threads)
         thread = std::thread([] {
@@ -55,31 +65,37 @@ TEST(Log, LinesOfAnyThreadReachTheFileAtOnceOrThePreviousTarget)
         thread.join();
     const auto lines = linesOf(path);
     EXPECT_EQ(std::count(lines.begin(), lines.end(), "@ Error: " + std::string(1000, 'm') + "."), 150);
-    // Wherever memory runs out the boundary holds.
+}
+
+TEST_F(Log, BoundaryHoldsIfMemoryRunsOut)
+{
+    ASSERT_TRUE(openLog(3));
     for (int succeeding = 0; succeeding < 100; ++succeeding) {
         const test::FailingAllocations few(succeeding);
         guarded("need", [] { throw std::runtime_error("is known"); });
     }
     EXPECT_EQ(linesOf(path).back(), "@ Error: Unhandled exception in need: is known");
-    closeLog();
-    EXPECT_TRUE(DeleteFileW(path.c_str()));
+}
 
-    // Without a file the previous target goes on.
+TEST_F(Log, KeepsThePreviousTargetIfTheFileCannotBeOpened)
+{
+    {
+        const LogSilencer outer, inner;
+    }
+    EXPECT_TRUE(wxLog::IsEnabled()) << "silencers that overlap must not leave the log off";
     service.install().SetValue(L"DataPath", wxString(L"C:\\no such folder"));
     test::LogCapture log;
     wxLog* const target = wxLog::GetActiveTarget();
     EXPECT_TRUE(openLog(3));
     EXPECT_NE(log.take().at(0).find("Unable to open logfile C:\\no such folder\\tavi.log"), std::string::npos);
-    // The library's target of last resort would open a message box in the host.
+    // wxWidgets' own target would open a message box in the host.
     wxLog::SetActiveTarget(nullptr);
     EXPECT_EQ(wxLog::GetActiveTarget(), nullptr);
     wxLog::SetActiveTarget(target);
-    wxLog::SetLogLevel(levelBefore);
 }
 
-TEST(Log, WaitsThirtySecondsForTheDataDirectory)
+TEST_F(Log, WaitsThirtySecondsForTheDataDirectory)
 {
-    test::InstalledService service;
     service.install().DeleteValue(L"DataPath");
     for (const std::size_t installedAfter : {31u, 30u}) {
         std::vector<unsigned long> sleeps;
@@ -91,8 +107,6 @@ TEST(Log, WaitsThirtySecondsForTheDataDirectory)
         EXPECT_EQ(openLog(wxLOG_Max, sleep), installedAfter == 30);
         EXPECT_EQ(sleeps, std::vector<unsigned long>(30, 1000));
     }
-    closeLog();
-    EXPECT_TRUE(DeleteFileW(service.file(L"tavi.log").c_str()));
 }
 
 } // namespace

@@ -21,7 +21,7 @@ std::size_t busyBlocks()
     return blocks;
 }
 
-TEST(ThreadLocals, BelongToTheirThreadAndGoWithIt)
+TEST(ThreadLocals, BelongToTheirThreadAndAreFreedWithIt)
 {
     const auto use = [] {
         SetLastError(ERROR_BUSY);

@@ -1,6 +1,5 @@
 #pragma once
 
-#include <algorithm>
 #include <string>
 
 #include "link/PipeMessage.h"
@@ -8,13 +7,12 @@
 // Messages and frames in short form.
 namespace tavi::test {
 
-// Converts two hexadecimal digits per byte, with blanks anywhere.
-inline std::string bytes(std::string digits)
+// Converts two hexadecimal digits per byte, with blanks between bytes.
+inline std::string bytes(const std::string& digits)
 {
-    digits.erase(std::remove(digits.begin(), digits.end(), ' '), digits.end());
     std::string out;
-    for (std::size_t i = 0; i < digits.size(); i += 2)
-        out += static_cast<char>(std::stoi(digits.substr(i, 2), nullptr, 16));
+    for (std::size_t at = 0; (at = digits.find_first_not_of(' ', at)) != std::string::npos; at += 2)
+        out += static_cast<char>(std::stoi(digits.substr(at, 2), nullptr, 16));
     return out;
 }
 
@@ -23,8 +21,7 @@ inline MessageText text(const wxString& content)
     return std::make_shared<const wxString>(content);
 }
 
-inline std::unique_ptr<EventMessage> event(EventType type, std::uint64_t value = 0,
-                                           const wxString& content = wxString(), std::uint32_t flag = 0)
+inline auto event(EventType type, std::uint64_t value = 0, const wxString& content = wxString(), std::uint32_t flag = 0)
 {
     return std::make_unique<EventMessage>(type, 0, value, flag, text(content));
 }

@@ -1,6 +1,7 @@
 #include "link/MessageReader.h"
 
 #include <algorithm>
+#include <deque>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -13,15 +14,15 @@ namespace {
 using test::bytes;
 
 // A peer that sends the parts one after the other, then closes the pipe. At an empty part one look finds nothing.
-class Peer : public ByteSource {
-  public:
-    explicit Peer(std::vector<std::string> parts) : parts_(std::move(parts)) {}
+struct Peer : ByteSource {
+    explicit Peer(const std::vector<std::string>& sent) : parts(sent.begin(), sent.end()) {}
     bool peek(std::uint32_t& available) override
     {
-        if (at_ == parts_.size())
+        if (parts.empty())
             return false;
-        available = static_cast<std::uint32_t>(parts_[at_].size());
-        at_ += parts_[at_].empty();
+        available = static_cast<std::uint32_t>(parts[0].size());
+        if (available == 0)
+            parts.pop_front();
         return true;
     }
     void pause() override
@@ -31,20 +32,16 @@ class Peer : public ByteSource {
     bool read(unsigned char* into, std::uint32_t size) override
     {
         largestRead = std::max(largestRead, size);
-        if (at_ == parts_.size())
+        if (parts.empty())
             return false;
-        std::string& part = parts_[at_];
-        part.erase(0, part.copy(reinterpret_cast<char*>(into), size));
-        at_ += part.empty();
+        parts[0].erase(0, parts[0].copy(reinterpret_cast<char*>(into), size));
+        if (parts[0].empty())
+            parts.pop_front();
         return true;
     }
-
+    std::deque<std::string> parts;
     int pauses = 0;
     std::uint32_t largestRead = 0;
-
-  private:
-    std::vector<std::string> parts_;
-    std::size_t at_ = 0;
 };
 
 const std::string kHead = bytes("34000000 14000000"), kBody(20, '\0');

@@ -30,7 +30,7 @@ class RestoreRequests : public testing::Test {
         EXPECT_TRUE(request.selectedPaths.empty());
         return log_.takeText();
     }
-    // By default of all rows.
+    // Runs the query; by default counts all rows.
     int count(const char* sql = "SELECT (SELECT count(*) FROM restores)+(SELECT count(*) FROM restore_files)")
     {
         DbQuery rows = database_.execQuery(sql);
@@ -45,15 +45,14 @@ class RestoreRequests : public testing::Test {
                         L"C:\\gone\\c\n100:1:2:6:0:x:0:41");
 };
 
-TEST_F(RestoreRequests, StandInTheDatabaseAsOneTransaction)
+TEST_F(RestoreRequests, AreStoredWithTheirFiles)
 {
     const auto start = static_cast<int>(std::time(nullptr));
     EXPECT_EQ(perform(L"C:\\one"), "");
     EXPECT_EQ(perform(L"C:\\nothing there"), "");
-    EXPECT_EQ(count(), 2 + 2); // a request without files is stored as well
-    // The time of writing, not of the version.
-    EXPECT_GE(count("SELECT min(request_time) FROM restores"), start);
-    // Times are bound as signed 32-bit numbers, attributes are octal in the manifest.
+    EXPECT_EQ(count(), 2 + 2);                                         // a request without files is stored as well
+    EXPECT_GE(count("SELECT min(request_time) FROM restores"), start); // not the time of the version
+    // Times are stored as signed 32-bit numbers; attributes are octal in the manifest.
     EXPECT_EQ(count("SELECT count(*) FROM restores JOIN restore_files ON restores.rowid=restore_id WHERE "
                     "machine_id='id' AND machine_alias='alias' AND encryption_key='key' AND "
                     "manifest_path='C:\\one\\a.txt' AND file_size=5 AND timestamp=100 AND ctime=-294967296 AND "
@@ -61,9 +60,9 @@ TEST_F(RestoreRequests, StandInTheDatabaseAsOneTransaction)
               1);
 }
 
-TEST_F(RestoreRequests, AFailureLeavesNothingHalfWrittenAndOneLine)
+TEST_F(RestoreRequests, AreRolledBackAfterAFailureOfAnyKind)
 {
-    // After the second SQLite has rolled back by itself.
+    // ROLLBACK: SQLite has ended the transaction by itself.
     for (const char* const failure : {"ABORT", "ROLLBACK"}) {
         database_.execDML("CREATE TRIGGER t BEFORE INSERT ON restore_files WHEN new.manifest_path LIKE '%b.txt' "
                           "BEGIN SELECT RAISE(" +
@@ -72,30 +71,33 @@ TEST_F(RestoreRequests, AFailureLeavesNothingHalfWrittenAndOneLine)
         database_.execDML("DROP TRIGGER t");
         EXPECT_EQ(count(), 0) << failure;
     }
-    // Another transaction in the way, for a minute: a reader of the commit, a writer of the first row.
+    service_.install().SetValue(L"DataPath", wxString(L"C:\\no such folder"));
+    EXPECT_EQ(perform(L"C:\\one"),
+              "1: Error: Failed to open state db for restores: DB_CANTOPEN[14]: unable to open database file");
+}
+
+TEST_F(RestoreRequests, WaitAMinuteForOtherTransactions)
+{
     static int waited;
     sqlite3_vfs* const system = sqlite3_vfs_find(nullptr);
     const auto sleep = std::exchange(system->xSleep, [](sqlite3_vfs*, int microseconds) {
         waited += microseconds;
         return microseconds;
     });
+    // A reader blocks the commit, a writer the first row.
     for (const auto mode : {TransactionMode::plain, TransactionMode::immediate}) {
-        database_.beginTransaction(mode);
+        const Transaction other(database_, mode);
         EXPECT_EQ(count(), 0);
         waited = 0;
         EXPECT_EQ(perform(L"C:\\one"), "1: Error: Error requesting restore: DB_BUSY[5]: database is locked");
         EXPECT_EQ(waited, 60000000);
-        database_.commitTransaction();
-        EXPECT_EQ(count(), 0) << static_cast<int>(mode);
+        EXPECT_EQ(count(), 0);
     }
     system->xSleep = sleep;
-    service_.install().SetValue(L"DataPath", wxString(L"C:\\no such folder"));
-    EXPECT_EQ(perform(L"C:\\one"),
-              "1: Error: Failed to open state db for restores: DB_CANTOPEN[14]: unable to open database file");
 }
 
-// SQLite's memory runs out at each point in turn and is back at once, somewhat later or never.
-TEST_F(RestoreRequests, AreWholeOrAbsentWhereMemoryRunsOut)
+// SQLite's memory runs out at each point in turn, for one allocation, for a few or for good.
+TEST_F(RestoreRequests, AreWholeOrAbsentIfMemoryRunsOut)
 {
     std::set<std::string> logged;
     for (const int failures : {1, 4, 1 << 30}) {

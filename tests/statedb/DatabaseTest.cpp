@@ -9,7 +9,7 @@
 namespace tavi {
 namespace {
 
-// What the action throws, as the text that goes into the log.
+// Returns the message of the exception that the action throws.
 template <class Action>
 wxString thrownBy(Action action)
 {
@@ -35,22 +35,18 @@ TEST(Database, ReportsMisuseAndFailures)
     DbConnection connection = opened();
     connection.execDML("INSERT INTO t(b) VALUES(1),(-9223372036854775807-1)");
     DbStatement insert = connection.compileStatement("INSERT INTO t VALUES(1,?)");
-    DbQuery one = connection.execQuery("SELECT a FROM t");
-    const char* text = nullptr;
     DbStatement select = connection.compileStatement("SELECT abs(b) FROM t ORDER BY a");
     DbQuery failing = select.execQuery();
     EXPECT_TRUE(failing.nextRow());
-    const DbStatement late = connection.compileStatement("SELECT 1");
-    // In this order. A row that fails empties its statement and cursor; a statement may outlive its connection.
+    // In this order: a row that fails invalidates its statement and cursor.
     const std::pair<wxString, std::function<void()>> cases[] = {
         {L"WDB_ERROR[1000]: No Database opened", [] { DbStatement().execDML(); }},
         {L"WDB_ERROR[1000]: Statement not accessible", [&] { connection.compileStatement("").execDML(); }},
-        {L"WDB_ERROR[1000]: Invalid field index", [&] { one.fieldText(-1, text); }},
-        {L"WDB_ERROR[1000]: Invalid field index", [&] { one.fieldInt(1, 0); }},
-        {L"DB_ERROR[1]: ", [&] { connection.compileStatement("SELEC"); }}, // the detail is left empty on purpose
+        {L"WDB_ERROR[1000]: Invalid field index", [&] { failing.fieldInt(-1, 0); }},
+        {L"WDB_ERROR[1000]: Invalid field index", [&] { failing.fieldInt(1, 0); }},
+        {L"DB_ERROR[1]: ", [&] { connection.compileStatement("SELEC"); }}, // deliberately without detail
         {L"DB_ERROR[1]: near \"\xE9\": syntax error", [&] { connection.execDML(wxString(L"\xE9 x")); }},
         {L"DB_RANGE[25]: Error binding string param", [&] { insert.bind(3, wxString(L"x")); }},
-        {L"DB_RANGE[25]: Error binding int64 param", [&] { insert.bind(9, std::int64_t{1}); }},
         {L"DB_CONSTRAINT[19]: UNIQUE constraint failed: t.a", [&] { insert.execDML(); }},
         {L"DB_CANTOPEN[14]: unable to open database file", [] { DbConnection().open(L"/no such folder/x.db"); }},
         {L"DB_ERROR[1]: integer overflow", [&] { failing.nextRow(); }},
@@ -58,12 +54,12 @@ TEST(Database, ReportsMisuseAndFailures)
     };
     for (const auto& [expected, action] : cases)
         EXPECT_EQ(thrownBy(action), expected);
-    connection.close();
+    connection.close(); // before its statements
     EXPECT_EQ(thrownBy([&] { connection.execDML("SELECT 1"); }), L"WDB_ERROR[1000]: No Database opened");
 }
 
-#ifdef _WIN32 // The native tests use the system's library.
-TEST(Database, TrustsNeitherSchemaNorPages)
+#ifdef _WIN32 // The native tests use the system's SQLite.
+TEST(Database, ChecksPagesAndProtectsTheSchema)
 {
     DbConnection connection = opened();
     EXPECT_EQ(connection.execQuery("PRAGMA trusted_schema").fieldInt(0, -1), 0);
@@ -74,31 +70,43 @@ TEST(Database, TrustsNeitherSchemaNorPages)
 }
 #endif
 
-TEST(Database, WalksRowsAndKeepsBindings)
+TEST(Database, ReadsRowsAndKeepsBindings)
 {
     DbConnection connection = opened();
     DbStatement insert = connection.compileStatement("INSERT INTO t(b) VALUES(?)");
     insert.bind(1, wxString(L"\x65E5\xE9"));
-    EXPECT_EQ(insert.execDML(), 1);
-    EXPECT_EQ(insert.execDML(), 1); // the last binding again
-    insert.bind(1, std::int64_t{0x7FFFFFFFFFFFFFFF});
     insert.execDML();
+    insert.execDML(); // the last binding again
+    insert.bind(1, std::int64_t{0x7FFFFFFFFFFFFFFF});
+    EXPECT_EQ(insert.execDML(), 1);
     EXPECT_EQ(connection.lastRowId(), 3);
-    connection.execDML("INSERT INTO t(b) VALUES(''),(NULL),(x'6100C3A9')");
-    EXPECT_EQ(connection.execDML("UPDATE t SET a=a"), 6);
-
-    DbQuery rows = connection.execQuery("SELECT b, a FROM t ORDER BY a");
-    std::string found;
-    while (rows.nextRow()) {
+    EXPECT_EQ(connection.execDML("INSERT INTO t(b) VALUES(''),(NULL),(x'6100C3A9')"), 3);
+    DbQuery rows = connection.execQuery("SELECT b FROM t ORDER BY a");
+    using namespace std::string_literals;
+    const std::pair<int, std::string> expected[] = {
+        {3, "\xE6\x97\xA5\xC3\xA9"}, {3, "\xE6\x97\xA5\xC3\xA9"}, {1, "9223372036854775807"}, {3, ""}, {5, ""},
+        {4, "a\0\xC3\xA9"s}};
+    for (const auto& [type, content] : expected) {
         const char* text = nullptr;
-        const int type = rows.fieldType(0); // before the text is asked for, which converts
-        const int length = rows.fieldText(0, text);
-        found += std::to_string(type) + ":" + std::string(text ? text : "", static_cast<std::size_t>(length)) + ", ";
+        ASSERT_TRUE(rows.nextRow());
+        EXPECT_EQ(rows.fieldType(0), type);
+        const auto length = static_cast<std::size_t>(rows.fieldText(0, text));
+        EXPECT_EQ(std::string(text ? text : "", length), content);
         EXPECT_EQ(rows.fieldInt(0, 42) == 42, type == 5);
     }
-    EXPECT_FALSE(rows.nextRow()); // it stays at the end
-    using namespace std::string_literals;
-    EXPECT_EQ(found, "3:\xE6\x97\xA5\xC3\xA9, 3:\xE6\x97\xA5\xC3\xA9, 1:9223372036854775807, 3:, 5:, 4:a\0\xC3\xA9, "s);
+    EXPECT_FALSE(rows.nextRow() || rows.nextRow());
+}
+
+TEST(Database, TransactionsEndWithTheirScope)
+{
+    DbConnection connection = opened();
+    for (const bool commits : {true, false}) {
+        Transaction transaction(connection, TransactionMode::immediate);
+        connection.execDML("INSERT INTO t DEFAULT VALUES");
+        if (commits)
+            transaction.commit();
+    }
+    EXPECT_EQ(connection.execQuery("SELECT count(*) FROM t").fieldInt(0, -1), 1);
 }
 
 } // namespace

@@ -33,16 +33,16 @@ TEST(StateLookups, FoldersInheritFromTheNearestRecordedOne)
     EXPECT_EQ(stateOf(L"C:\\null"), 0);
     EXPECT_EQ(stateOf(L"D:\\any"), 4);
 
-    // Held open, but not locked: the service must be able to write.
+    // Connected, but not locked: the service can write.
     EXPECT_EQ(writer.execDML("UPDATE filesystem SET state=5 WHERE folder='C:\\s6'"), 1);
     EXPECT_EQ(stateOf(L"C:\\s6"), 5);
     EXPECT_EQ(stateOf(L"C:\\s6\\x"), 7);
     writer.execDML("UPDATE filesystem SET state=2 WHERE folder='C:\\s6'");
     std::optional<FolderStateTable::ReadScope> reading(std::in_place, states);
-    EXPECT_EQ(stateOf(L"C:\\s6\\x"), 8); // not what was so before
+    EXPECT_EQ(stateOf(L"C:\\s6\\x"), 8) << "the state before is not remembered";
     EXPECT_EQ(stateOf(L"C:\\s4\\y"), 4);
     {
-        const test::FailingAllocations failing(0);
+        const test::FailingAllocations failing(0); // the end unlocks without memory
         reading.reset();
     }
     EXPECT_EQ(writer.execDML("UPDATE filesystem SET state=5 WHERE folder='C:\\s6'"), 1);
