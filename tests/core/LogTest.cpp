@@ -44,10 +44,8 @@ TEST_F(Log, LinesAreInTheFileAtOnce)
     wxLogInfo("Attaching to %s", "nobody");
     wxLogError("%s", wxString(L'x', 5000));
     EXPECT_EQ(guarded("another", 4, []() -> int { throw 1; }), 4);
-    const std::string longest(4095, 'x');
-    const std::vector<std::string> expected = {"@ Warning: at once: 7", "@ Error: " + longest,
-                                               "@ Error: Unhandled exception in another"};
-    EXPECT_EQ(linesOf(path), expected);
+    EXPECT_EQ(linesOf(path), (std::vector<std::string>{"@ Warning: at once: 7", "@ Error: " + std::string(4095, 'x'),
+                                                       "@ Error: Unhandled exception in another"}));
     closeLog();
     EXPECT_TRUE(DeleteFileW(path.c_str()));
 }

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <deque>
+#include <tuple>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -48,13 +49,8 @@ const std::string kHead = bytes("34000000 14000000"), kBody(20, '\0');
 
 TEST(MessageReader, ReadsOneFrameOrNone)
 {
-    const struct {
-        const char* what;
-        std::vector<std::string> parts;
-        bool isRead;
-        int pauses;
-        std::uint32_t largestRead;
-    } cases[] = {
+    // What the peer sends, whether there is a message, the pauses and the largest read.
+    const std::tuple<const char*, std::vector<std::string>, bool, int, std::uint32_t> cases[] = {
         {"a frame", {kHead + kBody}, true, 1, 20},
         {"a frame in two parts", {kHead, "", kBody}, true, 2, 20},
         {"a payload cut short, the rest reading as zeros", {kHead, kBody.substr(0, 3), "x"}, true, 1, 20},
@@ -66,11 +62,10 @@ TEST(MessageReader, ReadsOneFrameOrNone)
         {"a length of 0xffffffff", {bytes("34000000 ffffffff") + kBody}, true, 1, 1024},
         {"a length that is there", {bytes("34000000 00002000") + std::string(0x200000, '\0')}, true, 1, 0x200000},
     };
-    for (const auto& test : cases) {
-        Peer peer(test.parts);
-        EXPECT_EQ(readFrame(peer, nullptr) != nullptr, test.isRead) << test.what;
-        EXPECT_EQ(peer.pauses, test.pauses) << test.what;
-        EXPECT_EQ(peer.largestRead, test.largestRead) << test.what;
+    for (const auto& [what, parts, isRead, pauses, largestRead] : cases) {
+        Peer peer(parts);
+        EXPECT_EQ(readFrame(peer, nullptr) != nullptr, isRead) << what;
+        EXPECT_TRUE(peer.pauses == pauses && peer.largestRead == largestRead) << what;
     }
 }
 

@@ -3,6 +3,7 @@
 #include <cmath>
 #include <optional>
 #include <thread>
+#include <tuple>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -21,16 +22,13 @@ std::uint32_t tick()
     return now;
 }
 
-void apply(TransferStatus& status, EventType type, std::uint64_t value = 90, const wxString& text = "new")
+// Applies events of these types, one a second, as samples.
+void apply(TransferStatus& status, const std::vector<EventType>& types, std::uint64_t value = 90)
 {
-    now += 1000;
-    status.apply(*event(type, value, text, 1));
-}
-
-void applyAll(TransferStatus& status, const std::vector<EventType>& types)
-{
-    for (const EventType type : types)
-        apply(status, type);
+    for (const EventType type : types) {
+        now += 1000;
+        status.apply(*event(type, value, "new", 1));
+    }
 }
 
 // The fields that are not 0: flags, texts by length, amounts, rings by bytes per second, and rates.
@@ -61,36 +59,33 @@ std::string contents(const TransferStatus& s)
 const std::vector<EventType> kBackup = {E::moreA, E::moreB,      E::doneA,      E::doneB,      E::textA,
                                         E::textB, E::switch24On, E::switch32On, E::switch34On, E::switch39On};
 const std::vector<EventType> kRestore = {E::restoreStarted, E::restoreTotal, E::restoreDone, E::restoreItem};
-const std::string kBackupIs =
-    "on24 on32 on34 on39 textA=3 textB=3 doneA=90 totalA=90 doneB=90 totalB=90 ringA=30 ringB=22 ";
+const std::string kAmounts = "doneA=90 totalA=90 doneB=90 totalB=90 ringA=30 ringB=22 ";
+const std::string kBackupContents = "on24 on32 on34 on39 textA=3 textB=3 " + kAmounts;
 
 TEST(TransferStatus, EventsChangeTheirFieldsOnly)
 {
-    const struct {
-        std::vector<EventType> before, types;
-        std::string contents;
-    } cases[] = {
-        {kBackup, {E::ignored7, E::ignored15}, kBackupIs},
-        {kBackup,
-         {E::switch24Off, E::switch34Off, E::textBEnded},
-         "on32 on39 textA=3 doneA=90 totalA=90 doneB=90 totalB=90 ringA=30 ringB=22 "},
-        {kBackup,
-         {E::switch32Off, E::switch39Off, E::textAEnded},
-         "on24 on34 textB=3 doneA=90 totalA=90 doneB=90 totalB=90 ringA=30 ringB=22 "},
-        {{}, {E::doneA, E::doneB}, "ringA=90 ringB=45 "}, // beyond the total an amount is a sample only
-        {{}, {E::moreA, E::moreA, E::moreB}, "totalA=180 totalB=90 "},
-        {kBackup, {E::backupEnded10}, "ended ended10 mark10 totalA=90 totalB=90 "},
-        {{E::backupEnded10}, {E::mark10Off}, "ended ended10 totalA=90 totalB=90 "},
-        {kRestore, {}, "started item=3 done=90 total=90 ring=45 "},
-        {kRestore, {E::restoreItemEnded, E::restoreMore, E::restoreDone}, "started done=180 total=180 ring=30 "},
-        {kRestore, {E::restoreStarted}, "started "},
-        {kRestore, {E::restoreEnded}, ""},
+    const std::tuple<const char*, std::vector<EventType>, std::vector<EventType>, std::string> cases[] = {
+        {"nothing", kBackup, {E::ignored7, E::ignored15}, kBackupContents},
+        {"off", kBackup, {E::switch24Off, E::switch34Off, E::textBEnded}, "on32 on39 textA=3 " + kAmounts},
+        {"other off", kBackup, {E::switch32Off, E::switch39Off, E::textAEnded}, "on24 on34 textB=3 " + kAmounts},
+        {"samples beyond the total", {}, {E::doneA, E::doneB}, "ringA=90 ringB=45 "},
+        {"totals", {}, {E::moreA, E::moreA, E::moreB}, "totalA=180 totalB=90 "},
+        {"end with totals", kBackup, {E::backupEnded10}, "ended ended10 mark10 totalA=90 totalB=90 "},
+        {"mark off", {E::backupEnded10}, {E::mark10Off}, "ended ended10 totalA=90 totalB=90 "},
+        {"restore", kRestore, {}, "started item=3 done=90 total=90 ring=45 "},
+        {"end of item", kRestore, {E::restoreItemEnded}, "started done=90 total=90 ring=45 "},
+        {"new total",
+         {E::restoreTotal},
+         {E::restoreTotal, E::restoreMore, E::restoreDone},
+         "done=90 total=180 ring=22 "},
+        {"next restore", kRestore, {E::restoreStarted}, "started "},
+        {"end of restore", kRestore, {E::restoreEnded}, ""},
     };
-    for (const auto& test : cases) {
+    for (const auto& [what, before, types, expected] : cases) {
         TransferStatus status(true, tick);
-        applyAll(status, test.before);
-        applyAll(status, test.types);
-        EXPECT_EQ(contents(status), test.contents);
+        apply(status, before);
+        apply(status, types);
+        EXPECT_EQ(contents(status), expected) << what;
     }
     TransferStatus status(true, tick);
     now += 1000;
@@ -107,15 +102,15 @@ TEST(TransferStatus, TheEndOfABackupLeavesItsOutcomeAndTheRestore)
 {
     TransferStatus status(true, tick);
     status.rate0 = status.rate1 = status.rate2 = status.restoreRateShort = status.restoreRateLong = 1;
-    applyAll(status, kBackup);
-    apply(status, E::restoreTotal);
+    apply(status, kBackup);
+    apply(status, {E::restoreTotal});
     for (const std::uint32_t type : {10u, 9u, 8u, 6u, 5u, 4u, 3u, 2u, 1u, 0u}) {
-        apply(status, E{type});
+        apply(status, {E{type}});
         EXPECT_EQ(contents(status), kEnds[type] + (type == 10 ? "totalA=90 totalB=90 " : "") + "total=90 short long ");
     }
-    applyAll(status, kBackup);
-    apply(status, E::restoreEnded);
-    EXPECT_EQ(contents(status), "ended " + kBackupIs);
+    apply(status, kBackup);
+    apply(status, {E::restoreEnded});
+    EXPECT_EQ(contents(status), "ended " + kBackupContents);
 }
 
 TEST(TransferStatus, SnapshotsReplaceTheState)
@@ -123,8 +118,8 @@ TEST(TransferStatus, SnapshotsReplaceTheState)
     for (const std::uint32_t state : {0u, 1u, 2u, 3u, 4u, 5u, 6u, 7u, 8u, 9u, 10u, 51u, 52u}) {
         TransferStatus status(true, tick);
         status.rate0 = status.rate1 = status.rate2 = status.restoreRateShort = status.restoreRateLong = 1;
-        applyAll(status, {E::switch24On, E::moreB, E::textA, E::textB, E::doneA, E::doneB, E::restoreTotal,
-                          E::restoreItem, E::restoreDone});
+        apply(status, {E::switch24On, E::moreB, E::textA, E::textB, E::doneA, E::doneB, E::restoreTotal, E::restoreItem,
+                       E::restoreDone});
         status.apply(SnapshotMessage(state, 5, 2, 3, 4));
         const std::string flags = state == 51   ? "on24 started "
                                   : state == 52 ? "on24 "
@@ -137,11 +132,11 @@ TEST(TransferStatus, SnapshotsReplaceTheState)
 TEST(TransferStatus, AmountsThatMakeNoSenseStayDefined)
 {
     TransferStatus status(false, tick);
-    apply(status, E::restoreTotal, 1ull << 63);
-    apply(status, E::restoreDone, 5);
+    apply(status, {E::restoreTotal}, 1ull << 63);
+    apply(status, {E::restoreDone}, 5);
     EXPECT_EQ(status.restoreDone, INT64_MIN) << "the sum is larger than the total";
-    apply(status, E::restoreTotal, UINT64_MAX);
-    apply(status, E::restoreMore, 2);
+    apply(status, {E::restoreTotal}, UINT64_MAX);
+    apply(status, {E::restoreMore}, 2);
     EXPECT_EQ(status.barPosition(), INT32_MIN);
     EXPECT_EQ(contents(status).find("ring"), std::string::npos) << "sampling is off";
 }
@@ -176,7 +171,7 @@ TEST(TransferStatus, EstimatesNeedARateOfAKilobit)
         {3 << 20, 999.0F, {}},   {3 << 20, 1000.9F, 25165u},           {3 << 20, NAN, {}},
         {3 << 20, INFINITY, 0u}, {0x100000001ull * 1000, 8000.0F, 1u}, {0xffffffffull * 1000, 8000.0F, {}}};
     for (const auto& [total, rate, seconds] : cases) {
-        apply(status, E::restoreTotal, total);
+        apply(status, {E::restoreTotal}, total);
         status.restoreRateLong = rate;
         EXPECT_EQ(status.remainingSeconds(), seconds) << rate;
     }
