@@ -97,6 +97,7 @@ TEST(PipeMessage, BuffersGrowByAKilobyteMoreThanNeeded)
         EXPECT_EQ(buffer->data() == nullptr, capacity == 0);
     }
     EXPECT_FALSE(createMessage(52, *buffer));
+    EXPECT_EQ(serialised(*event(E::textA, 0, wxString(L'x', 2000))).size(), 2028u);
 }
 
 } // namespace

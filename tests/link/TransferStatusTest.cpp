@@ -168,8 +168,13 @@ TEST(TransferStatus, EstimatesNeedARateOfAKilobit)
     TransferStatus status(true, tick);
     // Total, bits per second and the estimate. Its quotient keeps 32 bits, whose largest number means unknown.
     const std::tuple<std::uint64_t, float, std::optional<std::uint32_t>> cases[] = {
-        {3 << 20, 999.0F, {}},   {3 << 20, 1000.9F, 25165u},           {3 << 20, NAN, {}},
-        {3 << 20, INFINITY, 0u}, {0x100000001ull * 1000, 8000.0F, 1u}, {0xffffffffull * 1000, 8000.0F, {}}};
+        {3 << 20, 999.0F, {}},
+        {3 << 20, 1000.0F, 25165u},
+        {3 << 20, 1000.9F, 25165u},
+        {3 << 20, NAN, {}},
+        {3 << 20, INFINITY, 0u},
+        {0x100000001ull * 1000, 8000.0F, 1u},
+        {0xffffffffull * 1000, 8000.0F, {}}};
     for (const auto& [total, rate, seconds] : cases) {
         apply(status, {E::restoreTotal}, total);
         status.restoreRateLong = rate;
@@ -183,14 +188,14 @@ TEST(TransferStatus, IsReadWhileItChanges)
     TransferStatus status(true, tick);
     std::thread listener([&] {
         for (std::uint32_t round = 0; round < 50000; ++round)
-            status.apply(*event(E{51 + round % 7}, 1000, wxString(L'a', round % 40), 1));
+            status.apply(*event(E{round % 500 == 0 ? 51 : 53 + round % 5}, 1000, wxString(L'a', round % 40), 1));
         status.apply(SnapshotMessage(7, 1, 2, 3, 4));
     });
     while (status.doneB == 0) {
         status.timerTick();
-        contents(status);
         status.remainingSeconds();
         status.barPosition();
+        status.restoreText.get();
         status.restoreRing.clearRing();
     }
     listener.join();
