@@ -30,9 +30,9 @@ std::optional<Value> readOption(const wchar_t* name, Read read)
 
 std::optional<std::int64_t> readManifestTime()
 {
-    constexpr const wchar_t* name = L"options.manifestmtime";
+    constexpr const wchar_t* kName = L"options.manifestmtime";
     const auto text =
-        readOption<wxString>(name, [&](wxRegKey& key, wxString& value) { return key.QueryValue(name, value); });
+        readOption<wxString>(kName, [&](wxRegKey& key, wxString& value) { return key.QueryValue(kName, value); });
     wxDateTime time;
     wxString::const_iterator end;
     if (!text || !time.ParseDateTime(*text, &end) || !time.IsValid())
@@ -42,9 +42,9 @@ std::optional<std::int64_t> readManifestTime()
 
 std::optional<bool> readGraylistEnabled()
 {
-    constexpr const wchar_t* name = L"options.graylist";
+    constexpr const wchar_t* kName = L"options.graylist";
     const auto number =
-        readOption<long>(name, [&](wxRegKey& key, long& value) { return key.QueryValue(name, &value); });
+        readOption<long>(kName, [&](wxRegKey& key, long& value) { return key.QueryValue(kName, &value); });
     if (!number)
         return std::nullopt;
     return *number != 0;

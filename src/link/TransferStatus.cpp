@@ -282,14 +282,14 @@ void TransferStatus::timerTick() noexcept
 std::optional<std::uint32_t> TransferStatus::remainingSeconds() const noexcept
 {
     // This number of seconds means "unknown".
-    constexpr std::uint32_t unknown = UINT32_MAX;
+    constexpr std::uint32_t kUnknown = UINT32_MAX;
     const double rate = restoreRateLong;
     if (!(rate * 0.001 >= 1.0))
         return std::nullopt;
     const auto left = static_cast<std::uint64_t>(restoreTotal.load()) - static_cast<std::uint64_t>(restoreDone.load());
     const auto bitsPerSecond = std::max<std::uint64_t>(truncated<std::uint64_t>(rate), 1);
     const auto seconds = static_cast<std::uint32_t>(left * 8 / bitsPerSecond);
-    return seconds == unknown ? std::nullopt : std::optional(seconds);
+    return seconds == kUnknown ? std::nullopt : std::optional(seconds);
 }
 
 std::int32_t TransferStatus::barPosition() const noexcept
