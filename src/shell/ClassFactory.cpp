@@ -6,7 +6,7 @@
 
 #include "core/Boundary.h"
 #include "core/Module.h"
-#include "shell/ClassIds.h"
+#include "shell/ComObject.h"
 #include "shell/ShellExt.h"
 #include "shell/StubFolder.h"
 #include "statedb/Database.h"
@@ -14,7 +14,7 @@
 namespace tavi {
 namespace {
 
-// Factories count plainly, not atomically: the shell asks for them one at a time.
+// Not an atomic change: COM asks for factories one at a time and releases each on the thread that asked for it.
 void countPlainly(int change) noexcept
 {
     auto& count = moduleRefCount();
@@ -22,23 +22,15 @@ void countPlainly(int change) noexcept
 }
 
 template <class Object>
-IUnknown* primary(Object* object);
+class ClassFactory final : public ComObject<ClassFactory<Object>, IClassFactory> {
+    using Base = ComObject<ClassFactory, IClassFactory>;
 
-template <>
-IUnknown* primary(ShellExt* object)
-{
-    return static_cast<IShellPropSheetExt*>(object);
-}
-
-template <>
-IUnknown* primary(StubFolder* object)
-{
-    return static_cast<IPersistFolder*>(object);
-}
-
-template <class Object>
-class ClassFactory final : public IClassFactory {
   public:
+    static constexpr typename Base::Answer kInterfaces[] = {
+        {&IID_IUnknown, Base::template tableOf<IClassFactory>},
+        {&IID_IClassFactory, Base::template tableOf<IClassFactory>},
+    };
+
     ClassFactory()
     {
         countPlainly(1);
@@ -50,35 +42,6 @@ class ClassFactory final : public IClassFactory {
         countPlainly(-1);
     }
 
-    STDMETHODIMP QueryInterface(REFIID interfaceId, void** object) override
-    {
-        return guarded("ClassFactory::QueryInterface", E_FAIL, [&]() -> HRESULT {
-            if (!object)
-                return E_POINTER;
-            *object = nullptr;
-            if (!IsEqualIID(interfaceId, IID_IUnknown) && !IsEqualIID(interfaceId, IID_IClassFactory))
-                return E_NOINTERFACE;
-            *object = static_cast<IClassFactory*>(this);
-            AddRef();
-            return S_OK;
-        });
-    }
-
-    STDMETHODIMP_(ULONG) AddRef() override
-    {
-        return guarded("ClassFactory::AddRef", ULONG{1}, [&] { return ++references_; });
-    }
-
-    STDMETHODIMP_(ULONG) Release() override
-    {
-        return guarded("ClassFactory::Release", ULONG{0}, [&] {
-            const ULONG left = --references_;
-            if (left == 0)
-                delete this;
-            return left;
-        });
-    }
-
     STDMETHODIMP CreateInstance(IUnknown* outer, REFIID interfaceId, void** object) override
     {
         return guarded("ClassFactory::CreateInstance", E_FAIL, [&]() -> HRESULT {
@@ -88,11 +51,8 @@ class ClassFactory final : public IClassFactory {
             if (outer)
                 return CLASS_E_NOAGGREGATION;
             try {
-                IUnknown* const made = primary(new Object);
-                made->AddRef();
-                const HRESULT result = made->QueryInterface(interfaceId, object);
-                made->Release();
-                return result;
+                const RefPtr<Object> created(new Object);
+                return created->QueryInterface(interfaceId, object);
             } catch (const std::bad_alloc&) {
                 return E_OUTOFMEMORY;
             } catch (const DbException& error) {
@@ -104,30 +64,19 @@ class ClassFactory final : public IClassFactory {
 
     STDMETHODIMP LockServer(BOOL) override
     {
-        return guarded("ClassFactory::LockServer", E_FAIL, [] { return S_OK; });
+        return S_OK;
     }
-
-  private:
-    ULONG references_ = 0;
 };
-
-template <class Object>
-IClassFactory* makeFactory()
-{
-    auto* const factory = new ClassFactory<Object>;
-    factory->AddRef();
-    return factory;
-}
 
 } // namespace
 
-IClassFactory* makeClassFactory(REFCLSID classId)
+RefPtr<IClassFactory> makeClassFactory(REFCLSID classId)
 {
-    if (IsEqualCLSID(classId, kShellExtClassId))
-        return makeFactory<ShellExt>();
-    if (IsEqualCLSID(classId, kStubFolderClassId))
-        return makeFactory<StubFolder>();
-    return nullptr;
+    if (IsEqualCLSID(classId, ShellExt::kClassId))
+        return RefPtr<IClassFactory>(new ClassFactory<ShellExt>);
+    if (IsEqualCLSID(classId, StubFolder::kClassId))
+        return RefPtr<IClassFactory>(new ClassFactory<StubFolder>);
+    return RefPtr<IClassFactory>();
 }
 
 } // namespace tavi

@@ -3,10 +3,12 @@
 #include <windows.h>
 #include <unknwn.h>
 
+#include "core/RefCounted.h"
+
 namespace tavi {
 
-// A factory of one of the module's classes with one reference for the caller, or null for a class that the module
-// lacks. Throws std::bad_alloc.
-IClassFactory* makeClassFactory(REFCLSID classId);
+// Returns a new factory of one of the module's classes, or null for a class that the module lacks. Throws
+// std::bad_alloc.
+RefPtr<IClassFactory> makeClassFactory(REFCLSID classId);
 
 } // namespace tavi

@@ -12,11 +12,10 @@ extern "C" BOOL WINAPI DllMain(HINSTANCE instance, DWORD reason, LPVOID reserved
 {
     using namespace tavi;
     return guarded("DllMain", BOOL{TRUE}, [&]() -> BOOL {
-        // Thread notifications keep coming, since the static runtime brings thread-local storage: pass them before the
-        // gate.
+        // The kernel keeps sending thread notifications, because the static C runtime has thread-local storage.
         if (reason == DLL_THREAD_ATTACH || reason == DLL_THREAD_DETACH)
             return TRUE;
-        // A longer path is cut, which leaves it without a terminator.
+        // The kernel cuts a longer path and leaves out the terminator.
         wchar_t host[MAX_PATH + 1];
         GetModuleFileNameW(nullptr, host, MAX_PATH);
         host[MAX_PATH] = L'\0';
@@ -38,9 +37,10 @@ extern "C" BOOL WINAPI DllMain(HINSTANCE instance, DWORD reason, LPVOID reserved
 extern "C" BOOL WINAPI DllMainCRTStartup(HINSTANCE instance, DWORD reason, LPVOID reserved);
 extern "C" BOOL WINAPI tavishellEntry(HINSTANCE instance, DWORD reason, LPVOID reserved);
 
-// The entry that the linker is given. At the end of a process it bypasses the C runtime, which would destroy the static
-// objects of a module whose threads were killed at arbitrary instructions, and would wait for the locks that they held.
-// At attach the runtime chooses the stack protector's cookie, so this function must not check one.
+// The linker's entry point. At the end of a process it bypasses the C runtime, which would destroy static objects that
+// killed threads were changing, and would wait for locks that those threads held.
+//
+// At attach the C runtime chooses the stack protector's cookie. A function that checked it would see it change.
 extern "C" __attribute__((no_stack_protector)) BOOL WINAPI tavishellEntry(HINSTANCE instance, DWORD reason,
                                                                           LPVOID reserved)
 {

@@ -3,7 +3,6 @@
 
 #include "core/Boundary.h"
 #include "core/Module.h"
-#include "core/RefCounted.h"
 #include "core/RuntimeCleanup.h"
 #include "shell/ClassFactory.h"
 #include "shell/Lifecycle.h"
@@ -17,7 +16,7 @@ STDAPI DllGetClassObject(REFCLSID classId, REFIID interfaceId, void** object)
         if (!object)
             return E_POINTER;
         *object = nullptr;
-        const auto factory = RefPtr<IClassFactory>::adopt(makeClassFactory(classId));
+        const RefPtr<IClassFactory> factory = makeClassFactory(classId);
         if (!factory)
             return CLASS_E_CLASSNOTAVAILABLE;
         resumeThreads();
@@ -31,18 +30,19 @@ STDAPI DllCanUnloadNow()
         if (moduleRefCount() != 0)
             return S_FALSE;
         requestThreadsStop();
-        // An object that was made meanwhile found the threads still running.
+        // An object that was created meanwhile found the threads still running, and so did not resume them.
         if (moduleRefCount() != 0) {
             resumeThreads();
             return S_FALSE;
         }
-        // The host may free the module next, on this thread, while the last reference is one of ours.
+        // The host may free the module next. If one of the module's threads then holds the last reference, what the C++
+        // runtime keeps for this thread would outlive the module.
         releaseThreadRuntime();
         return S_OK;
     });
 }
 
-// Both return raw system error codes, not results: registration tools show them as they are.
+// Both return the kernel's error code, not an HRESULT: registration tools show the code as it is.
 STDAPI DllRegisterServer()
 {
     return guarded("DllRegisterServer", E_FAIL, [] { return static_cast<HRESULT>(registerServer()); });

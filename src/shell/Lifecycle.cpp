@@ -3,22 +3,23 @@
 #include <atomic>
 #include <cwchar>
 
+#include <shlobj.h>
 #include <wx/log.h>
 
-#include "manifest/CurrentManifest.h"
 #include "core/BackgroundThread.h"
 #include "core/Handles.h"
 #include "core/Log.h"
+#include "core/Module.h"
 #include "link/StatusListener.h"
+#include "manifest/CurrentManifest.h"
 #include "statedb/Database.h"
-#include "shell/ShellAllocator.h"
 #include "ui/MenuBitmap.h"
 
 namespace tavi {
 namespace {
 
 constexpr unsigned long kLogLevel = 3;
-constexpr DWORD kStatusThreadPatienceMs = 500;
+constexpr DWORD kStatusThreadTimeoutMs = 500;
 
 struct HostName {
     const wchar_t* name;
@@ -30,9 +31,33 @@ const HostName kHosts[] = {{L"explorer.exe", HostKind::fileManager},
                            {L"_RegDLL.tmp", HostKind::toolOnly}};
 
 std::atomic<bool> isAttached{false};
+std::atomic<IMalloc*> theShellAllocator{nullptr};
 
 BackgroundThread statusThread("status listener",
                               [](const BackgroundThread& self) { listenToStatus([&] { return self.isStopping(); }); });
+
+void acquireShellAllocator() noexcept
+{
+    IMalloc* allocator = nullptr;
+    if (SUCCEEDED(SHGetMalloc(&allocator)))
+        theShellAllocator = allocator;
+}
+
+void releaseShellAllocator() noexcept
+{
+    if (IMalloc* allocator = theShellAllocator.exchange(nullptr))
+        allocator->Release();
+}
+
+// Waits half a second for the status listener, then terminates it.
+void stopStatusThread() noexcept
+{
+    const KernelHandle thread(statusThread.releaseHandle());
+    // A listener that is no longer active has left the module's code, but may need the loader lock to end. The detach
+    // holds that lock, so a wait would only time out. The listener may even be the thread that runs this detach.
+    if (thread && statusThread.isActive() && WaitForSingleObject(thread.get(), kStatusThreadTimeoutMs) != WAIT_OBJECT_0)
+        TerminateThread(thread.get(), 0);
+}
 
 } // namespace
 
@@ -54,17 +79,17 @@ void attachToFileManager(HINSTANCE instance, const wchar_t* hostPath)
     setModuleInstance(instance);
     acquireShellAllocator();
     DisableThreadLibraryCalls(instance);
-    // Called for its side effect: it starts the watcher.
+    // Starts the watcher.
     getCurrentManifest();
-    startStatusThread();
+    statusThread.start();
     isAttached = true;
 }
 
 void detachFromFileManager(bool processEnds)
 {
     releaseShellAllocator();
-    // At the end of a process every other thread was killed at an arbitrary instruction, perhaps inside a lock of the
-    // heap, of a C stream or of GDI. The kernel takes back the rest without asking those.
+    // At the end of a process the kernel has killed every other thread at an arbitrary instruction, perhaps inside a
+    // lock of the heap, of a C stream or of GDI. It frees the rest without those locks.
     if (processEnds)
         return;
     freeMenuBitmaps();
@@ -75,19 +100,9 @@ void detachFromFileManager(bool processEnds)
     closeLog();
 }
 
-void startStatusThread() noexcept
+IMalloc* shellAllocator() noexcept
 {
-    statusThread.start();
-}
-
-void stopStatusThread() noexcept
-{
-    const KernelHandle thread(statusThread.releaseHandle());
-    // A listener that has ended is past all code of the module, but may still need the loader lock, which the detach
-    // holds: to wait for it would be in vain. It may even be the thread that this runs on.
-    if (thread && statusThread.isActive() &&
-        WaitForSingleObject(thread.get(), kStatusThreadPatienceMs) != WAIT_OBJECT_0)
-        TerminateThread(thread.get(), 0);
+    return theShellAllocator;
 }
 
 void requestThreadsStop() noexcept
@@ -100,7 +115,7 @@ void resumeThreads() noexcept
 {
     if (!isAttached)
         return;
-    startStatusThread();
+    statusThread.start();
     resumeWatcher();
 }
 

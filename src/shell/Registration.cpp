@@ -1,22 +1,22 @@
 #include "shell/Registration.h"
 
-#include <cwchar>
+#include <iterator>
+#include <string>
 
 #include <shlobj.h>
 
 #include "core/Handles.h"
 #include "core/Module.h"
+#include "shell/ShellExt.h"
 
 namespace tavi {
 namespace {
 
-#define TAVI_CLASS_ID_TEXT L"{5e0c31a7-8d42-4b19-a6f3-2c7d90e1b845}"
-const wchar_t kClassId[] = TAVI_CLASS_ID_TEXT;
-const wchar_t kClassKey[] = L"CLSID\\" TAVI_CLASS_ID_TEXT;
 const wchar_t kDisplayName[] = L"Tavi Remote Backup Shell Extension";
 const wchar_t kApprovedKey[] = L"Software\\Microsoft\\Windows\\CurrentVersion\\Shell Extensions\\Approved";
 constexpr REGSAM kReadWrite = KEY_READ | KEY_WRITE;
-constexpr DWORD kNameBuffer = 256;
+// The kernel's limit for the name of a key, with its terminator.
+constexpr DWORD kKeyNameChars = 256;
 
 const wchar_t* const kHandlerKeys[] = {
     L"AllFilesystemObjects\\shellex\\ContextMenuHandlers\\Tavi",
@@ -26,10 +26,10 @@ const wchar_t* const kHandlerKeys[] = {
     L"Folder\\shellex\\ContextMenuHandlers\\Tavi",
 };
 
-// Relative to the opened CLSID key, so that all but the first miss and the run ends with "not found" after the class
-// key: the handler keys stay behind. Required so; the README tells how to remove them.
-const wchar_t* const kKeysToDelete[] = {
-    kClassId,
+// Deleted after the class key and, like it, below the CLSID key. There is none of them there, so the run ends with
+// ERROR_FILE_NOT_FOUND and the handler keys and the approved value stay: installers delete those themselves and expect
+// that code. The README lists what stays.
+const wchar_t* const kFormerKeys[] = {
     L"AllFileSystemObjects\\shellex\\PropertySheetHandlers\\Tavi",
     L"AllFileSystemObjects\\shellex\\ContextMenuHandlers\\Tavi",
     L"Directory\\Background\\shellex\\ContextMenuHandlers\\Tavi",
@@ -39,26 +39,36 @@ const wchar_t* const kKeysToDelete[] = {
     L"*\\shellex\\ContextMenuHandlers\\Tavi",
 };
 
+// Returns the class id as the registry has it: in braces and, since scripts compare it, in lower case.
+std::wstring classIdText()
+{
+    wchar_t text[sizeof("{00000000-0000-0000-0000-000000000000}")] = L"";
+    StringFromGUID2(ShellExt::kClassId, text, static_cast<int>(std::size(text)));
+    return CharLowerW(text);
+}
+
 bool isNtFamily()
 {
     return (GetVersion() & 0x80000000u) == 0;
 }
 
-LSTATUS setText(HKEY key, const wchar_t* valueName, const wchar_t* text)
+LSTATUS setText(HKEY key, const wchar_t* valueName, const std::wstring& text)
 {
-    const std::size_t bytes = (std::wcslen(text) + 1) * sizeof(*text);
-    return RegSetValueExW(key, valueName, 0, REG_SZ, reinterpret_cast<const BYTE*>(text), static_cast<DWORD>(bytes));
+    const std::size_t bytes = (text.length() + 1) * sizeof(wchar_t);
+    return RegSetValueExW(key, valueName, 0, REG_SZ, reinterpret_cast<const BYTE*>(text.c_str()),
+                          static_cast<DWORD>(bytes));
 }
 
-LSTATUS createKey(HKEY parent, const wchar_t* name, RegistryKey& key)
+LSTATUS createKey(HKEY parent, const std::wstring& name, RegistryKey& key)
 {
-    return RegCreateKeyExW(parent, name, 0, nullptr, REG_OPTION_NON_VOLATILE, kReadWrite, nullptr, key.out(), nullptr);
+    return RegCreateKeyExW(parent, name.c_str(), 0, nullptr, REG_OPTION_NON_VOLATILE, kReadWrite, nullptr, key.out(),
+                           nullptr);
 }
 
 LSTATUS writeClassKey(const wchar_t* modulePath)
 {
     RegistryKey classKey;
-    LSTATUS status = createKey(HKEY_CLASSES_ROOT, kClassKey, classKey);
+    LSTATUS status = createKey(HKEY_CLASSES_ROOT, L"CLSID\\" + classIdText(), classKey);
     if (status == ERROR_SUCCESS)
         status = setText(classKey.get(), nullptr, kDisplayName);
     RegistryKey serverKey;
@@ -77,7 +87,7 @@ LSTATUS writeHandlerKeys()
         RegistryKey key;
         LSTATUS status = createKey(HKEY_CLASSES_ROOT, name, key);
         if (status == ERROR_SUCCESS)
-            status = setText(key.get(), nullptr, kClassId);
+            status = setText(key.get(), nullptr, classIdText());
         if (status != ERROR_SUCCESS)
             return status;
     }
@@ -103,8 +113,8 @@ LSTATUS deleteKeyTree(HKEY parent, const wchar_t* name)
     if (status != ERROR_SUCCESS)
         return status;
     for (;;) {
-        wchar_t child[kNameBuffer];
-        DWORD length = kNameBuffer;
+        wchar_t child[kKeyNameChars];
+        DWORD length = kKeyNameChars;
         if (RegEnumKeyExW(key.get(), 0, child, &length, nullptr, nullptr, nullptr, nullptr) != ERROR_SUCCESS)
             break;
         status = deleteKeyTree(key.get(), child);
@@ -127,7 +137,7 @@ LSTATUS registerServer()
         RegistryKey approved;
         status = openApprovedList(approved);
         if (status == ERROR_SUCCESS)
-            status = setText(approved.get(), kClassId, kDisplayName);
+            status = setText(approved.get(), classIdText().c_str(), kDisplayName);
     }
     if (status == ERROR_SUCCESS)
         announceChange();
@@ -140,15 +150,15 @@ LSTATUS unregisterServer()
     LSTATUS status = RegOpenKeyExW(HKEY_CLASSES_ROOT, L"CLSID", 0, kReadWrite, classes.out());
     if (status != ERROR_SUCCESS)
         return status;
-    for (const wchar_t* name : kKeysToDelete) {
-        status = deleteKeyTree(classes.get(), name);
-        if (status != ERROR_SUCCESS)
-            return status;
-    }
+    status = deleteKeyTree(classes.get(), classIdText().c_str());
+    for (auto name = std::begin(kFormerKeys); status == ERROR_SUCCESS && name != std::end(kFormerKeys); ++name)
+        status = deleteKeyTree(classes.get(), *name);
+    if (status != ERROR_SUCCESS)
+        return status;
     if (isNtFamily()) {
         RegistryKey approved;
         if (openApprovedList(approved) == ERROR_SUCCESS)
-            RegDeleteValueW(approved.get(), kClassId);
+            RegDeleteValueW(approved.get(), classIdText().c_str());
     }
     announceChange();
     return ERROR_SUCCESS;

@@ -2,15 +2,14 @@
 
 #include <windows.h>
 
-// The registry entries that make the file manager load the module. No message and no roll-back: a failing step ends the
-// run.
+// The registry entries that make the file manager load the module. A failing step ends the run: nothing is rolled back
+// or logged. Each function returns 0 or the kernel's code of the step that failed.
 namespace tavi {
 
-// 0, or the raw error of the first step that failed.
 LSTATUS registerServer();
 LSTATUS unregisterServer();
 
-// Deletes a key under an open parent with everything below it; 0 or the first error.
+// Deletes a key below an open parent with everything below it.
 LSTATUS deleteKeyTree(HKEY parent, const wchar_t* name);
 
 } // namespace tavi

@@ -1,29 +1,30 @@
 #include "shell/ShellExt.h"
 
-#include <algorithm>
 #include <vector>
 
 #include <strsafe.h>
 
 #include "manifest/CurrentManifest.h"
 #include "core/Boundary.h"
-#include "core/Handles.h"
 #include "ui/ContextMenu.h"
 #include "ui/PropertyPage.h"
 
 namespace tavi {
 namespace {
 
+// The place of TAVI_ICON_OVERLAY among the module's icons.
 constexpr int kOverlayIconIndex = 3;
+// Near the lowest of the shell's priorities, which go from 0 to 100.
 constexpr int kOverlayPriority = 99;
+// The only file state with a badge.
 constexpr std::int32_t kOverlayState = 1;
-constexpr std::size_t kFirstPathBuffer = 264;
-constexpr std::size_t kPathBufferStep = 4;
+constexpr std::size_t kFirstPathChars = 264;
+constexpr std::size_t kPathStepChars = 4;
 
-// 0, or the system's error.
+// Returns 0 or the kernel's error code.
 DWORD readModulePath(wxString& path)
 {
-    std::vector<wchar_t> buffer(kFirstPathBuffer);
+    std::vector<wchar_t> buffer(kFirstPathChars);
     for (;;) {
         SetLastError(ERROR_SUCCESS);
         const DWORD length = GetModuleFileNameW(moduleInstance(), buffer.data(), static_cast<DWORD>(buffer.size()));
@@ -32,52 +33,13 @@ DWORD readModulePath(wxString& path)
             path.assign(buffer.data(), length);
             return length == 0 ? error : ERROR_SUCCESS;
         }
-        buffer.resize(buffer.size() + kPathBufferStep);
+        buffer.resize(buffer.size() + kPathStepChars);
     }
 }
 
 } // namespace
 
 ShellExt::ShellExt() = default;
-
-ShellExt::~ShellExt()
-{
-    ILFree(folder_);
-}
-
-STDMETHODIMP ShellExt::QueryInterface(REFIID interfaceId, void** object)
-{
-    return guarded("ShellExt::QueryInterface", E_FAIL, [&]() -> HRESULT {
-        if (!object)
-            return E_POINTER;
-        *object = nullptr;
-        if (IsEqualIID(interfaceId, IID_IUnknown))
-            *object = static_cast<IShellPropSheetExt*>(this);
-        else if (IsEqualIID(interfaceId, IID_IShellExtInit))
-            *object = static_cast<IShellExtInit*>(this);
-        else if (IsEqualIID(interfaceId, IID_IContextMenu))
-            *object = static_cast<IContextMenu*>(this);
-        else
-            return E_NOINTERFACE;
-        AddRef();
-        return S_OK;
-    });
-}
-
-STDMETHODIMP_(ULONG) ShellExt::AddRef()
-{
-    return guarded("ShellExt::AddRef", ULONG{1}, [&] { return ++references_; });
-}
-
-STDMETHODIMP_(ULONG) ShellExt::Release()
-{
-    return guarded("ShellExt::Release", ULONG{0}, [&] {
-        const ULONG left = --references_;
-        if (left == 0)
-            delete this;
-        return left;
-    });
-}
 
 STDMETHODIMP ShellExt::AddPages(LPFNADDPROPSHEETPAGE addPage, LPARAM parameter)
 {
@@ -87,17 +49,15 @@ STDMETHODIMP ShellExt::AddPages(LPFNADDPROPSHEETPAGE addPage, LPARAM parameter)
 
 STDMETHODIMP ShellExt::ReplacePage(EXPPS, LPFNADDPROPSHEETPAGE, LPARAM)
 {
-    return guarded("ShellExt::ReplacePage", E_FAIL, [] { return E_FAIL; });
+    return E_FAIL;
 }
 
 STDMETHODIMP ShellExt::Initialize(PCIDLIST_ABSOLUTE folder, IDataObject* data, HKEY)
 {
-    // Whatever could not be captured is left out; the shell is told that all is well.
+    // Items that cannot be captured are left out. A failure would make the host drop the menu of the others too.
     guarded("ShellExt::Initialize", [&] {
-        ILFree(std::exchange(folder_, nullptr));
-        if (folder)
-            folder_ = ILClone(folder);
-        captureSelection(folder_, data, folderStates_, selection_);
+        folder_.reset(folder ? ILClone(folder) : nullptr);
+        captureSelection(folder_.get(), data, folderStates_, selection_);
     });
     return S_OK;
 }
@@ -139,7 +99,7 @@ STDMETHODIMP ShellExt::GetOverlayInfo(PWSTR iconFile, int maxChars, int* index, 
             if (modulePath_.empty())
                 return static_cast<HRESULT>(error);
         }
-        // A negative count is one above the largest that the copy accepts.
+        // As an unsigned number a negative count is above the maximum that the copy accepts.
         const HRESULT copied = StringCchCopyW(iconFile, static_cast<unsigned>(maxChars), modulePath_.wc_str());
         if (FAILED(copied))
             return copied;

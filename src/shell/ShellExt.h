@@ -3,28 +3,30 @@
 #include <windows.h>
 #include <shlobj.h>
 
+#include "core/Handles.h"
 #include "core/Module.h"
+#include "shell/ComObject.h"
 #include "statedb/StateLookups.h"
 #include "ui/Selection.h"
 
 namespace tavi {
 
-// The object that the file manager makes for a context menu. Used by the thread that made it only, so its count is
-// plain. It also carries a property-sheet and an icon-overlay table, to which QueryInterface leads nobody: both are
-// required so. The order of the bases is the order of the tables in the object.
-class ShellExt final : public IShellPropSheetExt,
-                       public IShellExtInit,
-                       public IContextMenu,
-                       public IShellIconOverlayIdentifier {
+// The object that the file manager creates for a context menu. Used only by the thread that created it.
+//
+// The property-sheet and icon-overlay tables are part of the object's layout, but QueryInterface answers neither: a
+// host that found them would add a page and badges that no registration of the module asks for.
+class ShellExt final
+    : public ComObject<ShellExt, IShellPropSheetExt, IShellExtInit, IContextMenu, IShellIconOverlayIdentifier> {
   public:
+    static constexpr CLSID kClassId = {0x5e0c31a7, 0x8d42, 0x4b19, {0xa6, 0xf3, 0x2c, 0x7d, 0x90, 0xe1, 0xb8, 0x45}};
+    static constexpr Answer kInterfaces[] = {
+        {&IID_IUnknown, tableOf<IShellPropSheetExt>},
+        {&IID_IShellExtInit, tableOf<IShellExtInit>},
+        {&IID_IContextMenu, tableOf<IContextMenu>},
+    };
+
     // Throws DbException when the service's configuration database cannot be used.
     ShellExt();
-    ShellExt(const ShellExt&) = delete;
-    ShellExt& operator=(const ShellExt&) = delete;
-
-    STDMETHODIMP QueryInterface(REFIID interfaceId, void** object) override;
-    STDMETHODIMP_(ULONG) AddRef() override;
-    STDMETHODIMP_(ULONG) Release() override;
 
     STDMETHODIMP AddPages(LPFNADDPROPSHEETPAGE addPage, LPARAM parameter) override;
     STDMETHODIMP ReplacePage(EXPPS pageId, LPFNADDPROPSHEETPAGE replacePage, LPARAM parameter) override;
@@ -40,10 +42,7 @@ class ShellExt final : public IShellPropSheetExt,
     STDMETHODIMP GetPriority(int* priority) override;
 
   private:
-    ~ShellExt();
-
-    ULONG references_ = 0;
-    PIDLIST_ABSOLUTE folder_ = nullptr;
+    ItemIdList folder_;
     ModuleLock lock_;
     Selection selection_;
     FolderStateTable folderStates_;

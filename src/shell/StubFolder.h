@@ -4,64 +4,46 @@
 #include <shlobj.h>
 
 #include "core/Module.h"
+#include "shell/ComObject.h"
 
 namespace tavi {
 
-// A shell folder that parses any name to the empty item list and refuses everything else. Used by the thread that
-// created it only.
-//
-// The folder table is a member, not a base: with two bases the compiler appends the second table's methods to the first
-// one, where a caller of IPersistFolder2 would find ParseDisplayName in the place of GetCurFolder.
-class StubFolder final : public IPersistFolder {
+// A shell folder that parses every name to the empty item id list and refuses every other operation.
+class RefusingFolder : public IShellFolder {
   public:
-    StubFolder() = default;
-    StubFolder(const StubFolder&) = delete;
-    StubFolder& operator=(const StubFolder&) = delete;
+    STDMETHODIMP ParseDisplayName(HWND window, IBindCtx* context, LPWSTR name, ULONG* eaten, PIDLIST_RELATIVE* items,
+                                  ULONG* attributes) final;
+    STDMETHODIMP EnumObjects(HWND window, SHCONTF flags, IEnumIDList** list) final;
+    STDMETHODIMP BindToObject(PCUIDLIST_RELATIVE item, IBindCtx* context, REFIID interfaceId, void** object) final;
+    STDMETHODIMP BindToStorage(PCUIDLIST_RELATIVE item, IBindCtx* context, REFIID interfaceId, void** object) final;
+    STDMETHODIMP CompareIDs(LPARAM order, PCUIDLIST_RELATIVE first, PCUIDLIST_RELATIVE second) final;
+    STDMETHODIMP CreateViewObject(HWND owner, REFIID interfaceId, void** object) final;
+    STDMETHODIMP GetAttributesOf(UINT count, PCUITEMID_CHILD_ARRAY items, SFGAOF* attributes) final;
+    STDMETHODIMP GetUIObjectOf(HWND owner, UINT count, PCUITEMID_CHILD_ARRAY items, REFIID interfaceId, UINT* reserved,
+                               void** object) final;
+    STDMETHODIMP GetDisplayNameOf(PCUITEMID_CHILD item, SHGDNF flags, STRRET* name) final;
+    STDMETHODIMP SetNameOf(HWND window, PCUITEMID_CHILD item, LPCWSTR name, SHGDNF flags, PITEMID_CHILD* renamed) final;
+};
 
-    STDMETHODIMP QueryInterface(REFIID interfaceId, void** object) override;
-    STDMETHODIMP_(ULONG) AddRef() override;
-    STDMETHODIMP_(ULONG) Release() override;
+// The folder as a COM class of the module. Used only by the thread that created it.
+//
+// The first table must end after Initialize: the object answers IPersistFolder2 with it, and a caller that finds a
+// GetCurFolder there would call it. The compiler appends the methods of a second interface that a class implements to
+// its first table. Those of IShellFolder are therefore implemented by a base.
+class StubFolder final : public ComObject<StubFolder, IPersistFolder, RefusingFolder> {
+  public:
+    static constexpr CLSID kClassId = {0x7d19e0b2, 0x5a63, 0x4f8e, {0x9c, 0x21, 0xb4, 0xe8, 0x7a, 0x0d, 0x3f, 0x56}};
+    static constexpr Answer kInterfaces[] = {
+        {&IID_IUnknown, tableOf<IPersistFolder>},       {&IID_IPersist, tableOf<IPersistFolder>},
+        {&IID_IPersistFolder, tableOf<IPersistFolder>}, {&IID_IPersistFolder2, tableOf<IPersistFolder>},
+        {&IID_IShellFolder, tableOf<RefusingFolder>},
+    };
 
     STDMETHODIMP GetClassID(CLSID* classId) override;
     STDMETHODIMP Initialize(PCIDLIST_ABSOLUTE folder) override;
 
   private:
-    // The second interface table. Counts and answers as the object that it is part of.
-    class Folder final : public IShellFolder {
-      public:
-        Folder() = default;
-        Folder(const Folder&) = delete;
-        Folder& operator=(const Folder&) = delete;
-
-        STDMETHODIMP QueryInterface(REFIID interfaceId, void** object) override;
-        STDMETHODIMP_(ULONG) AddRef() override;
-        STDMETHODIMP_(ULONG) Release() override;
-
-        STDMETHODIMP ParseDisplayName(HWND window, IBindCtx* context, LPWSTR name, ULONG* eaten,
-                                      PIDLIST_RELATIVE* items, ULONG* attributes) override;
-        STDMETHODIMP EnumObjects(HWND window, SHCONTF flags, IEnumIDList** list) override;
-        STDMETHODIMP BindToObject(PCUIDLIST_RELATIVE item, IBindCtx* context, REFIID interfaceId,
-                                  void** object) override;
-        STDMETHODIMP BindToStorage(PCUIDLIST_RELATIVE item, IBindCtx* context, REFIID interfaceId,
-                                   void** object) override;
-        STDMETHODIMP CompareIDs(LPARAM order, PCUIDLIST_RELATIVE first, PCUIDLIST_RELATIVE second) override;
-        STDMETHODIMP CreateViewObject(HWND owner, REFIID interfaceId, void** object) override;
-        STDMETHODIMP GetAttributesOf(UINT count, PCUITEMID_CHILD_ARRAY items, SFGAOF* attributes) override;
-        STDMETHODIMP GetUIObjectOf(HWND owner, UINT count, PCUITEMID_CHILD_ARRAY items, REFIID interfaceId,
-                                   UINT* reserved, void** object) override;
-        STDMETHODIMP GetDisplayNameOf(PCUITEMID_CHILD item, SHGDNF flags, STRRET* name) override;
-        STDMETHODIMP SetNameOf(HWND window, PCUITEMID_CHILD item, LPCWSTR name, SHGDNF flags,
-                               PITEMID_CHILD* renamed) override;
-
-      private:
-        StubFolder& owner() noexcept;
-    };
-
-    ~StubFolder() = default;
-
-    Folder folder_;
-    ULONG references_ = 0;
-    // No operation reads it; the object's layout has it.
+    // Part of the object's layout; no operation reads it.
     [[maybe_unused]] std::int32_t unread_ = -1;
     ModuleLock lock_;
 };

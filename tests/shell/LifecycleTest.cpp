@@ -4,17 +4,19 @@
 #include <stdexcept>
 #include <thread>
 
-#include "manifest/CurrentManifest.h"
+#include <process.h>
+
 #include "core/RuntimeCleanup.h"
-#include "core/Handles.h"
-#include "statedb/Database.h"
+#include "manifest/CurrentManifest.h"
+#include "tests/shell/LoadedModule.h"
 #include "tests/support/Counts.h"
-#include "tests/support/Dialogs.h"
 
 namespace tavi {
 namespace {
 
-TEST(Lifecycle, TheGateComparesTheBeginningOfTheName)
+using namespace test;
+
+TEST(Lifecycle, AdmitsProgramsByTheBeginningOfTheirName)
 {
     const std::pair<HostKind, std::vector<const wchar_t*>> cases[] = {
         {HostKind::fileManager, {L"C:\\Windows\\explorer.exe", L"EXPLORER.EXE", L"D:\\x\\explorer.exe.old"}},
@@ -24,8 +26,30 @@ TEST(Lifecycle, TheGateComparesTheBeginningOfTheName)
         for (const wchar_t* path : paths)
             EXPECT_EQ(hostKindOf(path), kind) << path;
     }
-    EXPECT_EQ(LoadLibraryW(test::modulePath().c_str()), nullptr);
-    EXPECT_EQ(GetLastError(), DWORD{ERROR_DLL_INIT_FAILED});
+}
+
+using LifecycleTest = HostTest;
+
+// Runs as a program that the module refuses, and starts a copy of itself as one of the tools.
+TEST_F(LifecycleTest, GivesAToolTheClassesAndNothingElse)
+{
+    const wxString own = wxStandardPaths::Get().GetExecutablePath(), tool = own.BeforeLast(L'\\') + L"\\verclsid.exe";
+    if (own != tool) {
+        EXPECT_EQ(LoadLibraryW(modulePath().c_str()), nullptr);
+        EXPECT_EQ(GetLastError(), DWORD{ERROR_DLL_INIT_FAILED});
+        EXPECT_TRUE(CopyFileW(own.wc_str(), tool.wc_str(), FALSE));
+        EXPECT_EQ(_wspawnl(_P_WAIT, tool.wc_str(), tool.wc_str(), L"--gtest_filter=*GivesATool*", nullptr), 0);
+        DeleteFileW(tool.wc_str());
+        // The other program has deleted the key at its end.
+        service.install().Close();
+        service.install().Create();
+        return;
+    }
+    const std::size_t before = countThreads();
+    const LoadedModule module;
+    module.object<IContextMenu>(ShellExt::kClassId, IID_IContextMenu);
+    EXPECT_EQ(countThreads(), before);
+    EXPECT_EQ(GetFileAttributesW(service.file(L"tavi.log").c_str()), INVALID_FILE_ATTRIBUTES);
 }
 
 TEST(Lifecycle, TheRuntimesShareOfAThreadOutlivesAnExceptionInFlight)
@@ -40,13 +64,11 @@ TEST(Lifecycle, TheRuntimesShareOfAThreadOutlivesAnExceptionInFlight)
 
 TEST(Lifecycle, TheFirstManifestIsNullAndItsWatcherTheOnlyOne)
 {
-    const test::InstalledService service;
-    const test::LogCapture log;
-    const std::size_t before = test::countThreads();
+    const InstalledService service;
+    const LogCapture log;
+    const std::size_t before = countThreads();
     const auto isLoaded = [] { return static_cast<bool>(getCurrentManifest()); };
-    const auto hasWatcher = [&](bool more) {
-        return test::waitUntil([&] { return test::countThreads() == before + more; });
-    };
+    const auto hasWatcher = [&](bool more) { return waitUntil([&] { return countThreads() == before + more; }); };
     DbConnection database;
     database.open(service.file(L"tavistate.dat"));
     database.execDML("BEGIN EXCLUSIVE"); // holds up the load
@@ -57,16 +79,16 @@ TEST(Lifecycle, TheFirstManifestIsNullAndItsWatcherTheOnlyOne)
         caller.join();
     EXPECT_TRUE(!isLoaded() && hasWatcher(true));
     database.execDML("COMMIT");
-    EXPECT_TRUE(test::waitUntil(isLoaded));
+    EXPECT_TRUE(waitUntil(isLoaded));
 
     // Takes the mutex of the start for this thread and keeps it.
     stopManifestWatcher();
     static std::atomic<bool> isNull{false};
     EXPECT_TRUE(hasWatcher(false));
     std::thread([&] { isNull = !isLoaded(); }).detach();
-    EXPECT_TRUE(test::waitUntil([] { return isNull.load(); })) << "the call waits, or there is a manifest";
+    EXPECT_TRUE(waitUntil([] { return isNull.load(); })) << "the call waits, or there is a manifest";
     EXPECT_TRUE(hasWatcher(false)) << "nothing was started";
-    EXPECT_TRUE(test::waitUntil(isLoaded) && hasWatcher(true)) << "by the owner of the mutex";
+    EXPECT_TRUE(waitUntil(isLoaded) && hasWatcher(true)) << "by the owner of the mutex";
     stopManifestWatcher();
 }
 

@@ -1,0 +1,78 @@
+#include "tests/shell/LoadedModule.h"
+#include "tests/support/Counts.h"
+#include "tests/support/Pipes.h"
+#include "ui/PropertyPage.h"
+
+namespace tavi {
+namespace {
+
+using namespace test;
+using ExportsTest = HostTest;
+
+TEST_F(ExportsTest, OfferTheModulesClassesOnly)
+{
+    LoadedModule module;
+    void* object = &module;
+    EXPECT_EQ(module.classObject(IID_IContextMenu, IID_IClassFactory, &object), CLASS_E_CLASSNOTAVAILABLE);
+    EXPECT_EQ(object, nullptr);
+    EXPECT_EQ(module.classObject(ShellExt::kClassId, IID_IClassFactory, nullptr), E_POINTER);
+    EXPECT_EQ(module.classObject(ShellExt::kClassId, IID_IContextMenu, &object), E_NOINTERFACE);
+    EXPECT_EQ(module.canUnload(), S_OK) << "the refused factory was destroyed";
+}
+
+TEST_F(ExportsTest, ServeAHostThatGoesOnAfterItMayUnload)
+{
+    const PipeServer servers[] = {{kStatus, PIPE_ACCESS_OUTBOUND, 2}, {kStatus, PIPE_ACCESS_OUTBOUND, 2}};
+    LoadedModule module;
+    ASSERT_TRUE(servers[0].waitClient());
+    EXPECT_EQ(module.canUnload(), S_OK);
+    Sleep(700); // the listener has ended
+    const auto factory = module.factory(ShellExt::kClassId);
+    EXPECT_TRUE(servers[1].waitClient());
+}
+
+TEST_F(ExportsTest, LeaveNothingBehindInTwentyRoundsOfLoadAndUnload)
+{
+    // Wine's printing library, which the common dialogs load, leaves a mutex behind at each of its own unloads.
+    const HMODULE dialogs = LoadLibraryW(L"comdlg32.dll");
+    Counts before;
+    const std::size_t threads = countThreads();
+    constexpr int kRounds = 23, kWarmUp = 3;
+    for (int round = 0; round < kRounds; ++round) {
+        if (round == kWarmUp)
+            before = countNow();
+        {
+            LoadedModule module;
+            const auto menu = module.object<IContextMenu>(ShellExt::kClassId, IID_IContextMenu);
+            // Unloads in every second round once the menu has its bitmap, in the others while the watcher starts.
+            const auto hasCommand = [&] { return commandsFor(*menu, L"C:\\") == 1; };
+            EXPECT_TRUE(hasCommand() || round % 2 == 1 || waitUntil(hasCommand));
+        }
+        ASSERT_TRUE(moduleGoes()) << "round " << round;
+        // The thread that unmapped the module needs a moment more.
+        ASSERT_TRUE(waitUntil([&] { return countThreads() == threads; }));
+    }
+    EXPECT_EQ(countNow(), before);
+    FreeLibrary(dialogs);
+}
+
+TEST_F(ExportsTest, LetComUnloadTheModuleAtTheEndOfAPage)
+{
+    LoadedModule().registerServer();
+    EXPECT_EQ(CoGetClassObject(ShellExt::kClassId, CLSCTX_INPROC_SERVER, nullptr, IID_IClassFactory,
+                               RefPtr<IClassFactory>().outVoid()),
+              S_OK);
+    // The page is this program's own. The module is a library that COM has loaded and that nobody uses.
+    setModuleInstance(GetModuleHandleW(nullptr));
+    HPROPSHEETPAGE page = nullptr;
+    Selection selection;
+    selection.paths = {L"C:\\f"};
+    addPropertyPage(selection, Manifest::parse(L"FILES\nC:\\f\n1:1:1:1:0::0:0"), takePage,
+                    reinterpret_cast<LPARAM>(&page));
+    EXPECT_TRUE(GetModuleHandleW(L"tavishell.dll"));
+    DestroyPropertySheetPage(page);
+    EXPECT_TRUE(moduleGoes());
+}
+
+} // namespace
+} // namespace tavi

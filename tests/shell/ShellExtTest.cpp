@@ -1,0 +1,51 @@
+#include "shell/ShellExt.h"
+
+#include <shellapi.h>
+
+#include "tests/shell/LoadedModule.h"
+
+namespace tavi {
+namespace {
+
+using namespace test;
+using ShellExtTest = HostTest;
+
+TEST_F(ShellExtTest, HasTheOverlayTableBehindTheOthers)
+{
+    LoadedModule module;
+    const auto object = module.object<IUnknown>(ShellExt::kClassId, IID_IUnknown);
+    auto* const overlay = reinterpret_cast<IShellIconOverlayIdentifier*>(reinterpret_cast<void**>(object.get()) + 3);
+    for (const auto& [path, result] : {std::pair(L"C:\\in", S_OK), {L"C:\\out", S_FALSE}, {L"C:\\unknown", S_FALSE}})
+        EXPECT_EQ(overlay->IsMemberOf(path, 0), result) << path;
+    int index = 77, priority = -1;
+    DWORD flags = 88;
+    wchar_t file[MAX_PATH];
+    EXPECT_EQ(overlay->GetOverlayInfo(file, 10, &index, &flags), HRESULT(0x8007007A));
+    EXPECT_EQ(overlay->GetOverlayInfo(file, -1, &index, &flags), E_INVALIDARG);
+    EXPECT_TRUE(index == 77 && flags == 88);
+    EXPECT_EQ(overlay->GetOverlayInfo(file, MAX_PATH, &index, &flags), S_OK);
+    EXPECT_TRUE(file == modulePath() && index == 3 && flags == 3);
+    EXPECT_TRUE(DestroyIcon(ExtractIconW(nullptr, file, 3)));
+    EXPECT_TRUE(overlay->GetPriority(&priority) == S_OK && priority == 99);
+}
+
+TEST_F(ShellExtTest, OffersWhatItsLastInitializeWasGiven)
+{
+    LoadedModule module;
+    const auto menu = module.object<IContextMenu>(ShellExt::kClassId, IID_IContextMenu);
+    RefPtr<IUnknown> object;
+    menu->QueryInterface(IID_IUnknown, object.outVoid());
+    auto* const sheet = reinterpret_cast<IShellPropSheetExt*>(object.get());
+    EXPECT_EQ(sheet->ReplacePage(0, nullptr, 0), E_FAIL);
+    for (const auto& [folder, used] : {std::pair(L"C:\\windows", 1), {L"C:\\windows\\system32", 0}, {nullptr, 0}}) {
+        EXPECT_TRUE(waitUntil([&, from = folder, expected = used] { return commandsFor(*menu, from) == expected; }))
+            << "with the manifest loaded";
+        HPROPSHEETPAGE page = nullptr;
+        EXPECT_EQ(sheet->AddPages(takePage, reinterpret_cast<LPARAM>(&page)), S_OK);
+        EXPECT_EQ(page != nullptr, used == 1);
+        DestroyPropertySheetPage(page);
+    }
+}
+
+} // namespace
+} // namespace tavi
