@@ -95,6 +95,12 @@ wxString formatDuration(std::uint32_t seconds)
     return phrase(3);
 }
 
+wxString withName(wxString text, const wxString& name)
+{
+    const std::size_t place = text.find(L"%s");
+    return place == wxString::npos ? text : text.replace(place, 2, name);
+}
+
 wxString dateTimePattern(wxString timePicture, const wxString& timeSeparator, wxString datePicture)
 {
     timePicture.Replace(timeSeparator + L"ss", wxString(), false);
