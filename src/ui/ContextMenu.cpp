@@ -1,21 +1,24 @@
 #include "ui/ContextMenu.h"
 
-#include <algorithm>
 #include <string>
 #include <utility>
 
+// Without this the header bans the C string functions that the headers of wxWidgets call.
+#define STRSAFE_NO_DEPRECATE
+#include <strsafe.h>
 #include <wx/intl.h>
 
+#include "core/DisplayFormat.h"
 #include "manifest/CurrentManifest.h"
 #include "ui/ActivationScope.h"
 #include "ui/MenuBitmap.h"
-#include "ui/Texts.h"
 #include "ui/VersionsDialog.h"
 #include "ui/resource.h"
 
 namespace tavi {
 namespace {
 
+// Offsets from the first id that the host gives to the menu.
 enum CommandOffset : UINT { kRestore, kBackup, kDontBackup };
 
 struct Wording {
@@ -24,7 +27,7 @@ struct Wording {
     const char* severalFiles;
     const char* severalFolders;
 
-    // The single-item forms hold the place of the item's name.
+    // The texts for one item have a %s for its name.
     wxString text(const Selection& selection) const
     {
         const wxString& name = selection.displayName;
@@ -69,19 +72,6 @@ const Command kCommands[] = {
       wxTRANSLATE("Removes the selected items from the Tavi Remote Backup configuration.")}},
 };
 
-// A copy that always ends in a terminator and says when it had to cut.
-template <class Char>
-HRESULT copyBounded(const std::basic_string<Char>& text, Char* buffer, UINT size)
-{
-    constexpr std::size_t longest = 0x7FFFFFFF;
-    if (!buffer || size == 0 || size > longest || text.length() > longest)
-        return E_INVALIDARG;
-    const std::size_t copied = std::min<std::size_t>(text.length(), size - 1);
-    std::copy_n(text.data(), copied, buffer);
-    buffer[copied] = Char();
-    return copied == text.length() ? S_OK : HRESULT_FROM_WIN32(ERROR_INSUFFICIENT_BUFFER);
-}
-
 std::string toAnsi(const std::wstring& text)
 {
     const int length = static_cast<int>(text.length());
@@ -104,8 +94,8 @@ void insertRestoreItem(HMENU menu, UINT position, UINT id, const wxString& label
 
 UINT insertMenuItems(HMENU menu, UINT indexMenu, UINT idCmdFirst, UINT flags, const Selection& selection)
 {
-    // Called for its effect: the watcher starts, and the manifest that the newest menu was built from outlives a reload
-    // for the command that the user may pick from that menu.
+    // Starts the watcher. Keeps the manifest that this menu was built from through a reload, for the command that the
+    // user may choose.
     holdManifestForMenu();
     if (flags & (CMF_DEFAULTONLY | CMF_NOVERBS))
         return 0;
@@ -115,7 +105,7 @@ UINT insertMenuItems(HMENU menu, UINT indexMenu, UINT idCmdFirst, UINT flags, co
     UINT used = 0;
     for (const Command& command : kCommands) {
         const wxString label = command.label.text(selection);
-        if (!command.onMenu || selection.restoreMode == 0)
+        if (!command.onMenu || selection.restoreMode == Coverage::none)
             continue;
         insertRestoreItem(menu, indexMenu + 1, idCmdFirst, label);
         ++used;
@@ -141,9 +131,10 @@ HRESULT commandString(UINT_PTR offset, UINT type, LPSTR buffer, UINT size, const
     default:
         return S_OK;
     }
-    if (type & GCS_UNICODE)
-        return copyBounded(text, reinterpret_cast<wchar_t*>(buffer), size);
-    return copyBounded(toAnsi(text), buffer, size);
+    if (!buffer)
+        return E_INVALIDARG;
+    return type & GCS_UNICODE ? StringCchCopyW(reinterpret_cast<wchar_t*>(buffer), size, text.c_str())
+                              : StringCchCopyA(buffer, size, toAnsi(text).c_str());
 }
 
 HRESULT invokeCommand(const CMINVOKECOMMANDINFO& info, const Selection& selection)
@@ -153,7 +144,7 @@ HRESULT invokeCommand(const CMINVOKECOMMANDINFO& info, const Selection& selectio
     switch (reinterpret_cast<UINT_PTR>(info.lpVerb)) {
     case kRestore: {
         ManifestRef manifest = getCurrentManifest();
-        // The object keeps its selection: the host may invoke the command again.
+        // A copy of the selection: the host may invoke the command again.
         if (manifest)
             startVersionsDialog(Selection(selection), std::move(manifest), info.hwnd);
         return S_OK;

@@ -9,33 +9,12 @@
 #include <shlwapi.h>
 #include <wx/intl.h>
 
-#include "core/RefCounted.h"
+#include "core/Handles.h"
 
 namespace tavi {
 namespace {
 
-constexpr std::size_t kFileNameBuffer = 8192;
-
-// An item id list that the shell handed over.
-class ItemIdList {
-  public:
-    ItemIdList(LPITEMIDLIST list, IMalloc& allocator) noexcept : list_(list), allocator_(allocator) {}
-    ~ItemIdList()
-    {
-        if (list_)
-            allocator_.Free(list_);
-    }
-    ItemIdList(const ItemIdList&) = delete;
-    ItemIdList& operator=(const ItemIdList&) = delete;
-    LPCITEMIDLIST get() const noexcept
-    {
-        return list_;
-    }
-
-  private:
-    LPITEMIDLIST list_;
-    IMalloc& allocator_;
-};
+constexpr std::size_t kFileNameChars = 8192;
 
 } // namespace
 
@@ -46,8 +25,8 @@ wxString commonPrefix(const PathSet& paths)
     auto path = paths.begin();
     wxString prefix = *path;
     while (++path != paths.end() && !prefix.empty()) {
-        // Asked for the length alone: the function's own buffer holds no long path. For a bare drive it counts the
-        // backslash.
+        // Without a buffer the function returns the length alone; its buffer could not hold a long path. The length of
+        // a bare drive includes the backslash.
         const int length = PathCommonPrefixW(prefix.wc_str(), path->wc_str(), nullptr);
         prefix.Truncate(static_cast<std::size_t>(std::max(length, 0)));
     }
@@ -64,7 +43,7 @@ bool anyTargetExists(const PathSet& paths, const wxString& prefix, const wxStrin
 
 std::optional<wxString> askFileName(HWND owner, const wxString& preset)
 {
-    std::vector<wchar_t> name(kFileNameBuffer);
+    std::vector<wchar_t> name(kFileNameChars);
     std::copy_n(preset.wc_str(), std::min(preset.length(), name.size() - 1), name.begin());
     std::wstring filter = _("All Files (*.*)").ToStdWstring();
     filter.append(1, L'\0').append(L"*.*").append(1, L'\0');
@@ -86,17 +65,14 @@ std::optional<wxString> askFileName(HWND owner, const wxString& preset)
 
 std::optional<wxString> askFolder(HWND owner)
 {
-    RefPtr<IMalloc> allocator;
-    if (FAILED(SHGetMalloc(allocator.out())))
-        return std::nullopt;
     const wxString title = _("Select a folder to save your restored files in.");
     BROWSEINFOW box{};
     box.hwndOwner = owner;
     box.lpszTitle = title.wc_str();
     box.ulFlags = BIF_RETURNONLYFSDIRS | BIF_NEWDIALOGSTYLE;
-    const ItemIdList chosen(SHBrowseForFolderW(&box), *allocator.get());
+    const ItemIdList chosen(SHBrowseForFolderW(&box));
     wchar_t path[MAX_PATH];
-    if (!chosen.get() || !SHGetPathFromIDListW(chosen.get(), path))
+    if (!chosen || !SHGetPathFromIDListW(chosen.get(), path))
         return std::nullopt;
     PathAddBackslashW(path);
     return wxString(path);

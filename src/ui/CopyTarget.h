@@ -7,20 +7,20 @@
 
 #include "core/Paths.h"
 
-// Where "Copy To" puts the restored files. The two questions run their own message loops on the calling thread.
+// Where "Copy To" puts the restored files. The two ask functions run a message loop on the calling thread.
 namespace tavi {
 
-// The longest leading part, in whole components, that all paths share; letter case does not count. A single path is its
-// own.
+// Returns the longest leading part, in whole components, that all paths share, ignoring letter case; for a single path
+// the path itself.
 wxString commonPrefix(const PathSet& paths);
 
-// Whether anything exists where one of the paths, less the prefix, would land behind the folder.
+// Returns whether a file or folder exists at one of the targets: the folder and the path without the prefix.
 bool anyTargetExists(const PathSet& paths, const wxString& prefix, const wxString& folder);
 
-// Nothing when the user cancels.
+// Returns nothing when the user cancels.
 std::optional<wxString> askFileName(HWND owner, const wxString& preset);
 
-// The chosen folder with a backslash at its end; nothing when the user cancels.
+// Returns the chosen folder with a backslash at its end, or nothing when the user cancels.
 std::optional<wxString> askFolder(HWND owner);
 
 } // namespace tavi

@@ -22,18 +22,19 @@
 namespace tavi {
 namespace {
 
-constexpr UINT kPipeMessage = WM_USER + 1;
-// From a thread that dropped the last reference: only the window's own thread can destroy the window.
-constexpr UINT kEndWindow = WM_APP;
+// Notifies the dialog of pending messages. lParam is one of them.
+constexpr UINT kMessagesPending = WM_USER + 1;
 constexpr UINT_PTR kTimer = 1;
-constexpr UINT kTimerMilliseconds = 250;
-constexpr DWORD kHiddenMilliseconds = 500;
+constexpr UINT kTimerMs = 250;
+// A restore that ends sooner must not flash a window.
+constexpr DWORD kShowAfterMs = 500;
 
-struct TheWindow {
+// The registered window.
+struct Registry {
     CriticalSection lock;
     std::shared_ptr<RestoreProgressWindow> window;
 };
-TheWindow theWindow;
+Registry theRegistry;
 
 void deliverToWindow(std::unique_ptr<PipeMessage> message)
 {
@@ -41,71 +42,27 @@ void deliverToWindow(std::unique_ptr<PipeMessage> message)
         window->deliver(std::move(message));
 }
 
-INT_PTR handleWithoutObject(HWND window, UINT message, LPARAM lParam)
-{
-    switch (message) {
-    case WM_DESTROY:
-        KillTimer(window, kTimer);
-        PostQuitMessage(0);
-        return TRUE;
-    case kPipeMessage:
-        // The message was destroyed with the object. The dialog manager's own message of that number has no lParam.
-        return lParam != 0 ? TRUE : FALSE;
-    case kEndWindow:
-    // Should the request not have come through.
-    case WM_TIMER:
-        DestroyWindow(window);
-        return FALSE;
-    default:
-        return FALSE;
-    }
-}
-
-INT_PTR CALLBACK progressProcedure(HWND window, UINT message, WPARAM wParam, LPARAM lParam)
+INT_PTR CALLBACK progressProcedure(HWND dialog, UINT message, WPARAM wParam, LPARAM lParam)
 {
     return guarded("progress window", INT_PTR{FALSE}, [&]() -> INT_PTR {
-        const auto object = RestoreProgressWindow::current();
-        // By the time this window goes there may be a new one: its object is none of ours.
-        const bool isOurs =
-            object && (message == WM_INITDIALOG ? object->adoptDialog(window) : object->dialog() == window);
-        return isOurs ? object->handleMessage(window, message, wParam, lParam)
-                      : handleWithoutObject(window, message, lParam);
+        auto* const window = dialogObject<RestoreProgressWindow>(dialog, message, lParam);
+        return window ? window->handleMessage(dialog, message, wParam, lParam) : FALSE;
     });
 }
 
-void runMessageLoop(HWND window)
+void runProgressWindow(void* argument)
 {
-    const DWORD start = GetTickCount();
-    bool shown = false;
-    MSG message;
-    while (GetMessageW(&message, nullptr, 0, 0) > 0) {
-        if (!IsDialogMessageW(window, &message)) {
-            TranslateMessage(&message);
-            DispatchMessageW(&message);
-        }
-        // What ends sooner is not worth a flash on the screen. The timer sees to it that messages keep coming.
-        if (!shown && GetTickCount() - start >= kHiddenMilliseconds) {
-            shown = true;
-            ShowWindow(window, SW_SHOW);
-        }
-    }
-}
-
-void runProgressWindow(void*)
-{
+    const auto window = static_cast<RestoreProgressWindow*>(argument)->shared_from_this();
     ++moduleRefCount();
     const ActivationScope activation;
-    const HWND window =
-        CreateDialogParamW(moduleInstance(), MAKEINTRESOURCEW(TAVI_DIALOG_PROGRESS), nullptr, progressProcedure, 0);
-    if (!window) {
-        // The count stays raised: the object stays registered too, and it must not outlive the module.
+    const HWND dialog = CreateDialogParamW(moduleInstance(), MAKEINTRESOURCEW(TAVI_DIALOG_PROGRESS), nullptr,
+                                           progressProcedure, reinterpret_cast<LPARAM>(window.get()));
+    if (!dialog) {
+        // The count stays raised: the window stays registered for its restores and needs the module's code.
         wxLogError("Unable to create the progress window (%lu)", GetLastError());
         return;
     }
-    // The restore may have ended before there was a dialog to tell.
-    if (const auto object = RestoreProgressWindow::current(); !object || object->dialog() != window)
-        DestroyWindow(window);
-    runMessageLoop(window);
+    runDialogLoop(dialog, kShowAfterMs);
     --moduleRefCount();
     CoFreeUnusedLibraries();
 }
@@ -114,68 +71,45 @@ void runProgressWindow(void*)
 
 void RestoreProgressWindow::getOrCreate()
 {
-    const std::lock_guard guard(theWindow.lock);
-    if (!theWindow.window) {
+    const std::lock_guard guard(theRegistry.lock);
+    auto& window = theRegistry.window;
+    if (!window) {
         transferStatus();
         setMessageSink(deliverToWindow);
-        theWindow.window = std::make_shared<RestoreProgressWindow>();
-        if (!KernelHandle(startModuleThread(runProgressWindow, nullptr))) {
+        window = std::make_shared<RestoreProgressWindow>();
+        if (!KernelHandle(startModuleThread(runProgressWindow, window.get()))) {
             wxLogError("Unable to start the progress window (%lu)", GetLastError());
-            theWindow.window.reset();
+            window.reset();
             return;
         }
     }
-    ++theWindow.window->refs_;
+    ++window->restores_;
 }
 
-RestoreProgressWindow::Reference RestoreProgressWindow::current()
+std::shared_ptr<RestoreProgressWindow> RestoreProgressWindow::current()
 {
-    const std::lock_guard guard(theWindow.lock);
-    if (theWindow.window)
-        ++theWindow.window->refs_;
-    return Reference(theWindow.window);
+    const std::lock_guard guard(theRegistry.lock);
+    return theRegistry.window;
 }
 
-bool RestoreProgressWindow::isRegistered() const
+bool RestoreProgressWindow::isCurrent() const
 {
-    const std::lock_guard guard(theWindow.lock);
-    return theWindow.window.get() == this;
+    const std::lock_guard guard(theRegistry.lock);
+    return restores_ > 0;
 }
 
-void RestoreProgressWindow::release()
+void RestoreProgressWindow::dropRestore()
 {
-    if (--refs_ > 0)
-        return;
-    std::shared_ptr<RestoreProgressWindow> self;
-    HWND window = nullptr;
-    {
-        const std::lock_guard guard(theWindow.lock);
-        // Someone may have taken a new reference, or dropped the last one, meanwhile.
-        if (refs_ > 0 || theWindow.window.get() != this)
-            return;
-        self.swap(theWindow.window);
-        window = dialog_.exchange(nullptr);
-    }
-    destroy(window);
+    const std::lock_guard guard(theRegistry.lock);
+    if (--restores_ == 0)
+        theRegistry.window.reset();
 }
 
-void RestoreProgressWindow::destroy(HWND window)
+void RestoreProgressWindow::dropAllRestores()
 {
-    if (window && GetWindowThreadProcessId(window, nullptr) == GetCurrentThreadId())
-        DestroyWindow(window);
-    else if (window)
-        PostMessageW(window, kEndWindow, 0, 0);
-    lock_.reset();
-    CoFreeUnusedLibraries();
-}
-
-bool RestoreProgressWindow::adoptDialog(HWND dialog)
-{
-    const std::lock_guard guard(theWindow.lock);
-    if (theWindow.window.get() != this || dialog_)
-        return false;
-    dialog_ = dialog;
-    return true;
+    const std::lock_guard guard(theRegistry.lock);
+    if (std::exchange(restores_, 0) > 0)
+        theRegistry.window.reset();
 }
 
 INT_PTR RestoreProgressWindow::handleMessage(HWND window, UINT message, WPARAM wParam, LPARAM lParam)
@@ -191,21 +125,21 @@ INT_PTR RestoreProgressWindow::handleMessage(HWND window, UINT message, WPARAM w
         transferStatus().timerTick();
         refresh();
         return TRUE;
-    case kPipeMessage:
-        // The dialog manager has the same number for another message of its own, which carries none of ours.
+    case kMessagesPending:
+        // The dialog manager uses this number, too: DM_SETDEFID.
         if (!acceptNotification(reinterpret_cast<const PipeMessage*>(lParam)))
             return FALSE;
-        handlePending();
+        handlePending(window);
         return TRUE;
     case WM_COMMAND:
-        // A failure to tell the service must not keep the window open.
+        // The window closes even if the service cannot be told.
         if (LOWORD(wParam) == TAVI_PROGRESS_CANCEL) {
             guarded("restore cancellation", [] {
                 auto command = CommandPipe::cancelRestore();
                 CommandPipe::sendCommand(command);
             });
         }
-        // Closing alone leaves the restore to go on at the service.
+        // With Close the service goes on with the restore.
         if (LOWORD(wParam) == TAVI_PROGRESS_CANCEL || LOWORD(wParam) == TAVI_PROGRESS_CLOSE)
             DestroyWindow(window);
         return FALSE;
@@ -216,8 +150,9 @@ INT_PTR RestoreProgressWindow::handleMessage(HWND window, UINT message, WPARAM w
         dialog_ = nullptr;
         KillTimer(window, kTimer);
         PostQuitMessage(0);
-        while (isRegistered())
-            release();
+        dropAllRestores();
+        lock_.reset();
+        CoFreeUnusedLibraries();
         return TRUE;
     default:
         return FALSE;
@@ -226,7 +161,8 @@ INT_PTR RestoreProgressWindow::handleMessage(HWND window, UINT message, WPARAM w
 
 void RestoreProgressWindow::initialize(HWND window)
 {
-    SetTimer(window, kTimer, kTimerMilliseconds, nullptr);
+    dialog_ = window;
+    SetTimer(window, kTimer, kTimerMs, nullptr);
     progressBar_ = GetDlgItem(window, TAVI_PROGRESS_BAR);
     SendMessageW(progressBar_, PBM_SETRANGE32, 0, TransferStatus::kBarRange);
     SetWindowTextW(window, _("Restoring...").wc_str());
@@ -246,8 +182,7 @@ void RestoreProgressWindow::deliver(std::unique_ptr<PipeMessage> message)
         const std::lock_guard guard(pendingLock_);
         notification = pending_.put(std::move(message));
     }
-    // Does not wait for the window.
-    if (notification && !SendNotifyMessageW(dialog, kPipeMessage, 0, reinterpret_cast<LPARAM>(notification))) {
+    if (notification && !SendNotifyMessageW(dialog, kMessagesPending, 0, reinterpret_cast<LPARAM>(notification))) {
         const std::lock_guard guard(pendingLock_);
         pending_.clear();
     }
@@ -265,40 +200,36 @@ std::unique_ptr<PipeMessage> RestoreProgressWindow::takePending()
     return pending_.take();
 }
 
-void RestoreProgressWindow::handlePending()
+void RestoreProgressWindow::handlePending(HWND window)
 {
-    // With no reference but the caller's the window is ending: the rest is destroyed with the object.
-    while (refs_ > 1) {
+    while (isCurrent()) {
         const auto message = takePending();
-        if (!message)
-            break;
-        handlePipeMessage(*message);
+        if (!message) {
+            // The transfer status has had all of these messages already, so one refresh is enough.
+            refresh();
+            return;
+        }
+        if (message->kind() == MessageKind::event)
+            handleEvent(message->type());
+        else if (message->kind() == MessageKind::snapshot)
+            beginAnew();
     }
-    // The status is already past all of these messages.
-    refresh();
-}
-
-void RestoreProgressWindow::handlePipeMessage(const PipeMessage& message)
-{
-    if (message.kind() == MessageKind::event) {
-        handleEvent(message.type());
-    } else if (message.kind() == MessageKind::snapshot) {
-        beginAnew();
-    }
+    // The last restore has ended. Messages that are still pending are destroyed with this object.
+    DestroyWindow(window);
 }
 
 void RestoreProgressWindow::handleEvent(EventType type)
 {
     switch (type) {
     case EventType::restoreEnded:
-        release();
+        dropRestore();
         [[fallthrough]];
     case EventType::restoreStarted:
         beginAnew();
         awaitingFirstItem_ = true;
         break;
     case EventType::restoreItem:
-        // The speed counts from the first item and not from the search for it.
+        // The speed must not include the time of the search for the first item.
         if (std::exchange(awaitingFirstItem_, false))
             transferStatus().restoreRing.clearRing();
         break;
@@ -309,7 +240,7 @@ void RestoreProgressWindow::handleEvent(EventType type)
 
 void RestoreProgressWindow::beginAnew()
 {
-    // The position is only noted, not sent: the bar moves with the first amount that differs.
+    // The bar itself keeps its position until the next refresh with another one.
     position_ = 0;
     remainingLine_.clear();
     statusLine_.clear();

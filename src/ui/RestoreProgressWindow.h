@@ -14,75 +14,49 @@
 
 namespace tavi {
 
-// The "Restoring..." window, at most one in the process, with a thread and a message loop of its own: the shell's
-// threads that ask for it must not be kept. It follows the transfer status and cancels the restore on request.
+// The "Restoring..." window, at most one in the process. It follows the transfer status and cancels the restore when
+// the user asks for it. It has a thread and a message loop of its own, because the host's threads must not wait for it.
 //
-// Counted: each queued restore holds one reference, which the service's report of its end drops, and whoever is at work
-// with the window holds one meanwhile. With the last one the window goes. When the user closes it, it goes at once
-// whatever references remain; dropping those later does nothing. The memory lives as long as any of them.
-class RestoreProgressWindow {
+// Each queued restore holds the window until the service reports its end. The window closes with the last of them, or
+// at once when the user closes it. Shared pointers keep the memory only.
+class RestoreProgressWindow : public std::enable_shared_from_this<RestoreProgressWindow> {
   public:
-    // Makes the window if there is none, and adds the reference that stands for the restore. Any thread.
+    // Adds a restore to the window, which is created if there is none. Any thread.
     static void getOrCreate();
-
-    // A reference for as long as it lives, or none.
-    class Reference {
-      public:
-        explicit Reference(std::shared_ptr<RestoreProgressWindow> window) noexcept : window_(std::move(window)) {}
-        Reference(Reference&&) noexcept = default;
-        Reference& operator=(Reference&&) = delete;
-        ~Reference()
-        {
-            if (window_)
-                window_->release();
-        }
-        RestoreProgressWindow* operator->() const noexcept
-        {
-            return window_.get();
-        }
-        explicit operator bool() const noexcept
-        {
-            return window_ != nullptr;
-        }
-
-      private:
-        std::shared_ptr<RestoreProgressWindow> window_;
-    };
-    // Any thread.
-    static Reference current();
+    // Returns the window while a restore holds it, else null. Any thread.
+    static std::shared_ptr<RestoreProgressWindow> current();
 
     RestoreProgressWindow() = default;
     RestoreProgressWindow(const RestoreProgressWindow&) = delete;
     RestoreProgressWindow& operator=(const RestoreProgressWindow&) = delete;
 
-    // Empty until the window exists and again once it is going. Any thread.
+    // Returns null before the dialog exists and once it is being destroyed. Any thread.
     HWND dialog() const noexcept
     {
         return dialog_;
     }
-    // Adds a message for the window to handle and notifies it, without waiting. Destroys the message when there is no
-    // window. Messages that the window never handles are destroyed with this object. Any thread.
+    // Adds a pending message and notifies the dialog, without waiting. Destroys the message if there is no dialog. Any
+    // thread.
     void deliver(std::unique_ptr<PipeMessage> message);
 
-    // Below: the window's thread.
-    bool adoptDialog(HWND dialog);
+    // Handles a message of the dialog and returns the dialog procedure's result. The dialog's thread.
     INT_PTR handleMessage(HWND window, UINT message, WPARAM wParam, LPARAM lParam);
 
   private:
-    void release();
-    void destroy(HWND window);
-    bool isRegistered() const;
+    bool isCurrent() const;
+    void dropRestore();
+    void dropAllRestores();
     void initialize(HWND window);
     bool acceptNotification(const PipeMessage* notification);
     std::unique_ptr<PipeMessage> takePending();
-    void handlePending();
-    void handlePipeMessage(const PipeMessage& message);
+    void handlePending(HWND window);
     void handleEvent(EventType type);
     void beginAnew();
     void refresh();
     void showText(int control, wxString& shown, const wxString& text);
 
-    std::atomic<std::int32_t> refs_{0};
+    // Guarded by the lock of the registered window; 0 once this is not the registered one.
+    std::int32_t restores_ = 0;
     std::atomic<HWND> dialog_{nullptr};
     HWND progressBar_ = nullptr;
     wxString statusLine_;

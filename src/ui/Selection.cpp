@@ -15,27 +15,28 @@
 namespace tavi {
 namespace {
 
-// Counts into the three-valued summary: nothing but the second kind, nothing but the first, or both.
-class KindFlags {
+// Counts items with a property and items without it.
+class CoverageCounter {
   public:
-    void add(bool firstKind) noexcept
+    void add(bool hasProperty) noexcept
     {
-        (firstKind ? first_ : second_) = true;
+        (hasProperty ? with_ : without_) = true;
     }
-    bool both() const noexcept
+    bool isMixed() const noexcept
     {
-        return first_ && second_;
+        return with_ && without_;
     }
-    std::int32_t summary() const noexcept
+    Coverage coverage() const noexcept
     {
-        return both() ? -1 : first_ ? 1 : 0;
+        return isMixed() ? Coverage::some : with_ ? Coverage::all : Coverage::none;
     }
 
   private:
-    bool first_ = false;
-    bool second_ = false;
+    bool with_ = false;
+    bool without_ = false;
 };
 
+// The data object's global memory, locked.
 class Medium {
   public:
     explicit Medium(IDataObject& data) noexcept
@@ -70,7 +71,7 @@ class Medium {
     const unsigned char* bytes_ = nullptr;
 };
 
-// The item id lists of a block that any program may have made: nothing outside the block is read.
+// The item id lists of a memory block that any program may have filled. Reads nothing outside the block.
 class IdListArray {
   public:
     IdListArray(const unsigned char* bytes, std::size_t size) noexcept : bytes_(bytes), size_(size)
@@ -86,7 +87,7 @@ class IdListArray {
     {
         return count_;
     }
-    // Index 0 is the parent. Null for a list that does not end inside the block.
+    // Returns the parent for index 0, else a child, or null for a list that does not end inside the block.
     LPCITEMIDLIST list(std::size_t index) const noexcept
     {
         if (size_ == 0)
@@ -175,52 +176,51 @@ PathSet collectPaths(LPCITEMIDLIST folder, IDataObject* data, DriveTypeQuery dri
     return paths;
 }
 
-std::int32_t summarizeStates(const PathSet& paths, FolderStateTable& states)
+Coverage summarizeStates(const PathSet& paths, FolderStateTable& states)
 {
-    KindFlags flags;
+    CoverageCounter counter;
     if (paths.empty())
-        return flags.summary();
+        return counter.coverage();
     try {
         const FolderStateTable::ReadScope reading(states);
         for (const wxString& path : paths) {
             const FolderState state = states.getFolderState(path);
-            flags.add(state == FolderState::offAllOn || state == FolderState::allOn);
-            if (flags.both())
+            counter.add(state == FolderState::offAllOn || state == FolderState::allOn);
+            if (counter.isMixed())
                 break;
         }
     } catch (const DbException& error) {
-        // What failed for one item fails for the others too, and each failure may have waited for the database's
-        // time-out.
+        // The other items would fail, too, and each may have to wait for the database's timeout.
         wxLogWarning("Failed to retrieve folder state (%d: %s)", error.code(), error.message());
-        flags.add(false);
+        counter.add(false);
     }
-    return flags.summary();
+    return counter.coverage();
 }
 
 void summarizeVersions(Selection& selection, const Manifest* manifest)
 {
-    KindFlags flags;
+    CoverageCounter counter;
     selection.isFolder = false;
     if (manifest) {
         std::wstring folder;
         for (const wxString& path : selection.paths) {
-            if (flags.both() && selection.isFolder)
+            if (counter.isMixed() && selection.isFolder)
                 break;
             const bool directory = isDirectory(path);
             selection.isFolder |= directory;
-            if (flags.both())
+            if (counter.isMixed())
                 continue;
             if (directory) {
                 folder = view(path);
                 if (folder.back() != L'\\')
                     folder.push_back(L'\\');
-                flags.add(manifest->hasBackedUpUnder(folder, kAnyTime));
+                counter.add(manifest->hasBackedUpUnder(folder, kAnyTime));
             } else {
-                flags.add(manifest->isBackedUp(view(path), kAnyTime));
+                counter.add(manifest->isBackedUp(view(path), kAnyTime));
             }
         }
     }
-    selection.restoreMode = flags.summary();
+    selection.restoreMode = counter.coverage();
     selection.displayName = selection.paths.size() == 1 ? selection.paths.begin()->AfterLast(L'\\') : wxString();
 }
 

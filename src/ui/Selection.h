@@ -14,26 +14,31 @@ namespace tavi {
 
 class FolderStateTable;
 
-// What the shell handed over, condensed. A plain value of the object that captured it.
+// How many of the selected items have a property.
+enum class Coverage : std::int32_t { some = -1, none = 0, all = 1 };
+
+// The items that the host selected, and what the menu and the dialogs need to know of them.
 struct Selection {
     PathSet paths;
-    // How many of the items have the wanted property: 0 none, 1 all, -1 some.
-    std::int32_t stateSummary = 0;
-    std::int32_t restoreMode = 0;
+    // The items below which everything is backed up. Recorded only: the menu does not depend on it.
+    Coverage stateSummary = Coverage::none;
+    // The items with versions in the manifest.
+    Coverage restoreMode = Coverage::none;
+    // Whether a folder is among the items.
     bool isFolder = false;
-    // Of a single item; empty for several and for a drive.
+    // The name of a single item; empty for several items and for a drive.
     wxString displayName;
 };
 
-// Replaces the selection by the open folder and the data object's items, either of which may be null. What cannot be
-// read is left out.
+// Replaces the selection by the open folder and the data object's items, either of which may be null. Leaves out items
+// that cannot be read.
 void captureSelection(LPCITEMIDLIST folder, IDataObject* data, FolderStateTable& states, Selection& selection);
 
-// The steps of the capture, for callers that bring their own surroundings.
+// The steps of the capture, for tests and tools.
 using DriveTypeQuery = UINT(WINAPI*)(LPCWSTR root);
 PathSet collectPaths(LPCITEMIDLIST folder, IDataObject* data, DriveTypeQuery driveType);
-std::int32_t summarizeStates(const PathSet& paths, FolderStateTable& states);
-// Sets restoreMode, isFolder and displayName from the paths; the manifest may be null.
+Coverage summarizeStates(const PathSet& paths, FolderStateTable& states);
+// Sets restoreMode, isFolder and displayName from the paths. The manifest may be null.
 void summarizeVersions(Selection& selection, const Manifest* manifest);
 
 } // namespace tavi

@@ -1,7 +1,5 @@
 #include "ui/VersionsDialog.h"
 
-#include <algorithm>
-#include <atomic>
 #include <string>
 #include <unordered_set>
 #include <utility>
@@ -20,22 +18,20 @@
 #include "core/ModuleThread.h"
 #include "core/LocalePattern.h"
 #include "core/Module.h"
+#include "core/ScopeGuard.h"
 #include "core/Utf8.h"
 #include "restore/RestoreRequest.h"
 #include "ui/ActivationScope.h"
 #include "ui/CopyTarget.h"
 #include "ui/RestoreProgressWindow.h"
-#include "ui/Texts.h"
 #include "ui/WindowFrame.h"
 #include "ui/resource.h"
 
 namespace tavi {
 namespace {
 
-// The reserved manifest path whose versions stand for the backup runs as a whole.
+// The reserved manifest path whose versions are the backup runs.
 constexpr const wchar_t* kBackupRuns = L"simple.map";
-
-std::atomic<ProgressWindowOpener> progressWindowOpener{RestoreProgressWindow::getOrCreate};
 
 // The shell's folder browser needs OLE on its thread.
 class OleScope {
@@ -51,23 +47,6 @@ class OleScope {
 
   private:
     bool initialized_;
-};
-
-class FlagScope {
-  public:
-    explicit FlagScope(bool& flag) noexcept : flag_(flag)
-    {
-        flag_ = true;
-    }
-    ~FlagScope()
-    {
-        flag_ = false;
-    }
-    FlagScope(const FlagScope&) = delete;
-    FlagScope& operator=(const FlagScope&) = delete;
-
-  private:
-    bool& flag_;
 };
 
 struct VersionRow {
@@ -93,7 +72,8 @@ wxString formatTime(std::uint32_t seconds, const wxString& pattern)
     return wxDateTime(wxLongLong(static_cast<wxLongLong_t>(seconds) * 1000)).Format(pattern);
 }
 
-// A name with its middle taken out, so that `kept` characters of it remain. Surrogate pairs stay whole.
+// Returns the name with an ellipsis in place of its middle, so that `kept` characters remain. Keeps surrogate pairs
+// whole.
 wxString shortenMiddle(const wxString& name, std::size_t kept)
 {
     if (kept >= name.length())
@@ -111,14 +91,13 @@ wxString shortenMiddle(const wxString& name, std::size_t kept)
 INT_PTR CALLBACK dialogProcedure(HWND window, UINT message, WPARAM wParam, LPARAM lParam)
 {
     return guarded("versions dialog", INT_PTR{FALSE}, [&]() -> INT_PTR {
-        if (message == WM_INITDIALOG)
-            SetWindowLongPtrW(window, GWLP_USERDATA, lParam);
-        auto* const dialog = reinterpret_cast<VersionsDialog*>(GetWindowLongPtrW(window, GWLP_USERDATA));
+        auto* const dialog = dialogObject<VersionsDialog>(window, message, lParam);
         return dialog ? dialog->handleMessage(window, message, wParam, lParam) : FALSE;
     });
 }
 
-// Counts as an object of the module from before the thread starts until its last step.
+// What the thread of a dialog starts with. Counts as an object of the module from before the thread until its last
+// step.
 struct DialogStart {
     ModuleLock lock;
     Selection selection;
@@ -132,7 +111,7 @@ void runDialog(void* argument)
     const OleScope ole;
     const ActivationScope activation;
     const auto dialog = std::make_shared<VersionsDialog>(std::move(start->selection), std::move(start->manifest), true);
-    // No owner: one on another thread would tie the host's input to ours.
+    // No owner: the kernel would join the input queues of this thread and the owner's.
     const WindowHandle window(CreateDialogParamW(moduleInstance(), MAKEINTRESOURCEW(TAVI_DIALOG_VERSIONS), nullptr,
                                                  dialogProcedure, reinterpret_cast<LPARAM>(dialog.get())));
     if (!window) {
@@ -140,18 +119,12 @@ void runDialog(void* argument)
         return;
     }
     placeWindow(window.get(), start->host);
-    // In front first, focus after: a window that has the focus before it is in front keeps the caption of a background
+    // The foreground comes before the focus: a window that gets the focus first keeps the caption of an inactive
     // window.
     ShowWindow(window.get(), SW_SHOWNA);
     SetForegroundWindow(window.get());
     SetFocus(GetDlgItem(window.get(), TAVI_VERSIONS_LIST));
-    MSG message;
-    while (GetMessageW(&message, nullptr, 0, 0) > 0) {
-        if (!IsDialogMessageW(window.get(), &message)) {
-            TranslateMessage(&message);
-            DispatchMessageW(&message);
-        }
-    }
+    runDialogLoop(window.get());
 }
 
 } // namespace
@@ -167,11 +140,6 @@ bool startVersionsDialog(Selection selection, ManifestRef manifest, HWND host)
     return true;
 }
 
-void setProgressWindowOpener(ProgressWindowOpener opener) noexcept
-{
-    progressWindowOpener = opener;
-}
-
 VersionsDialog::VersionsDialog(Selection selection, ManifestRef manifest, bool ownThread)
     : paths_(std::move(selection.paths)), coverage_(selection.restoreMode), manifest_(std::move(manifest)),
       ownThread_(ownThread)
@@ -182,7 +150,7 @@ VersionsDialog::VersionsDialog(Selection selection, ManifestRef manifest, bool o
 
 VersionsDialog::~VersionsDialog()
 {
-    // The module lock, the first member, is released last: COM must not unmap the code that makes this call.
+    // The module lock, the first member, is released after this call, so that COM does not unmap this code.
     if (!ownThread_)
         CoFreeUnusedLibraries();
 }
@@ -207,7 +175,7 @@ INT_PTR VersionsDialog::handleMessage(HWND window, UINT message, WPARAM wParam, 
         runCommand(LOWORD(wParam));
         return TRUE;
     case WM_CLOSE:
-        // A page's window is the sheet's to destroy.
+        // The property sheet destroys the window of its page.
         if (ownThread_)
             DestroyWindow(window);
         return TRUE;
@@ -255,7 +223,7 @@ void VersionsDialog::setTexts()
         message = fitName(_("The following versions of %s are backed up on the Tavi servers.  You can select one and "
                             "restore it, or copy it to a different location."),
                           singleFile_.AfterLast(L'\\'));
-    else if (coverage_ == 1)
+    else if (coverage_ == Coverage::all)
         message =
             _("The following versions of the items you selected are backed up on the Tavi servers.  You can select "
               "one and restore the files, or copy them to a different location.");
@@ -274,13 +242,17 @@ wxString VersionsDialog::fitName(const wxString& text, const wxString& name) con
     const ScreenDc dc(GetDC(nullptr));
     const auto font = reinterpret_cast<HGDIOBJ>(SendMessageW(control, WM_GETFONT, 0, 0));
     const HGDIOBJ previous = font ? SelectObject(dc.get(), font) : nullptr;
+    const ScopeGuard deselect([&] {
+        if (previous)
+            SelectObject(dc.get(), previous);
+    });
     const auto fits = [&](std::size_t kept) {
         const wxString whole = withName(text, shortenMiddle(name, kept));
         RECT needed = room;
         DrawTextW(dc.get(), whole.wc_str(), -1, &needed, DT_CALCRECT | DT_WORDBREAK | DT_NOPREFIX);
         return needed.right <= room.right && needed.bottom <= room.bottom;
     };
-    // The most characters that neither widen the text nor add a line that the control cannot show.
+    // A binary search for the most characters with which the text still fits.
     std::size_t kept = name.length();
     if (!fits(kept)) {
         std::size_t tooMany = kept;
@@ -289,8 +261,6 @@ wxString VersionsDialog::fitName(const wxString& text, const wxString& name) con
             (fits(middle) ? kept : tooMany) = middle;
         }
     }
-    if (previous)
-        SelectObject(dc.get(), previous);
     return withName(text, shortenMiddle(name, kept));
 }
 
@@ -351,7 +321,7 @@ void VersionsDialog::addRows()
     SendMessageW(control, WM_SETREDRAW, TRUE, 0);
     if (selected)
         SendMessageW(control, LVM_ENSUREVISIBLE, rows.size() - 1, FALSE);
-    // Whether inserting a selected row is announced differs between versions of the control.
+    // Some versions of the control send no LVN_ITEMCHANGED for a row that is inserted selected.
     enableActions(selected);
 }
 
@@ -364,11 +334,12 @@ void VersionsDialog::enableActions(bool enabled) const
 void VersionsDialog::runCommand(UINT id)
 {
     const bool closes = id == IDCANCEL || id == TAVI_VERSIONS_RESTORE || id == TAVI_VERSIONS_COPY_TO;
-    // A second command while a box of the first is open is not the user's.
+    // The user cannot give a second command while a box of the first is open; another program can.
     if (!closes || busy_)
         return;
     {
-        const FlagScope busy(busy_);
+        busy_ = true;
+        const ScopeGuard done([&] { busy_ = false; });
         guarded("versions dialog command", [&] {
             if (id == TAVI_VERSIONS_RESTORE)
                 restoreInPlace();
@@ -376,7 +347,7 @@ void VersionsDialog::runCommand(UINT id)
                 isSingleFile() ? copyFile() : copyToFolder();
         });
     }
-    // Whatever was answered; a box may have outlived the window.
+    // The window closes whatever the answer was. It may be destroyed already, while the box was open.
     if (!IsWindow(window_))
         return;
     if (ownThread_)
@@ -395,7 +366,7 @@ std::optional<bool> VersionsDialog::askOverwrite(const wxString& question, UINT 
 
 void VersionsDialog::restoreInPlace()
 {
-    // The second text ends like the first, "it" and all, as it is known to users and translators.
+    // The second text ends in "it", too: existing catalogues translate that text.
     const auto overwrite =
         askOverwrite(isSingleFile() ? _("Restoring this file will overwrite your current version, and you will lose "
                                         "any changes\r\nthat have been "
@@ -410,7 +381,7 @@ void VersionsDialog::restoreInPlace()
 
 void VersionsDialog::copyFile()
 {
-    // The save box asks before it accepts the name of an existing file, so existing files may be replaced.
+    // The save box has asked the user before it accepts the name of an existing file.
     if (const auto target = askFileName(window_, singleFile_))
         request(singleFile_, *target, true);
 }
@@ -461,8 +432,7 @@ void VersionsDialog::request(const wxString& sourcePrefix, const wxString& desti
     request.overwrite = overwrite;
     SetCursor(LoadCursorW(nullptr, IDC_WAIT));
     performRestore(request, *manifest_);
-    if (const ProgressWindowOpener open = progressWindowOpener)
-        open();
+    RestoreProgressWindow::getOrCreate();
 }
 
 } // namespace tavi

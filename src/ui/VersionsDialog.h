@@ -15,28 +15,25 @@ namespace tavi {
 
 struct RestoreRequest;
 
-// Opens the "Restore Files" window for the selection on a thread of its own, on the monitor of the host's window (which
-// may be null). Any thread; any number of windows. False, with a line in the log, if the thread could not start.
+// Opens the "Restore Files" window for the selection, with a thread of its own, on the monitor of the host's window
+// (which may be null). Any thread; any number of windows. Returns false and logs an error if the thread cannot start.
 bool startVersionsDialog(Selection selection, ManifestRef manifest, HWND host);
 
-// What makes sure that the progress window exists, called on the dialog's thread after a restore was requested. May be
-// null.
-using ProgressWindowOpener = void (*)();
-void setProgressWindowOpener(ProgressWindowOpener opener) noexcept;
-
-// The behaviour of dialog 102, whoever hosts the window. Used by the window's thread only; held by a shared pointer,
-// because the boxes it opens run message loops in which the window and its host's hold on the object may go. Counts as
-// an object of the module until the last frame that uses it has returned.
+// The behaviour of the versions dialog, in a window of its own or as a page of a property sheet. Used only by the
+// window's thread. Counts as an object of the module.
+//
+// Held by shared pointers: the boxes that it opens run message loops, in which the window and the sheet's reference may
+// go while frames below still use the object.
 class VersionsDialog : public std::enable_shared_from_this<VersionsDialog> {
   public:
-    // With `ownThread` the end of the window ends the thread's message loop; without it the window is a page of a
-    // sheet, whose end lets COM free the libraries that nobody uses any more.
+    // With `ownThread` the destruction of the window ends the thread's message loop. Without it the window is a page,
+    // after which COM may unload libraries that nobody uses any more.
     VersionsDialog(Selection selection, ManifestRef manifest, bool ownThread);
     VersionsDialog(const VersionsDialog&) = delete;
     VersionsDialog& operator=(const VersionsDialog&) = delete;
     ~VersionsDialog();
 
-    // Answers a message as a dialog procedure does. The first one must be WM_INITDIALOG.
+    // Handles a message and returns a dialog procedure's result. The first message must be WM_INITDIALOG.
     INT_PTR handleMessage(HWND window, UINT message, WPARAM wParam, LPARAM lParam);
 
   private:
@@ -49,7 +46,7 @@ class VersionsDialog : public std::enable_shared_from_this<VersionsDialog> {
     void copyFile();
     void copyToFolder();
     void request(const wxString& sourcePrefix, const wxString& destination, bool overwrite);
-    // The answer to a question that decides whether existing files may be replaced; nothing when it was declined.
+    // Asks whether existing files may be overwritten. Returns nothing when the user cancels.
     std::optional<bool> askOverwrite(const wxString& question, UINT icon) const;
     std::optional<std::uint32_t> selectedTime() const;
     void enableActions(bool enabled) const;
@@ -64,7 +61,7 @@ class VersionsDialog : public std::enable_shared_from_this<VersionsDialog> {
     HWND window_ = nullptr;
     PathSet paths_;
     wxString singleFile_;
-    std::int32_t coverage_;
+    Coverage coverage_;
     ManifestRef manifest_;
     bool ownThread_;
     bool busy_ = false;

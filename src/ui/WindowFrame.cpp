@@ -39,4 +39,20 @@ void setWindowIcons(HWND window)
     SendMessageW(window, WM_SETICON, ICON_BIG, icon);
 }
 
+void runDialogLoop(HWND dialog, std::optional<DWORD> showAfterMs)
+{
+    const DWORD start = GetTickCount();
+    MSG message;
+    while (GetMessageW(&message, nullptr, 0, 0) > 0) {
+        if (!IsDialogMessageW(dialog, &message)) {
+            TranslateMessage(&message);
+            DispatchMessageW(&message);
+        }
+        if (showAfterMs && GetTickCount() - start >= *showAfterMs) {
+            ShowWindow(dialog, SW_SHOW);
+            showAfterMs.reset();
+        }
+    }
+}
+
 } // namespace tavi

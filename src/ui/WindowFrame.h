@@ -1,14 +1,30 @@
 #pragma once
 
+#include <optional>
+
 #include <windows.h>
 
-// What the module's top-level windows have in common.
+// Common parts of the module's top-level windows. Called on the window's thread.
 namespace tavi {
 
-// Centres the window over the host's, or on the screen where the user is working, inside the work area.
+// Centres the window over the host's, or on the monitor with the cursor, inside the work area.
 void placeWindow(HWND window, HWND host);
 
-// The restore icon for caption and task bar.
+// Sets the restore icon for caption and task bar.
 void setWindowIcons(HWND window);
+
+// Runs the message loop of a modeless dialog until WM_QUIT. With `showAfterMs` the dialog is hidden and is shown after
+// the first message that ends that much later, so it must have a timer.
+void runDialogLoop(HWND dialog, std::optional<DWORD> showAfterMs = std::nullopt);
+
+// Returns the object that was passed as the dialog's creation parameter, or null before WM_INITDIALOG. For dialog
+// procedures.
+template <class Object>
+Object* dialogObject(HWND dialog, UINT message, LPARAM lParam) noexcept
+{
+    if (message == WM_INITDIALOG)
+        SetWindowLongPtrW(dialog, GWLP_USERDATA, lParam);
+    return reinterpret_cast<Object*>(GetWindowLongPtrW(dialog, GWLP_USERDATA));
+}
 
 } // namespace tavi

@@ -4,12 +4,10 @@
 
 #include <malloc.h>
 
-#include "manifest/CurrentManifest.h"
-#include "core/Handles.h"
 #include "core/InstallPaths.h"
+#include "manifest/CurrentManifest.h"
 #include "tests/support/Dialogs.h"
 #include "ui/MenuBitmap.h"
-#include "ui/resource.h"
 
 namespace tavi {
 namespace {
@@ -27,22 +25,27 @@ struct ContextMenuTest : test::UiTest {
         stopManifestWatcher();
         EXPECT_TRUE(test::waitUntil([] { return !isWatcherActive(); }));
     }
+    static Selection selection(const wxString& name, bool isFolder, Coverage versions)
+    {
+        return {{}, Coverage::none, versions, isFolder, name};
+    }
 
     const Manifest* manifest = nullptr;
-    const Selection one{{}, 0, 1, false, L"50%s & more.txt"}, folder{{}, 0, 1, true, L"caf\u00e9"},
-        files{{}, 0, -1, false, {}}, mixed{{}, 0, -1, true, {}}, none{{}, 0, 0, false, L"a.txt"};
+    const Selection file = selection(L"50%s & more.txt", false, Coverage::all),
+                    folder = selection(L"caf\u00e9", true, Coverage::all), files = selection({}, false, Coverage::some),
+                    mixed = selection({}, true, Coverage::some), none = selection(L"a.txt", false, Coverage::none);
 };
 
 TEST_F(ContextMenuTest, InsertsTheCommandThatFits)
 {
     const std::tuple<Selection, UINT, UINT, std::wstring> cases[] = {
-        {one, 0, CMF_NORMAL, L"-|Restore Previous Version|Open|"},
+        {file, 0, CMF_NORMAL, L"-|Restore Previous Version|Open|"},
         {folder, 1, CMF_EXPLORE, L"Open|-|Restore Files in Folder|"},
         {files, 1, CMF_NORMAL, L"Open|-|Restore Previous Versions|"},
         {mixed, 0, CMF_CANRENAME | 0x100, L"-|Restore Files|Open|"},
         {none, 1, CMF_NORMAL, L"Open|-|"},
-        {one, 0, CMF_DEFAULTONLY, L"Open|"},
-        {one, 0, CMF_NOVERBS | CMF_EXPLORE, L"Open|"},
+        {file, 0, CMF_DEFAULTONLY, L"Open|"},
+        {file, 0, CMF_NOVERBS | CMF_EXPLORE, L"Open|"},
     };
     for (const auto& [selection, index, flags, expected] : cases) {
         const HMENU menu = CreatePopupMenu();
@@ -58,8 +61,9 @@ TEST_F(ContextMenuTest, InsertsTheCommandThatFits)
         MENUITEMINFOW item{};
         item.cbSize = sizeof(item);
         item.fMask = MIIM_CHECKMARKS;
-        EXPECT_EQ(GetMenuItemInfoW(menu, kFirstId, FALSE, &item), GetMenuItemCount(menu) == 3);
-        EXPECT_EQ(used, item.hbmpChecked && item.hbmpChecked == item.hbmpUnchecked ? 1u : 0u);
+        GetMenuItemInfoW(menu, kFirstId, FALSE, &item);
+        EXPECT_EQ(used, item.hbmpChecked && item.hbmpChecked == item.hbmpUnchecked ? 1u : 0u) << texts;
+        EXPECT_EQ(used, texts.find(L"Restore") == std::wstring::npos ? 0u : 1u);
         DestroyMenu(menu);
     }
 }
@@ -70,26 +74,22 @@ TEST_F(ContextMenuTest, KeepsTheManifestOfTheNewestMenu)
     const auto heap = reinterpret_cast<HANDLE>(_get_heap_handle());
     showMenu();
     showMenu();
-    // The watcher's own wait: five seconds until it sees the change.
+    // Makes the watcher load the manifest again, within five seconds.
     wxRegKey settings(getSettingsKeyName());
     settings.Create();
     settings.SetValue(L"options.manifestmtime", L"2037-01-02 03:04:05");
-    const Manifest* next = nullptr;
-    EXPECT_TRUE(test::waitUntil([&] {
-        next = getCurrentManifest().get();
-        return next != manifest;
-    }));
+    EXPECT_TRUE(test::waitUntil([&] { return getCurrentManifest().get() != manifest; }));
     settings.DeleteSelf();
-    // A well-meant release would free a manifest that a menu has seen; without any, manifests would pile up.
     manifest->Release();
-    EXPECT_TRUE(HeapValidate(heap, 0, manifest));
+    EXPECT_TRUE(HeapValidate(heap, 0, manifest)) << "a menu has seen it";
     showMenu();
-    EXPECT_TRUE(test::waitUntil([&] { return !HeapValidate(heap, 0, manifest); })) << "within the watcher's next nap";
+    EXPECT_TRUE(test::waitUntil([&] { return !HeapValidate(heap, 0, manifest); })) << "manifests pile up";
+    const Manifest* const next = getCurrentManifest().get();
     stopManifestWatcher();
     EXPECT_FALSE(HeapValidate(heap, 0, next));
 }
 
-TEST_F(ContextMenuTest, AnswersVerbsAndHelp)
+TEST_F(ContextMenuTest, CopiesVerbsAndHelpTexts)
 {
     translate("Restore files in %s from the Tavi servers.", "Aus %s (100 %) holen: %s");
     constexpr HRESULT cut = static_cast<HRESULT>(0x8007007A);
@@ -97,13 +97,14 @@ TEST_F(ContextMenuTest, AnswersVerbsAndHelp)
         {1, GCS_VERBW, files, 100, S_OK, L"TaviBackup"},
         {2, GCS_VERBA, files, 15, S_OK, L"TaviDontBackup"},
         {2, GCS_VERBA, files, 14, cut, L"TaviDontBacku"},
-        {0, GCS_HELPTEXTW, one, 0x80000000, E_INVALIDARG, L"?"},
-        {0, GCS_HELPTEXTW, one, 100, S_OK, L"Restore an older version of 50%s & more.txt from the Tavi servers."},
+        {0, GCS_VERBW, file, 0, E_INVALIDARG, L"?"},
+        {0, GCS_HELPTEXTW, file, 0x80000000, E_INVALIDARG, L"?"},
+        {0, GCS_HELPTEXTW, file, 100, S_OK, L"Restore an older version of 50%s & more.txt from the Tavi servers."},
         {0, GCS_HELPTEXTW, folder, 100, S_OK, L"Aus caf\u00e9 (100 %) holen: %s"},
         {0, GCS_HELPTEXTA, folder, 9, cut, L"Aus caf\u00e9"},
         {1, GCS_HELPTEXTA, mixed, 100, S_OK, L"Marks the selected items to be backed up with Tavi Remote Backup."},
-        {1, GCS_VALIDATEW, one, 100, S_OK, L"?"},
-        {3, GCS_VERBW, one, 100, E_INVALIDARG, L"?"},
+        {1, GCS_VALIDATEW, file, 100, S_OK, L"?"},
+        {3, GCS_VERBW, file, 100, E_INVALIDARG, L"?"},
     };
     for (const auto& [offset, type, selection, size, result, expected] : cases) {
         wchar_t wide[120] = L"?";
@@ -114,15 +115,16 @@ TEST_F(ContextMenuTest, AnswersVerbsAndHelp)
             MultiByteToWideChar(CP_ACP, 0, narrow, -1, wide, 120);
         EXPECT_EQ(wide, expected);
     }
+    EXPECT_EQ(commandString(0, GCS_VERBA, nullptr, 100, file), E_INVALIDARG);
 }
 
-TEST_F(ContextMenuTest, InvokesByOffsetAndWithAManifestOnly)
+TEST_F(ContextMenuTest, InvokesByOffsetAndOnlyWithAManifest)
 {
-    const auto invoke = [&](LPCSTR verb, HRESULT result, int opened) {
+    const auto invoke = [&](LPCSTR verb, HRESULT result, int dialogs) {
         CMINVOKECOMMANDINFO info{};
         info.lpVerb = verb;
-        EXPECT_EQ(invokeCommand(info, one), result);
-        EXPECT_EQ(moduleRefCount(), opened);
+        EXPECT_EQ(invokeCommand(info, file), result);
+        EXPECT_EQ(moduleRefCount(), dialogs);
     };
     invoke("TaviRestore", E_INVALIDARG, 0);
     invoke(MAKEINTRESOURCEA(1), S_OK, 0);
@@ -131,32 +133,9 @@ TEST_F(ContextMenuTest, InvokesByOffsetAndWithAManifestOnly)
     invoke(MAKEINTRESOURCEA(0), S_OK, 1);
     test::click(test::waitDialog(L"Restore Files"), IDCANCEL);
     test::waitForThreads();
-    // Keeps the start of a watcher, and so a new manifest, from every other thread.
+    // After this only this thread could start a watcher, and so get a new manifest.
     stopManifestWatcher();
     std::thread([&] { invoke(MAKEINTRESOURCEA(0), S_OK, 0); }).join();
-}
-
-using MenuBitmapTest = test::UiTest;
-
-TEST_F(MenuBitmapTest, IsTheIconOnTheFirstBackgroundUntilFreed)
-{
-    for (const COLORREF plain : {0xF0F0F0ul, 0x202020ul}) {
-        const HBITMAP bitmap = menuBitmap(TAVI_ICON_MENU, plain);
-        // Other ids, below and above, do not disturb it, nor does another colour.
-        EXPECT_NE(menuBitmap(TAVI_ICON_OVERLAY, 0), menuBitmap(TAVI_ICON_RESTORE, 0));
-        EXPECT_EQ(menuBitmap(136, 0), nullptr);
-        EXPECT_EQ(menuBitmap(TAVI_ICON_MENU, 0x00FF00), bitmap);
-        const MemoryDc dc(CreateCompatibleDC(nullptr));
-        const HGDIOBJ before = SelectObject(dc.get(), bitmap);
-        const int width = GetSystemMetrics(SM_CXMENUCHECK), size = width * GetSystemMetrics(SM_CYMENUCHECK);
-        int bare = 0;
-        for (int i = 0; i < size; ++i)
-            bare += GetPixel(dc.get(), i % width, i / width) == plain ? 1 : 0;
-        EXPECT_TRUE(bare > size / 5 && bare < size * 4 / 5) << "the icon on the background, at " << bare;
-        SelectObject(dc.get(), before);
-        freeMenuBitmaps();
-        EXPECT_EQ(GetObjectType(bitmap), 0u);
-    }
 }
 
 } // namespace

@@ -15,14 +15,17 @@ using PropertyPageTest = UiTest;
 HPROPSHEETPAGE pageFor(const PathSet& paths, bool isAccepted = true)
 {
     HPROPSHEETPAGE page = nullptr;
-    addPropertyPage({paths, 0, 1, false, {}},
-                    (Manifest::parse(L"FILES\nC:\\f\n5:5:5:5:0::0:0\n\nC:\\gone\n5:5:5:5:0::0:0\n6:5:5:-1:0::0:0")),
+    Selection selection;
+    selection.paths = paths;
+    addPropertyPage(selection,
+                    Manifest::parse(L"FILES\nC:\\f\n5:5:5:5:0::0:0\n\nC:\\gone\n5:5:5:5:0::0:0\n6:5:5:-1:0::0:0"),
                     takePage, isAccepted ? reinterpret_cast<LPARAM>(&page) : 0);
     return page;
 }
 
-HWND openSheet(HPROPSHEETPAGE page)
+HWND openSheet()
 {
+    HPROPSHEETPAGE page = pageFor({L"C:\\f"});
     PROPSHEETHEADERW header{};
     header.dwSize = sizeof(header);
     header.dwFlags = PSH_MODELESS;
@@ -33,37 +36,38 @@ HWND openSheet(HPROPSHEETPAGE page)
 
 // Wine ignores the page description's reference counter. Windows adds one to each module count below while its page
 // exists.
-TEST_F(PropertyPageTest, IsOfferedForWhatIsBackedUp)
+TEST_F(PropertyPageTest, IsOfferedForABackedUpFileAndDestroyedOnce)
 {
     const std::pair<PathSet, int> cases[] = {
         {{}, 0}, {{L"C:\\"}, 0}, {{L"C:\\none"}, 0}, {{L"C:\\gone"}, 0}, {{L"C:\\f"}, 1}, {{L"C:\\none", L"C:\\f"}, 1}};
     for (const auto& [paths, count] : cases) {
         const HPROPSHEETPAGE page = pageFor(paths);
         EXPECT_EQ(page != nullptr, count == 1);
-        EXPECT_EQ(moduleRefCount(), count) << "the page counts";
+        EXPECT_EQ(moduleRefCount(), count);
         DestroyPropertySheetPage(page);
-        EXPECT_EQ(moduleRefCount(), 0) << "never shown, freed once";
+        EXPECT_EQ(moduleRefCount(), 0);
     }
     pageFor({L"C:\\f"}, false);
-    addPropertyPage({{L"C:\\f"}, 0, 1, false, {}}, ManifestRef(nullptr), takePage, 0);
+    addPropertyPage(Selection(), ManifestRef(), takePage, 0);
     EXPECT_EQ(moduleRefCount(), 0);
 }
 
-TEST_F(PropertyPageTest, LivesAndGoesWithItsSheet)
+TEST_F(PropertyPageTest, EndsWithItsSheetAndNotBefore)
 {
     translate("Tavi", "Sicherung");
-    const std::tuple<bool, UINT, WPARAM> ends[] = {{true, WM_COMMAND, IDCANCEL}, // of the page
-                                                   {false, PSM_PRESSBUTTON, PSBTN_OK},
-                                                   {false, WM_SYSCOMMAND, SC_CLOSE}};
-    for (const auto& [isOfPage, end, parameter] : ends) {
-        const HWND sheet = openSheet(pageFor({L"C:\\f"})), page = PropSheet_GetCurrentPageHwnd(sheet);
+    const std::tuple<const char*, bool, UINT, WPARAM> cases[] = {
+        {"the page's Cancel", true, WM_COMMAND, IDCANCEL},
+        {"the sheet's OK", false, PSM_PRESSBUTTON, PSBTN_OK},
+        {"the caption's button", false, WM_SYSCOMMAND, SC_CLOSE}};
+    for (const auto& [label, isOfPage, end, parameter] : cases) {
+        SCOPED_TRACE(label);
+        const HWND sheet = openSheet(), page = PropSheet_GetCurrentPageHwnd(sheet);
         wchar_t title[50] = L"";
         TCITEMW tab{TCIF_TEXT, 0, 0, title, 50, 0, 0};
         TabCtrl_GetItem(PropSheet_GetTabControl(sheet), 0, &tab);
         EXPECT_STREQ(title, L"Sicherung");
         EXPECT_EQ(ListView_GetItemCount(GetDlgItem(page, TAVI_VERSIONS_LIST)), 1);
-        // A page is not closed by itself.
-        PostMessageW(page, WM_CLOSE, 0, 0);
+        PostMessageW(page, WM_CLOSE, 0, 0); // must do nothing
         PostMessageW(isOfPage ? page : sheet, end, parameter, 0);
         MSG message;
         EXPECT_TRUE(waitUntil([&] {
@@ -72,18 +76,18 @@ TEST_F(PropertyPageTest, LivesAndGoesWithItsSheet)
                 !SendMessageW(sheet, PSM_ISDIALOGMESSAGE, 0, reinterpret_cast<LPARAM>(&message)))
                 DispatchMessageW(&message);
             return !PropSheet_GetCurrentPageHwnd(sheet);
-        })) << "the sheet has come to its end";
+        })) << "the sheet ends";
         EXPECT_EQ(moduleRefCount(), 1);
         DestroyWindow(sheet);
-        EXPECT_EQ(moduleRefCount(), 0) << end;
+        EXPECT_EQ(moduleRefCount(), 0);
         EXPECT_FALSE(PeekMessageW(&message, nullptr, WM_QUIT, WM_QUIT, PM_REMOVE)) << "the thread goes on";
     }
 }
 
-// The sheet, and when its page asks a question: only its own thread can destroy it.
 HWND questionedSheet;
 int countInside;
 
+// Destroys the sheet while its page asks a question. Only the sheet's own thread can.
 void CALLBACK destroyDuringQuestion(HWND, UINT, UINT_PTR timer, DWORD)
 {
     const HWND box = FindWindowW(L"#32770", L"Tavi Remote Backup");
@@ -97,10 +101,10 @@ void CALLBACK destroyDuringQuestion(HWND, UINT, UINT_PTR timer, DWORD)
 
 TEST_F(PropertyPageTest, CountsUntilItsLastFrameHasReturned)
 {
-    questionedSheet = openSheet(pageFor({L"C:\\f"}));
+    questionedSheet = openSheet();
     countInside = -1;
     SetTimer(nullptr, 0, 10, destroyDuringQuestion);
-    // Returns when the box has gone.
+    // Returns when the box has closed.
     SendMessageW(PropSheet_GetCurrentPageHwnd(questionedSheet), WM_COMMAND, TAVI_VERSIONS_RESTORE, 0);
     EXPECT_FALSE(IsWindow(questionedSheet));
     EXPECT_EQ(countInside, 1) << "the frames of the question";

@@ -108,27 +108,27 @@ TEST_F(SelectionTest, SummarizesVersionsAndStates)
     database.execDML("CREATE TABLE filesystem(folder TEXT PRIMARY KEY, state INTEGER)");
     for (const wxString& value : {wxString(folder.path()) + L"',2", in(L"sub',6"), in(L"b.txt',7")})
         database.execDML(L"INSERT INTO filesystem VALUES('" + value + L")");
-    using Summary = std::tuple<int, int, bool, wxString>; // restore mode, states, is there a folder, name
+    constexpr Coverage kNone = Coverage::none, kSome = Coverage::some, kAll = Coverage::all;
+    using Summary = std::tuple<Coverage, Coverage, bool, wxString>; // versions, states, is there a folder, name
     const std::pair<PathSet, Summary> cases[] = {
-        {{}, {0, 0, false, L""}},
-        {{in(L"a.txt")}, {1, 0, false, L"a.txt"}},
-        {{in(L"A.TXT")}, {0, 0, false, L"A.TXT"}},
-        {{in(L"sub")}, {1, 1, true, L"sub"}},
-        {{in(L"sub\\")}, {1, 1, true, L""}},
-        {{in(L"a.txt"), in(L"b.txt"), in(L"sub"), in(L"gone.txt")}, {-1, -1, true, L""}},
-        {{in(L"sub\\deep\\c.txt"), in(L"sub")}, {1, 1, true, L""}},
+        {{}, {kNone, kNone, false, L""}},
+        {{in(L"a.txt")}, {kAll, kNone, false, L"a.txt"}},
+        {{in(L"A.TXT")}, {kNone, kNone, false, L"A.TXT"}},
+        {{in(L"sub")}, {kAll, kAll, true, L"sub"}},
+        {{in(L"sub\\")}, {kAll, kAll, true, L""}},
+        {{in(L"a.txt"), in(L"b.txt"), in(L"sub"), in(L"gone.txt")}, {kSome, kSome, true, L""}},
+        {{in(L"sub\\deep\\c.txt"), in(L"sub")}, {kAll, kAll, true, L""}},
     };
     FolderStateTable states;
     for (const auto& [paths, summary] : cases) {
-        Selection of{paths, 0, 5, true, L"?"};
+        Selection of{paths, kNone, kSome, true, L"?"};
         summarizeVersions(of, manifest.get());
         EXPECT_EQ(Summary(of.restoreMode, summarizeStates(paths, states), of.isFolder, of.displayName), summary);
         summarizeVersions(of, nullptr);
-        EXPECT_TRUE(of.restoreMode == 0 && !of.isFolder);
+        EXPECT_TRUE(of.restoreMode == kNone && !of.isFolder);
     }
-    // A table that can no longer be read: every item is of the second kind.
     database.execDML("DROP TABLE filesystem");
-    EXPECT_EQ(summarizeStates({in(L"sub")}, states), 0);
+    EXPECT_EQ(summarizeStates({in(L"sub")}, states), kNone) << "a table that can no longer be read";
 }
 
 } // namespace

@@ -7,7 +7,7 @@
 #include "statedb/Database.h"
 #include "tests/manifest/ManifestSupport.h"
 #include "tests/support/Dialogs.h"
-#include "ui/CopyTarget.h"
+#include "ui/RestoreProgressWindow.h"
 #include "ui/resource.h"
 
 namespace tavi {
@@ -16,9 +16,11 @@ namespace {
 using namespace test;
 
 struct VersionsDialogTest : UiTest {
-    void open(const Selection& selection, const wxString& files)
+    void open(const PathSet& paths, bool isFolder, const wxString& files)
     {
-        EXPECT_TRUE(startVersionsDialog(selection, (Manifest::parse(L"FILES\n" + files)), nullptr));
+        const Coverage versions = paths.size() == 1 ? Coverage::all : Coverage::some;
+        EXPECT_TRUE(startVersionsDialog({paths, Coverage::none, versions, isFolder, {}},
+                                        Manifest::parse(L"FILES\n" + files), nullptr));
         dialog = waitDialog(L"Restore Files");
         list = GetDlgItem(dialog, TAVI_VERSIONS_LIST);
     }
@@ -27,13 +29,18 @@ struct VersionsDialogTest : UiTest {
         return IsWindowEnabled(GetDlgItem(dialog, TAVI_VERSIONS_RESTORE)) +
                IsWindowEnabled(GetDlgItem(dialog, TAVI_VERSIONS_COPY_TO));
     }
+    // Returns whether the dialog has opened the progress window before it closed, and closes that, too.
+    bool closesForARestore() const
+    {
+        EXPECT_TRUE(waitUntil([&] { return !IsWindow(dialog); }));
+        const auto progress = RestoreProgressWindow::current();
+        if (progress && waitUntil([&] { return progress->dialog() != nullptr; }))
+            PostMessageW(progress->dialog(), WM_CLOSE, 0, 0);
+        waitForThreads();
+        return progress != nullptr;
+    }
     HWND dialog = nullptr, list = nullptr;
 };
-
-Selection selectionOf(const PathSet& paths, bool isFolder = false)
-{
-    return {paths, 0, paths.size() == 1 ? 1 : -1, isFolder, {}};
-}
 
 const wchar_t* const kVersions =
     L"C:\\d\\50% & more.txt\n1700000000:1600000000:1:10:0::0:0\n1700000000:1:1:11:0::0:0\n1700100000:1:1:-1:0::0:0\n"
@@ -48,16 +55,18 @@ TEST_F(VersionsDialogTest, ListsTheVersionsOfTheSelection)
     const std::wstring ends = L"\n11/14/2023 10:13 PM|09/13/2020 12:26 PM|10 bytes|",
                        runs = L"\n11/14/2023 10:13 PM|\n*11/17/2023 05:46 AM|",
                        items = L"the items you selected are backed up on the Tavi servers.  You can select one and ";
-    const std::tuple<Selection, std::wstring, std::wstring, std::wstring> cases[] = {
-        {selectionOf({L"C:\\d\\50% & more.txt"}),
-         L"50% & more.txt are backed up on the Tavi servers.  You can select one and restore it", L"File &Versions:",
+    const std::tuple<PathSet, bool, std::wstring, std::wstring, std::wstring> cases[] = {
+        {{L"C:\\d\\50% & more.txt"},
+         false,
+         L"50% & more.txt are backed up on the Tavi servers.  You can select one and restore it",
+         L"File &Versions:",
          ends + L"\n11/17/2023 05:46 AM|09/13/2020 12:26 PM|2.0 KB|\n*01/01/2100 12:00 AM|01/01/2100 12:01 AM|1.0 MB|"},
-        {selectionOf({L"C:\\d\\ends.txt"}), L"ends.txt are", L"File &Versions:", ends},
-        {selectionOf({L"C:\\d"}, true), items + L"restore the files", L"Available &Versions:", runs},
-        {selectionOf({L"C:\\a", L"C:\\b"}, true), L"some of " + items, L"Available &Versions:", runs},
+        {{L"C:\\d\\ends.txt"}, false, L"ends.txt are", L"File &Versions:", ends},
+        {{L"C:\\d"}, true, items + L"restore the files", L"Available &Versions:", runs},
+        {{L"C:\\a", L"C:\\b"}, true, L"some of " + items, L"Available &Versions:", runs},
     };
-    for (const auto& [selection, message, label, expected] : cases) {
-        open(selection, kVersions);
+    for (const auto& [paths, isFolder, message, label, expected] : cases) {
+        open(paths, isFolder, kVersions);
         EXPECT_EQ(controlText(dialog, TAVI_VERSIONS_MESSAGE).find(L"The following versions of " + message), 0u);
         EXPECT_EQ(controlText(dialog, TAVI_VERSIONS_LABEL), label);
         std::wstring rows;
@@ -76,84 +85,114 @@ TEST_F(VersionsDialogTest, ListsTheVersionsOfTheSelection)
     }
 }
 
-TEST_F(VersionsDialogTest, IsReadyForTheKeyboard)
+TEST_F(VersionsDialogTest, EnablesItsButtonsForASelectedRowAndTakesEnter)
 {
-    open(selectionOf({L"C:\\d\\50% & more.txt"}), kVersions);
+    open({L"C:\\d\\50% & more.txt"}, false, kVersions);
     EXPECT_EQ(ListView_GetNextItem(list, -1, LVNI_FOCUSED), 2);
-    // The buttons follow the row that changed last.
     ListView_SetItemState(list, 2, 0, LVIS_SELECTED);
     EXPECT_EQ(enabledActions(), 0);
     ListView_SetItemState(list, 0, LVIS_SELECTED, LVIS_SELECTED);
     EXPECT_EQ(enabledActions(), 2);
-    // Version 6 of the controls, whatever the host has: only its buttons know their ideal size.
     SIZE ideal{};
-    EXPECT_TRUE(SendMessageW(GetDlgItem(dialog, IDCANCEL), BCM_GETIDEALSIZE, 0, reinterpret_cast<LPARAM>(&ideal)));
-
+    EXPECT_TRUE(SendMessageW(GetDlgItem(dialog, IDCANCEL), BCM_GETIDEALSIZE, 0, reinterpret_cast<LPARAM>(&ideal)))
+        << "a button of version 6 of the controls";
     PostMessageW(list, WM_KEYDOWN, VK_RETURN, 0);
     click(waitDialog(L"Tavi Remote Backup"), IDCANCEL);
     waitForThreads();
+}
+
+TEST_F(VersionsDialogTest, ShortensALongNameAndIgnoresEnterWithoutAVersion)
+{
     translate("&Restore", "&Zurueck");
     const wxString name = L"C:\\d\\begin" + wxString(L'x', 200) + L"end.txt";
-    open(selectionOf({name}), name + L"\n5:5:5:-1:0::0:0");
+    open({name}, false, name + L"\n5:5:5:-1:0::0:0");
     EXPECT_EQ(controlText(dialog, TAVI_VERSIONS_RESTORE), L"&Zurueck");
     const std::wstring message = controlText(dialog, TAVI_VERSIONS_MESSAGE);
-    EXPECT_TRUE(message.find(L"beginxx") < message.find(L"xend.txt are backed up") && message.length() < 250)
-        << message;
-    // Without a version, Enter does nothing and leaves the window to Esc. The color is set after the key was handled.
+    EXPECT_LT(message.find(L"beginxx"), message.find(L"xend.txt are backed up")) << message;
+    EXPECT_LT(message.length(), 250u);
     PostMessageW(list, WM_KEYDOWN, VK_RETURN, 0);
-    PostMessageW(list, LVM_SETTEXTCOLOR, 0, 0x123456);
+    PostMessageW(list, LVM_SETTEXTCOLOR, 0, 0x123456); // comes after the key
     EXPECT_TRUE(waitUntil([&] { return ListView_GetTextColor(list) == 0x123456; }));
     EXPECT_TRUE(IsWindowEnabled(dialog)) << "no box is open";
     PostMessageW(list, WM_KEYDOWN, VK_ESCAPE, 0);
-    waitForThreads();
 }
 
-TEST_F(VersionsDialogTest, RequestsWhatWasAnswered)
+// The browser shows itself before it has opened the folder that it starts with.
+void chooseFolder(HWND browser, const wxString& folder)
 {
-    // Below the test's folder: a file and one deeper are backed up, the targets are in another folder.
-    static std::atomic<int> progressWindows{0};
-    setProgressWindowOpener([] { ++progressWindows; });
-    for (const wchar_t* name : {L"f", L"t"})
-        CreateDirectoryW(in(name).wc_str(), nullptr);
-    std::ofstream(in(L"f\\5%").wc_str());
-    std::ofstream(in(L"t\\was").wc_str());
+    const HWND tree = FindWindowExW(browser, nullptr, WC_TREEVIEWW, nullptr);
+    EXPECT_TRUE(!tree || waitUntil([&] {
+        SendMessageW(browser, BFFM_SETSELECTIONW, TRUE, reinterpret_cast<LPARAM>(folder.wc_str()));
+        wchar_t name[MAX_PATH] = L"";
+        TVITEMW item{TVIF_TEXT, TreeView_GetSelection(tree), 0, 0, name, MAX_PATH, 0, 0, 0, 0};
+        return TreeView_GetItem(tree, &item) && folder.AfterLast(L'\\') == name;
+    }));
+}
+
+// Below the test's folder, "f" holds a file and one deeper that are backed up, "t" the targets.
+struct RestoreRequestOfDialogTest : VersionsDialogTest {
+    RestoreRequestOfDialogTest()
+    {
+        for (const wchar_t* name : {L"f", L"t"})
+            CreateDirectoryW(in(name).wc_str(), nullptr);
+        std::ofstream(in(L"f\\5%").wc_str());
+        std::ofstream(in(L"t\\was").wc_str());
+        database.open(service.file(L"tavistate.dat"));
+        database.execDML(
+            "CREATE TABLE restores(request_time, machine_id, machine_alias, encryption_key);"
+            "CREATE TABLE restore_files(restore_id, manifest_path, file_size, timestamp, ctime, attributes,"
+            "target_path, overwrite)");
+    }
+    // Returns the requested files as source, time, attributes, target and whether it may be overwritten.
+    wxString takeRequest()
+    {
+        DbQuery stored = database.execQuery(
+            "SELECT ifnull(group_concat(manifest_path || ' ' || timestamp || ' ' || attributes || ' ' || "
+            "target_path || ' ' || overwrite, ';'), '') FROM restore_files");
+        const char* text = "";
+        EXPECT_TRUE(stored.nextRow());
+        stored.fieldText(0, text);
+        wxString files = fromUtf8(text);
+        files.Replace(in(L""), L"");
+        EXPECT_EQ(database.execDML("DELETE FROM restores"), files.empty() ? 0 : 1);
+        database.execDML("DELETE FROM restore_files");
+        return files;
+    }
+    DbConnection database;
+};
+
+TEST_F(RestoreRequestOfDialogTest, FollowsTheAnswers)
+{
     const wxString files = in(L"f\\5%\n100:1:7:1:0::0:40\n200:1:8:2:0::0:41\n\n") +
                            in(L"f\\b\\c\n100:1:7:3:0::0:0\n\n") + L"simple.map\n100:1:1:1:0::0:0";
-    DbConnection database;
-    database.open(service.file(L"tavistate.dat"));
-    database.execDML("CREATE TABLE restores(request_time, machine_id, machine_alias, encryption_key);"
-                     "CREATE TABLE restore_files(restore_id, manifest_path, file_size, timestamp, ctime, attributes,"
-                     "target_path, overwrite)");
-    const Selection one = selectionOf({in(L"f\\5%")}), whole = selectionOf({in(L"f")}, true),
-                    several = selectionOf({in(L"f\\5%"), in(L"f\\b")}, true);
+    const PathSet one = {in(L"f\\5%")}, whole = {in(L"f")}, several = {in(L"f\\5%"), in(L"f\\b")};
     constexpr int kRestore = TAVI_VERSIONS_RESTORE, kCopy = TAVI_VERSIONS_COPY_TO, kCloseWindow = 0;
     const wchar_t* const loses = L"Restoring this file will overwrite your current version, and you will lose any ";
     const wchar_t* const loseAll = L"since they were last backed up.  Would you like to overwrite it?";
     const wchar_t* const exist = L"One or more of the items you selected already exist.  Would you like to overwrite ";
-    // The row, the button, the answers to one box after the other, the question of the last, the files as source, time,
-    // attributes, target, whether it may be replaced. The chosen folder ends in a backslash and the rest begins with
-    // one.
-    const std::tuple<const Selection&, int, int, std::vector<int>, const wchar_t*, const wchar_t*> cases[] = {
+    // The selection, the row, the button, the answer to each box, the question of the last box, the request. A chosen
+    // folder ends in a backslash, and the rest of a path below it begins with one.
+    const std::tuple<const PathSet&, int, int, std::vector<int>, const wchar_t*, const wchar_t*> cases[] = {
         {one, 0, kRestore, {IDYES}, loses, LR"(f\5% 100 32 f\5% 1)"},
         {one, 1, kRestore, {IDNO}, loses, LR"(f\5% 200 33 f\5% (1) 0)"},
         {one, 1, kRestore, {kCloseWindow}, loses, L""},
         {whole, 0, kRestore, {IDYES}, loseAll, LR"(f\5% 100 32 f\5% 1;f\b\c 100 0 f\b\c 1)"},
-        // The save box itself asks about the file that is there.
+        // The save box itself asks about an existing file.
         {one, 1, kCopy, {IDOK, IDYES}, L"", LR"(f\5% 200 33 t\was 1)"},
         {one, 1, kCopy, {IDCANCEL}, L"", L""},
         {several, 0, kCopy, {IDOK}, L"", LR"(f\5% 100 32 t\\5% 0;f\b\c 100 0 t\\b\c 0)"},
         {several, 0, kCopy, {IDOK, IDYES}, exist, LR"(f\5% 100 32 t\\5% 1;f\b\c 100 0 t\\b\c 1)"},
         {several, 0, kCopy, {IDOK, IDNO}, exist, LR"(f\5% 100 32 t\\5% (1) 0;f\b\c 100 0 t\\b\c 0)"},
         {several, 0, kCopy, {IDOK, IDCANCEL}, exist, L""},
-        // The target of a single folder is the chosen folder itself, which is always there.
+        // The target of a single folder is the chosen folder, which always exists.
         {whole, 0, kCopy, {IDOK, IDYES}, exist, LR"(f\5% 100 32 t\\5% 1;f\b\c 100 0 t\\b\c 1)"},
     };
-    for (const auto& [selection, row, button, answers, question, requested] : cases) {
-        SCOPED_TRACE(requested);
+    for (const auto& [paths, row, button, answers, question, request] : cases) {
+        SCOPED_TRACE(request);
         DeleteFileW(in(L"t\\5%").wc_str());
         if (answers.size() > 1)
             std::ofstream(in(L"t\\5%").wc_str());
-        open(selection, files);
+        open(paths, paths != one, files);
         ListView_SetItemState(list, row, LVIS_SELECTED, LVIS_SELECTED);
         click(dialog, button);
         HWND box = nullptr;
@@ -163,54 +202,12 @@ TEST_F(VersionsDialogTest, RequestsWhatWasAnswered)
                 EXPECT_EQ(controlText(box, cmb13), L"5%");
                 SetDlgItemTextW(box, cmb13, in(L"t\\was").wc_str());
             }
-            // The browser is on screen before it has gone to the folder that it begins with.
-            const HWND tree = FindWindowExW(box, nullptr, WC_TREEVIEWW, nullptr);
-            EXPECT_TRUE(!tree || waitUntil([&] {
-                SendMessageW(box, BFFM_SETSELECTIONW, TRUE, reinterpret_cast<LPARAM>(in(L"t").wc_str()));
-                wchar_t name[MAX_PATH] = L"";
-                TVITEMW item{TVIF_TEXT, TreeView_GetSelection(tree), 0, 0, name, MAX_PATH, 0, 0, 0, 0};
-                return TreeView_GetItem(tree, &item) && std::wcscmp(name, L"t") == 0;
-            }));
+            chooseFolder(box, in(L"t"));
             EXPECT_TRUE(answer == IDOK || controlText(box, 0xFFFF).find(question) != std::wstring::npos);
             answer == kCloseWindow ? PostMessageW(dialog, WM_CLOSE, 0, 0) : click(box, answer);
         }
-        waitForThreads();
-        DbQuery stored = database.execQuery(
-            "SELECT ifnull(group_concat(manifest_path || ' ' || timestamp || ' ' || attributes || ' ' || "
-            "target_path || ' ' || overwrite, ';'), '') FROM restore_files");
-        const char* text = "";
-        EXPECT_TRUE(stored.nextRow());
-        stored.fieldText(0, text);
-        wxString rows = fromUtf8(text);
-        rows.Replace(in(L""), L"");
-        EXPECT_EQ(rows, requested);
-        EXPECT_EQ(database.execDML("DELETE FROM restores"), rows.empty() ? 0 : 1);
-        EXPECT_EQ(progressWindows.exchange(0), rows.empty() ? 0 : 1);
-        database.execDML("DELETE FROM restore_files");
-    }
-    setProgressWindowOpener(nullptr);
-}
-
-TEST_F(VersionsDialogTest, SharesWholeComponentsAndLooksBehindTheFolder)
-{
-    const wxString target = in(L"t\\"), deep = L"C:\\" + wxString(L'd', 300);
-    std::filesystem::create_directories(in(L"t\\x").wc_str());
-    const std::tuple<PathSet, wxString, bool> cases[] = {
-        {{}, L"", false},
-        {{L"C:\\a\\none"}, L"C:\\a\\none", true}, // the target is the folder itself
-        {{L"C:\\"}, L"C:\\", true},
-        {{L"C:\\a\\xx", L"C:\\a\\xy"}, L"C:\\a", false},
-        {{L"C:\\a", L"C:\\a\\X"}, L"C:\\a", true},
-        {{L"C:\\Dir\\N", L"c:\\dIR\\m"}, L"C:\\Dir", false},
-        {{L"C:\\n", L"D:\\n"}, L"", false},
-        // The odd one of three comes out of the set last in one of the two.
-        {{L"C:\\a\\x", L"C:\\a\\b\\n", L"C:\\a\\b\\m"}, L"C:\\a", true},
-        {{L"C:\\a\\b\\n", L"C:\\a\\b\\m", L"C:\\a\\x"}, L"C:\\a", true},
-        {{deep + L"\\n", deep + L"\\m"}, deep, false},
-    };
-    for (const auto& [paths, prefix, exists] : cases) {
-        EXPECT_TRUE(commonPrefix(paths).IsSameAs(prefix, false)) << commonPrefix(paths) << " for " << prefix;
-        EXPECT_EQ(anyTargetExists(paths, prefix, target), exists) << prefix;
+        EXPECT_EQ(closesForARestore(), *request != 0);
+        EXPECT_EQ(takeRequest(), request);
     }
 }
 
