@@ -51,7 +51,7 @@ class ClassFactory final : public ComObject<ClassFactory<Object>, IClassFactory>
             if (outer)
                 return CLASS_E_NOAGGREGATION;
             try {
-                const RefPtr<Object> created(new Object);
+                const RefPtr<IUnknown> created(Object::unknown(new Object));
                 return created->QueryInterface(interfaceId, object);
             } catch (const std::bad_alloc&) {
                 return E_OUTOFMEMORY;

@@ -1,5 +1,7 @@
 #pragma once
 
+#include <tuple>
+
 #include <windows.h>
 #include <unknwn.h>
 
@@ -48,6 +50,12 @@ class ComObject : public Interfaces... {
                 delete static_cast<Derived*>(this);
             return left;
         });
+    }
+
+    // Returns the first table, which is the object's IUnknown.
+    static IUnknown* unknown(Derived* object) noexcept
+    {
+        return static_cast<std::tuple_element_t<0, std::tuple<Interfaces...>>*>(object);
     }
 
   protected:
