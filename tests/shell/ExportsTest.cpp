@@ -1,4 +1,7 @@
-#include "tests/shell/LoadedModule.h"
+#include <fstream>
+
+#include "shell/Registration.h"
+#include "tests/support/LoadedModule.h"
 #include "tests/support/Counts.h"
 #include "tests/support/Pipes.h"
 #include "ui/PropertyPage.h"
@@ -9,7 +12,7 @@ namespace {
 using namespace test;
 using ExportsTest = HostTest;
 
-TEST_F(ExportsTest, OfferTheModulesClassesOnly)
+TEST_F(ExportsTest, OfferTheModulesClassesAndTheirInterfacesOnly)
 {
     LoadedModule module;
     void* object = &module;
@@ -17,7 +20,36 @@ TEST_F(ExportsTest, OfferTheModulesClassesOnly)
     EXPECT_EQ(object, nullptr);
     EXPECT_EQ(module.classObject(ShellExt::kClassId, IID_IClassFactory, nullptr), E_POINTER);
     EXPECT_EQ(module.classObject(ShellExt::kClassId, IID_IContextMenu, &object), E_NOINTERFACE);
-    EXPECT_EQ(module.canUnload(), S_OK) << "the refused factory was destroyed";
+    // A ShellExt has the first two tables all the same.
+    const std::pair<CLSID, IID> refused[] = {{ShellExt::kClassId, IID_IShellPropSheetExt},
+                                             {ShellExt::kClassId, IID_IShellIconOverlayIdentifier},
+                                             {StubFolder::kClassId, IID_IShellFolder2}};
+    for (const auto& [classId, interfaceId] : refused) {
+        const auto factory = module.factory(classId);
+        EXPECT_EQ(factory->CreateInstance(nullptr, interfaceId, &object), E_NOINTERFACE);
+        EXPECT_EQ(factory->CreateInstance(factory.get(), IID_IUnknown, &object), CLASS_E_NOAGGREGATION);
+        EXPECT_EQ(factory->LockServer(TRUE), S_OK);
+        EXPECT_EQ(module.canUnload(), S_FALSE);
+    }
+    EXPECT_EQ(module.canUnload(), S_OK) << "a refused object or a lock counts";
+}
+
+TEST_F(ExportsTest, LeaveNothingOfAnObjectThatCannotBeCreated)
+{
+    LoadedModule module;
+    for (const std::wstring& directory : {std::wstring(L"C:\\no such folder"), service.file(L"")}) {
+        service.install().SetValue(L"ConfigPath", wxString(directory));
+        DeleteFileW(service.file(L"taviconf.dat").c_str());
+        void* object = &module;
+        EXPECT_TRUE(FAILED(module.factory(ShellExt::kClassId)->CreateInstance(nullptr, IID_IUnknown, &object)));
+        EXPECT_EQ(object, nullptr);
+    }
+    EXPECT_EQ(module.canUnload(), S_OK);
+    std::ifstream file(toUtf8(service.file(L"tavi.log")));
+    const std::string log(std::istreambuf_iterator<char>(file), {});
+    for (const char* reason : {"14: DB_CANTOPEN[14]: ", "1: DB_ERROR[1]: "})
+        EXPECT_NE(log.find("Error: Failed to open folder-state db (" + std::string(reason)), std::string::npos) << log;
+    EXPECT_EQ(log.find("Unhandled"), std::string::npos) << log;
 }
 
 TEST_F(ExportsTest, ServeAHostThatGoesOnAfterItMayUnload)
@@ -48,7 +80,7 @@ TEST_F(ExportsTest, LeaveNothingBehindInTwentyRoundsOfLoadAndUnload)
             const auto hasCommand = [&] { return commandsFor(*menu, L"C:\\") == 1; };
             EXPECT_TRUE(hasCommand() || round % 2 == 1 || waitUntil(hasCommand));
         }
-        ASSERT_TRUE(moduleGoes()) << "round " << round;
+        ASSERT_TRUE(LoadedModule::isUnmapped()) << "round " << round;
         // The thread that unmapped the module needs a moment more.
         ASSERT_TRUE(waitUntil([&] { return countThreads() == threads; }));
     }
@@ -58,20 +90,22 @@ TEST_F(ExportsTest, LeaveNothingBehindInTwentyRoundsOfLoadAndUnload)
 
 TEST_F(ExportsTest, LetComUnloadTheModuleAtTheEndOfAPage)
 {
-    LoadedModule().registerServer();
+    {
+        const LoadedModule module;
+        setModuleInstance(module.module);
+        registerServer();
+    }
     EXPECT_EQ(CoGetClassObject(ShellExt::kClassId, CLSCTX_INPROC_SERVER, nullptr, IID_IClassFactory,
                                RefPtr<IClassFactory>().outVoid()),
               S_OK);
     // The page is this program's own. The module is a library that COM has loaded and that nobody uses.
     setModuleInstance(GetModuleHandleW(nullptr));
     HPROPSHEETPAGE page = nullptr;
-    Selection selection;
-    selection.paths = {L"C:\\f"};
-    addPropertyPage(selection, Manifest::parse(L"FILES\nC:\\f\n1:1:1:1:0::0:0"), takePage,
+    addPropertyPage({{L"C:\\f"}, {}, {}, false, {}}, Manifest::parse(L"FILES\nC:\\f\n1:1:1:1:0::0:0"), takePage,
                     reinterpret_cast<LPARAM>(&page));
     EXPECT_TRUE(GetModuleHandleW(L"tavishell.dll"));
     DestroyPropertySheetPage(page);
-    EXPECT_TRUE(moduleGoes());
+    EXPECT_TRUE(LoadedModule::isUnmapped());
 }
 
 } // namespace

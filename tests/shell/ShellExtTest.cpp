@@ -2,7 +2,7 @@
 
 #include <shellapi.h>
 
-#include "tests/shell/LoadedModule.h"
+#include "tests/support/LoadedModule.h"
 
 namespace tavi {
 namespace {

@@ -1,11 +1,7 @@
 #pragma once
 
-#include <windows.h>
-#include <olectl.h>
 #include <shlobj.h>
 
-#include "core/Handles.h"
-#include "core/RefCounted.h"
 #include "shell/ShellExt.h"
 #include "shell/StubFolder.h"
 #include "statedb/Database.h"
@@ -20,8 +16,6 @@ struct LoadedModule {
     {
         findFunction(module, "DllGetClassObject", classObject);
         findFunction(module, "DllCanUnloadNow", canUnload);
-        findFunction(module, "DllRegisterServer", registerServer);
-        findFunction(module, "DllUnregisterServer", unregisterServer);
     }
     ~LoadedModule()
     {
@@ -41,44 +35,37 @@ struct LoadedModule {
         EXPECT_EQ(factory(classId)->CreateInstance(nullptr, interfaceId, made.outVoid()), S_OK);
         return made;
     }
+    static bool isUnmapped()
+    {
+        return waitUntil([] { return !GetModuleHandleW(L"tavishell.dll"); });
+    }
 
     HMODULE module = LoadLibraryW(modulePath().c_str());
     decltype(&DllGetClassObject) classObject = nullptr;
     decltype(&DllCanUnloadNow) canUnload = nullptr;
-    decltype(&DllRegisterServer) registerServer = nullptr;
-    decltype(&DllUnregisterServer) unregisterServer = nullptr;
 };
 
-inline bool moduleGoes()
-{
-    return waitUntil([] { return !GetModuleHandleW(L"tavishell.dll"); });
-}
-
-// A service with one backed-up folder and the states of two files.
+// A service that has backed up C:\windows, which it lists as a file, too, and that knows the states of two files.
 struct HostTest : testing::Test {
     HostTest()
     {
         CoInitialize(nullptr);
-        run(L"taviconf.dat", "CREATE TABLE filesystem(state INTEGER, folder TEXT PRIMARY KEY)");
-        // The folder itself is listed, too, since a page is offered for listed paths only.
+        DbConnection config, state;
+        config.open(service.file(L"taviconf.dat"));
+        config.execDML("CREATE TABLE filesystem(state INTEGER, folder TEXT PRIMARY KEY)");
         std::string manifest;
         for (const char byte : packed("FILES\nC:\\windows\n1:1:1:1:0::0:0\n\nC:\\windows\\f\n1:1:1:1:0::0:0"))
             manifest += wxString::Format("%02x", static_cast<unsigned char>(byte)).utf8_string();
-        run(L"tavistate.dat", "CREATE TABLE file_states(filename TEXT, state INTEGER);"
-                              "INSERT INTO file_states VALUES('C:\\in',1),('C:\\out',2);"
-                              "CREATE TABLE manifest(contents BLOB); INSERT INTO manifest VALUES(x'" +
-                                  manifest + "')");
+        state.open(service.file(L"tavistate.dat"));
+        state.execDML(("CREATE TABLE manifest(contents BLOB); INSERT INTO manifest VALUES(x'" + manifest + "');" +
+                       "CREATE TABLE file_states(filename TEXT, state INTEGER);"
+                       "INSERT INTO file_states VALUES('C:\\in',1),('C:\\out',2)")
+                          .c_str());
     }
     ~HostTest() override
     {
-        EXPECT_TRUE(moduleGoes()) << "its log file must be closed before the folder is deleted";
+        EXPECT_TRUE(LoadedModule::isUnmapped()) << "its log file must be closed before the folder is deleted";
         CoUninitialize();
-    }
-    void run(const wchar_t* file, const std::string& sql) const
-    {
-        DbConnection database;
-        database.open(service.file(file));
-        database.execDML(sql.c_str());
     }
     // Initializes the object with that folder, or with nothing, and returns how many commands it adds to a menu.
     static HRESULT commandsFor(IContextMenu& object, const wchar_t* folder)

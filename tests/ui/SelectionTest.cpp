@@ -27,31 +27,26 @@ UINT WINAPI chosenDriveType(LPCWSTR)
     return driveType;
 }
 
-// What is taken from the shell's own data object for the last ids in a folder.
+// Returns what is collected from the shell's own data object for the last ids of the items.
 PathSet collect(const wxString& parent, const std::vector<IdList>& items, const IdList& background = {})
 {
     std::vector<LPCITEMIDLIST> lists;
     for (const IdList& item : items)
         lists.push_back(ILFindLastID(item.get()));
-    RefPtr<IShellFolder> desktop, folder;
     RefPtr<IDataObject> data;
-    SHGetDesktopFolder(desktop.out());
-    desktop->BindToObject(idsOf(parent).get(), nullptr, IID_IShellFolder, folder.outVoid());
-    folder->GetUIObjectOf(nullptr, UINT(lists.size()), lists.data(), IID_IDataObject, nullptr, data.outVoid());
+    CIDLData_CreateFromIDArray(idsOf(parent).get(), UINT(lists.size()), lists.data(), data.out());
     return collectPaths(background.get(), data.get(), chosenDriveType);
 }
 
 TEST_F(SelectionTest, TakesTheShellsItemsButNoneTooLong)
 {
     const wxString parent = in(wxString(L'd', 199 - folder.path().size())), name = L"00000" + wxString(L'f', 53),
-                   rare = parent + L"\\\u65e5\U0001F4BE", sub = parent + L"\\sub",
-                   computer = L"::{20D04FE0-3AEA-1069-A2D8-08002B30309D}",
-                   controlPanel = computer + L"\\::{21EC2020-3AEA-1069-A2DD-08002B30309D}";
+                   rare = parent + L"\\\u65e5\U0001F4BE", sub = parent + L"\\sub";
     std::filesystem::create_directories(sub.wc_str());
     for (const wxString& each : {in(name), in(name + L"f"), rare})
         std::ofstream(each.wc_str());
     std::vector<IdList> items{idsOf(in(name)), idsOf(in(name + L"f")), idsOf(rare), idsOf(sub)};
-    // The first one again and again, each with another number in its name.
+    // Copies of the first one, each with another number in its name.
     const std::string bytes(reinterpret_cast<const char*>(items[0].get()), ILGetSize(items[0].get()));
     const std::size_t place = bytes.find(std::string(reinterpret_cast<const char*>(name.wx_str()), 20));
     for (int i = 10001; i < 80000; ++i) {
@@ -62,7 +57,12 @@ TEST_F(SelectionTest, TakesTheShellsItemsButNoneTooLong)
     EXPECT_EQ(paths.size(), 70003u);
     for (const wxString& path : {parent, rare, sub, parent + L"\\79999" + name.substr(5)})
         EXPECT_EQ(paths.count(path), 1u) << path;
-    // Of what is no file, roots of fixed drives only.
+}
+
+TEST_F(SelectionTest, TakesNoVirtualItemAndNoDriveThatIsNotFixed)
+{
+    const wxString computer = L"::{20D04FE0-3AEA-1069-A2D8-08002B30309D}",
+                   controlPanel = computer + L"\\::{21EC2020-3AEA-1069-A2DD-08002B30309D}";
     for (driveType = DRIVE_UNKNOWN; driveType <= DRIVE_RAMDISK; ++driveType)
         EXPECT_EQ(collect(computer, {idsOf(controlPanel), idsOf(L"C:\\")}),
                   driveType == DRIVE_FIXED ? PathSet({L"C:\\"}) : PathSet());
@@ -85,7 +85,7 @@ TEST_F(SelectionTest, NeverReadsOutsideAForgedBlock)
         STGMEDIUM medium{TYMED_HGLOBAL, {}, nullptr};
         medium.hGlobal = GlobalAlloc(GMEM_FIXED, block.size() * sizeof(UINT));
         std::copy(block.begin(), block.end(), static_cast<UINT*>(medium.hGlobal));
-        // OLE's own store of data takes any block.
+        // OLE's data cache accepts any block.
         RefPtr<IOleCache> cache;
         RefPtr<IDataObject> data;
         CreateDataCache(nullptr, CLSID_NULL, IID_IOleCache, cache.outVoid());
