@@ -14,7 +14,7 @@ namespace {
 
 // The place of TAVI_ICON_OVERLAY among the module's icons.
 constexpr int kOverlayIconIndex = 3;
-// Near the lowest of the shell's priorities, which go from 0 to 100.
+// The shell shows the badge of the lowest number; 100 is the maximum.
 constexpr int kOverlayPriority = 99;
 // The only file state with a badge.
 constexpr std::int32_t kOverlayState = 1;
@@ -54,7 +54,7 @@ STDMETHODIMP ShellExt::ReplacePage(EXPPS, LPFNADDPROPSHEETPAGE, LPARAM)
 
 STDMETHODIMP ShellExt::Initialize(PCIDLIST_ABSOLUTE folder, IDataObject* data, HKEY)
 {
-    // Items that cannot be captured are left out. A failure would make the host drop the menu of the others too.
+    // Items that cannot be captured are left out. After an error the host would leave out the whole menu.
     guarded("ShellExt::Initialize", [&] {
         folder_.reset(folder ? ILClone(folder) : nullptr);
         captureSelection(folder_.get(), data, folderStates_, selection_);

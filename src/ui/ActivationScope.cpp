@@ -17,7 +17,7 @@ using ContextHandle = UniqueHandle<ContextTraits>;
 
 HANDLE createModuleContext() noexcept
 {
-    // The source name is needed beside the handle; a path that does not fit leaves the host's own controls in use.
+    // The kernel needs the path beside the handle. Without a context the host's controls are used.
     wchar_t path[MAX_PATH];
     const DWORD length = GetModuleFileNameW(moduleInstance(), path, MAX_PATH);
     if (length == 0 || length >= MAX_PATH)
@@ -35,7 +35,7 @@ HANDLE createModuleContext() noexcept
 
 ActivationScope::ActivationScope() noexcept
 {
-    // Made on first use, released when the module is unmapped.
+    // Created on first use, released when the module is unmapped.
     static const ContextHandle context(createModuleContext());
     active_ = context && ActivateActCtx(context.get(), &cookie_);
 }

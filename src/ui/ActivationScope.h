@@ -4,8 +4,8 @@
 
 namespace tavi {
 
-// Makes the module's own manifest the thread's activation context, so that windows, common dialogs and message boxes
-// made inside it use version 6 of the common controls whatever the host uses. Nests; one thread only.
+// Activates the module's own manifest on the calling thread, so that windows, common dialogs and message boxes created
+// in the scope use version 6 of the common controls whatever the host uses. Scopes nest.
 class ActivationScope {
   public:
     ActivationScope() noexcept;

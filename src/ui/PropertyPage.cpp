@@ -17,8 +17,8 @@
 namespace tavi {
 namespace {
 
-// Owned by the page's description until the sheet releases the page, shown or not. The dialog, which is what the module
-// counts, may outlive it in the message loop of a box.
+// Owned by the page description until the sheet releases the page, shown or not. The dialog counts as an object of the
+// module and may outlive the page in the message loop of a box.
 struct Page {
     Page(const Selection& selection, ManifestRef manifest)
         : dialog(std::make_shared<VersionsDialog>(selection, std::move(manifest), false)), title(_("Tavi"))
@@ -47,8 +47,8 @@ UINT CALLBACK pageCallback(HWND, UINT message, PROPSHEETPAGEW* description)
     });
 }
 
-// The page functions of the controls that the module's own manifest names. Resolved on first use, inside an activation
-// scope, and kept: the library stays, since a page may outlive whoever made it.
+// The page functions of the common controls that the module's manifest names. Resolved on first use, in an activation
+// scope. The library stays loaded, since a page may outlive the object that added it.
 struct SheetFunctions {
     SheetFunctions() noexcept
     {
@@ -101,7 +101,7 @@ void addPropertyPage(const Selection& selection, ManifestRef manifest, LPFNADDPR
         wxLogError("Unable to create the property page (%lu)", GetLastError());
         return;
     }
-    // From here on the page's callback frees it, once.
+    // The page's callback frees it.
     static_cast<void>(page.release());
     if (!addPage(handle, parameter))
         destroyPage(handle);

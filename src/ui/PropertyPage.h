@@ -8,10 +8,10 @@
 
 namespace tavi {
 
-// Offers the versions of the selection as a page of a property sheet, if a selected file is backed up. The page takes
-// its own reference to the manifest and is freed by the sheet, or here when `addPage` refuses it; the module counts it
-// until then, and until the last frame of a box that it has opened has returned. Its Cancel button closes the sheet;
-// after Restore and Copy To the sheet stays as it is.
+// Adds a page with the versions of the selection to a property sheet, if a selected file is backed up. The sheet frees
+// the page; if `addPage` refuses the page, it is freed here. It counts as an object of the module until then, and until
+// the last frame of a box that it has opened has returned. Its Cancel button closes the sheet, Restore and Copy To do
+// not.
 void addPropertyPage(const Selection& selection, ManifestRef manifest, LPFNADDPROPSHEETPAGE addPage, LPARAM parameter);
 
 } // namespace tavi

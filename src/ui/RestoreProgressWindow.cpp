@@ -132,7 +132,7 @@ INT_PTR RestoreProgressWindow::handleMessage(HWND window, UINT message, WPARAM w
         handlePending(window);
         return TRUE;
     case WM_COMMAND:
-        // The window closes even if the service cannot be told.
+        // The window closes even if no service receives the cancellation.
         if (LOWORD(wParam) == TAVI_PROGRESS_CANCEL) {
             guarded("restore cancellation", [] {
                 auto command = CommandPipe::cancelRestore();

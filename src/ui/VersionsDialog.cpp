@@ -96,8 +96,7 @@ INT_PTR CALLBACK dialogProcedure(HWND window, UINT message, WPARAM wParam, LPARA
     });
 }
 
-// What the thread of a dialog starts with. Counts as an object of the module from before the thread until its last
-// step.
+// The argument of a dialog's thread. Counts as an object of the module until the thread's last step.
 struct DialogStart {
     ModuleLock lock;
     Selection selection;
@@ -119,8 +118,7 @@ void runDialog(void* argument)
         return;
     }
     placeWindow(window.get(), start->host);
-    // The foreground comes before the focus: a window that gets the focus first keeps the caption of an inactive
-    // window.
+    // In this order: a window that gets the focus before the foreground keeps the caption of an inactive window.
     ShowWindow(window.get(), SW_SHOWNA);
     SetForegroundWindow(window.get());
     SetFocus(GetDlgItem(window.get(), TAVI_VERSIONS_LIST));

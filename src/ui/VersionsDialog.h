@@ -23,7 +23,7 @@ bool startVersionsDialog(Selection selection, ManifestRef manifest, HWND host);
 // window's thread. Counts as an object of the module.
 //
 // Held by shared pointers: the boxes that it opens run message loops, in which the window and the sheet's reference may
-// go while frames below still use the object.
+// be destroyed while frames below still use the object.
 class VersionsDialog : public std::enable_shared_from_this<VersionsDialog> {
   public:
     // With `ownThread` the destruction of the window ends the thread's message loop. Without it the window is a page,
