@@ -21,6 +21,17 @@ HPROPSHEETPAGE pageFor(const PathSet& paths, bool isAccepted = true)
     return page;
 }
 
+HWND openSheet()
+{
+    HPROPSHEETPAGE page = pageFor({L"C:\\f"});
+    PROPSHEETHEADERW header{};
+    header.dwSize = sizeof(header);
+    header.dwFlags = PSH_MODELESS;
+    header.nPages = 1;
+    header.phpage = &page;
+    return reinterpret_cast<HWND>(PropertySheetW(&header));
+}
+
 // Wine ignores the page description's reference counter. Windows adds one to each module count below while its page
 // exists.
 TEST_F(PropertyPageTest, IsOfferedForABackedUpFileAndDestroyedOnce)
@@ -45,13 +56,7 @@ TEST_F(PropertyPageTest, EndsWithItsSheetAndNotBefore)
     const std::tuple<bool, UINT, WPARAM> cases[] = {
         {true, WM_COMMAND, IDCANCEL}, {false, PSM_PRESSBUTTON, PSBTN_OK}, {false, WM_SYSCOMMAND, SC_CLOSE}};
     for (const auto& [isOfPage, end, parameter] : cases) {
-        HPROPSHEETPAGE added = pageFor({L"C:\\f"});
-        PROPSHEETHEADERW header{};
-        header.dwSize = sizeof(header);
-        header.dwFlags = PSH_MODELESS;
-        header.nPages = 1;
-        header.phpage = &added;
-        const HWND sheet = reinterpret_cast<HWND>(PropertySheetW(&header)), page = PropSheet_GetCurrentPageHwnd(sheet);
+        const HWND sheet = openSheet(), page = PropSheet_GetCurrentPageHwnd(sheet);
         wchar_t title[50] = L"";
         TCITEMW tab{TCIF_TEXT, 0, 0, title, 50, 0, 0};
         TabCtrl_GetItem(PropSheet_GetTabControl(sheet), 0, &tab);
@@ -72,6 +77,29 @@ TEST_F(PropertyPageTest, EndsWithItsSheetAndNotBefore)
         EXPECT_EQ(moduleRefCount(), 0) << end;
         EXPECT_FALSE(PeekMessageW(&message, nullptr, WM_QUIT, WM_QUIT, PM_REMOVE)) << "the thread goes on";
     }
+}
+
+HWND questionedSheet;
+
+// Destroys the sheet while its page asks a question, on the sheet's own thread.
+void CALLBACK destroyDuringQuestion(HWND, UINT, UINT_PTR timer, DWORD)
+{
+    const HWND box = FindWindowW(L"#32770", L"Tavi Remote Backup");
+    if (!box)
+        return;
+    KillTimer(nullptr, timer);
+    DestroyWindow(questionedSheet);
+    EXPECT_EQ(moduleRefCount(), 1) << "the frames of the question";
+    PostMessageW(box, WM_COMMAND, IDCANCEL, 0);
+}
+
+TEST_F(PropertyPageTest, CountsUntilItsLastFrameHasReturned)
+{
+    questionedSheet = openSheet();
+    SetTimer(nullptr, 0, 10, destroyDuringQuestion);
+    SendMessageW(PropSheet_GetCurrentPageHwnd(questionedSheet), WM_COMMAND, TAVI_VERSIONS_RESTORE, 0);
+    EXPECT_FALSE(IsWindow(questionedSheet));
+    EXPECT_EQ(moduleRefCount(), 0);
 }
 
 } // namespace
