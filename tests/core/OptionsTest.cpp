@@ -9,7 +9,7 @@
 namespace tavi {
 namespace {
 
-TEST(Options, ThatCannotBeReadAreDeletedInSilence)
+TEST(Options, UnreadableValuesAreDeletedInSilence)
 {
     test::InstalledService service;
     wxRegKey settings(getSettingsKeyName());

@@ -29,7 +29,7 @@ TEST(ThreadLocals, BelongToTheirThreadAndAreFreedWithIt)
         EXPECT_EQ(GetLastError(), DWORD{ERROR_BUSY});
         EXPECT_EQ(reinterpret_cast<std::uintptr_t>(&counted) % 64, 0u);
     };
-    std::thread(use).join(); // what the runtime allocates once
+    std::thread(use).join(); // the runtime allocates some blocks once
     const std::size_t before = busyBlocks();
     for (int i = 0; i < 100; ++i)
         std::thread(use).join();

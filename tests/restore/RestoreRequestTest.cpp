@@ -12,35 +12,32 @@
 namespace tavi {
 namespace {
 
-class RestoreRequests : public testing::Test {
-  protected:
+struct RestoreRequests : testing::Test {
     RestoreRequests()
     {
-        database_.open(service_.file(L"tavistate.dat"));
-        database_.execDML("CREATE TABLE restores(request_time INTEGER, machine_id TEXT, machine_alias TEXT, "
-                          "encryption_key TEXT);"
-                          "CREATE TABLE restore_files(restore_id, manifest_path, file_size, timestamp, ctime, "
-                          "attributes, target_path, overwrite)");
+        database.open(service.file(L"tavistate.dat"));
+        database.execDML("CREATE TABLE restores(request_time, machine_id, machine_alias, encryption_key);"
+                         "CREATE TABLE restore_files(restore_id, manifest_path, file_size, timestamp, ctime, "
+                         "attributes, target_path, overwrite)");
     }
     // Returns what was logged.
     std::string perform(const wchar_t* selected)
     {
         RestoreRequest request{{selected}, 100, L"", L"", true, L"id", L"alias", L"key"};
-        performRestore(request, *manifest_);
+        performRestore(request, *manifest);
         EXPECT_TRUE(request.selectedPaths.empty());
-        return log_.takeText();
+        return log.takeText();
     }
     // Runs the query; by default counts all rows.
     int count(const char* sql = "SELECT (SELECT count(*) FROM restores)+(SELECT count(*) FROM restore_files)")
     {
-        DbQuery rows = database_.execQuery(sql);
-        return rows.nextRow() ? rows.fieldInt(0, -1) : -2;
+        return database.execQuery(sql).fieldInt(0, -1);
     }
 
-    test::LogCapture log_;
-    test::InstalledService service_;
-    DbConnection database_;
-    const ManifestRef manifest_ =
+    test::LogCapture log;
+    test::InstalledService service;
+    DbConnection database;
+    const ManifestRef manifest =
         Manifest::parse(L"FILES\nC:\\one\\a.txt\n100:1:4000000000:5:0:x:0:40\n\nC:\\one\\b.txt\n100:1:2:6:0:x:0:41\n\n"
                         L"C:\\gone\\c\n100:1:2:6:0:x:0:41");
 };
@@ -50,8 +47,8 @@ TEST_F(RestoreRequests, AreStoredWithTheirFiles)
     const auto start = static_cast<int>(std::time(nullptr));
     EXPECT_EQ(perform(L"C:\\one"), "");
     EXPECT_EQ(perform(L"C:\\nothing there"), "");
-    EXPECT_EQ(count(), 2 + 2);                                         // a request without files is stored as well
-    EXPECT_GE(count("SELECT min(request_time) FROM restores"), start); // not the time of the version
+    EXPECT_EQ(count(), 2 + 2) << "a request without files is stored as well";
+    EXPECT_GE(count("SELECT min(request_time) FROM restores"), start) << "not the time of the version";
     // Times are stored as signed 32-bit numbers; attributes are octal in the manifest.
     EXPECT_EQ(count("SELECT count(*) FROM restores JOIN restore_files ON restores.rowid=restore_id WHERE "
                     "machine_id='id' AND machine_alias='alias' AND encryption_key='key' AND "
@@ -64,14 +61,14 @@ TEST_F(RestoreRequests, AreRolledBackAfterAFailureOfAnyKind)
 {
     // ROLLBACK: SQLite has ended the transaction by itself.
     for (const char* const failure : {"ABORT", "ROLLBACK"}) {
-        database_.execDML("CREATE TRIGGER t BEFORE INSERT ON restore_files WHEN new.manifest_path LIKE '%b.txt' "
-                          "BEGIN SELECT RAISE(" +
-                          wxString(failure) + ",'no'); END");
+        database.execDML("CREATE TRIGGER t BEFORE INSERT ON restore_files WHEN new.manifest_path LIKE '%b.txt' "
+                         "BEGIN SELECT RAISE(" +
+                         wxString(failure) + ",'no'); END");
         EXPECT_EQ(perform(L"C:\\one"), "1: Error: Error requesting restore: DB_CONSTRAINT[19]: no");
-        database_.execDML("DROP TRIGGER t");
+        database.execDML("DROP TRIGGER t");
         EXPECT_EQ(count(), 0) << failure;
     }
-    service_.install().SetValue(L"DataPath", wxString(L"C:\\no such folder"));
+    service.install().SetValue(L"DataPath", wxString(L"C:\\no such folder"));
     EXPECT_EQ(perform(L"C:\\one"),
               "1: Error: Failed to open state db for restores: DB_CANTOPEN[14]: unable to open database file");
 }
@@ -86,7 +83,7 @@ TEST_F(RestoreRequests, WaitAMinuteForOtherTransactions)
     });
     // A reader blocks the commit, a writer the first row.
     for (const auto mode : {TransactionMode::plain, TransactionMode::immediate}) {
-        const Transaction other(database_, mode);
+        const Transaction other(database, mode);
         EXPECT_EQ(count(), 0);
         waited = 0;
         EXPECT_EQ(perform(L"C:\\one"), "1: Error: Error requesting restore: DB_BUSY[5]: database is locked");

@@ -9,7 +9,7 @@ namespace tavi::test {
 
 enum class Heap { cpp, sqlite };
 
-// While it lives, `failing` allocations of its thread from one heap fail once `succeeding` have succeeded.
+// During its lifetime `failing` allocations of its thread from one heap fail, after `succeeding` ones that succeed.
 // Allocations.cpp replaces the operators new and delete.
 class FailingAllocations {
   public:
@@ -28,7 +28,7 @@ class FailingAllocations {
     {
         return thread_ == GetCurrentThreadId() && heap_ == heap && left_-- <= 0 && failing_-- > 0;
     }
-    // Becomes null as operator delete frees it.
+    // Operator delete sets it to null when it frees this block.
     static inline std::atomic<const void*> watched{nullptr};
 
   private:
@@ -36,7 +36,7 @@ class FailingAllocations {
     static inline Heap heap_{};
     static inline int left_ = 0, failing_ = 0;
     static inline sqlite3_mem_methods real_;
-    // SQLite takes other methods only before its first use. Without lookaside small blocks come from them too.
+    // SQLite accepts other methods only before its first use. Without lookaside they allocate small blocks too.
     static inline const bool installed_ = [] {
         sqlite3_config(SQLITE_CONFIG_GETMALLOC, &real_);
         sqlite3_mem_methods methods = real_;

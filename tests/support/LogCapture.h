@@ -10,8 +10,7 @@
 
 namespace tavi::test {
 
-// Takes the log of a test: one line per message, in UTF-8, as "level: " with wx's number of the level, and the line as
-// written.
+// Captures the log of a test as UTF-8 lines: wxWidgets' number of the level, ": " and the line as written.
 class LogCapture : wxLog {
   public:
     LogCapture()
@@ -22,7 +21,7 @@ class LogCapture : wxLog {
     {
         SetActiveTarget(before_);
     }
-    // What was logged since the last call.
+    // Returns the lines since the last call.
     std::vector<std::string> take()
     {
         return std::move(lines_);
@@ -34,7 +33,7 @@ class LogCapture : wxLog {
             text += line;
         return text;
     }
-    // Called once, on the thread that logs: so a test acts in the middle of what it tests.
+    // Sets a function that the thread that logs the next line calls, in the middle of the code under test.
     void onNextLine(std::function<void()> action)
     {
         onNextLine_ = std::move(action);

@@ -12,10 +12,10 @@ namespace tavi::test {
 constexpr const wchar_t* kStatus = L"\\\\.\\pipe\\tavistatus";
 constexpr const wchar_t* kCommand = L"\\\\.\\pipe\\tavibackup";
 
-// The service's end of a pipe: one of as many instances as there are in all.
+// One instance of the service's end of a pipe.
 class PipeServer {
   public:
-    // Without a buffer a client's write ends only when it is read.
+    // With a buffer of 0 bytes a client's write returns only once it is read.
     PipeServer(const wchar_t* name, DWORD access, DWORD instances = 1, DWORD buffer = 65536)
         : pipe_(CreateNamedPipeW(name, access, PIPE_TYPE_BYTE | PIPE_NOWAIT, instances, buffer, buffer, 0, nullptr))
     {
@@ -25,7 +25,7 @@ class PipeServer {
     {
         return waitUntil([&] {
             if (ConnectNamedPipe(pipe_.get(), nullptr), GetLastError() == ERROR_NO_DATA)
-                hangUp(); // one that came and went
+                hangUp(); // a client that has left
             return GetLastError() == ERROR_PIPE_CONNECTED;
         });
     }
@@ -34,7 +34,7 @@ class PipeServer {
         DWORD written = 0;
         EXPECT_TRUE(WriteFile(pipe_.get(), bytes.data(), static_cast<DWORD>(bytes.size()), &written, nullptr));
     }
-    // Everything up to the client's end.
+    // Reads until the client closes its end.
     std::string readAll() const
     {
         std::string all;
