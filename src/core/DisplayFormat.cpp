@@ -25,8 +25,8 @@ const Replacement kDatePictures[] = {{L"yyyy", L"%Y"}, {L"yy", L"%y"}, {L"MMMM",
                                      {L"MM", L"%m"},   {L"M", L"%m"},  {L"dddd", L"%A"}, {L"ddd", L"%a"},
                                      {L"dd", L"%d"},   {L"d", L"%d"},  {L"%%d", L"%d"}};
 
-template <std::size_t N>
-void replaceAll(wxString& text, const Replacement (&table)[N])
+template <std::size_t kSize>
+void replaceAll(wxString& text, const Replacement (&table)[kSize])
 {
     for (const Replacement& row : table)
         text.Replace(row.picture, row.conversion);

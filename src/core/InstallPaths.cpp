@@ -12,10 +12,10 @@ const wchar_t* const kConfigFiles[] = {L"\\taviconf.dat", L"\\tavikey.dat"};
 const wchar_t* const kDataFiles[] = {L"\\tavistate.dat",  L"\\tavi.log",      L"\\tavilog.dat", L"\\changes.dat",
                                      L"\\filter_raw.log", L"\\tavicache.dat", L"\\tavimap.dat", L""};
 
-template <std::size_t N>
-wxString filePath(const wchar_t* directoryValue, const wchar_t* const (&names)[N], std::size_t file)
+template <std::size_t kSize>
+wxString filePath(const wchar_t* directoryValue, const wchar_t* const (&names)[kSize], std::size_t file)
 {
-    if (file >= N)
+    if (file >= kSize)
         return wxString();
     wxString directory;
     const wxRegKey key(getInstallKeyName());

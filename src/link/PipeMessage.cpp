@@ -123,9 +123,9 @@ std::string bytesOf(const MessageText& text)
 
 EventMessage::EventMessage(EventType type) : EventMessage(type, 0, 0, 0, std::make_shared<const wxString>()) {}
 
-EventMessage::EventMessage(EventType type, std::uint32_t code_, std::uint64_t value_, std::uint32_t flag_,
-                           MessageText text_)
-    : PipeMessage(MessageKind::event, type), code(code_), value(value_), flag(flag_), text(std::move(text_))
+EventMessage::EventMessage(EventType type, std::uint32_t newCode, std::uint64_t newValue, std::uint32_t newFlag,
+                           MessageText newText)
+    : PipeMessage(MessageKind::event, type), code(newCode), value(newValue), flag(newFlag), text(std::move(newText))
 {
 }
 
@@ -145,10 +145,10 @@ std::unique_ptr<PipeMessage> EventMessage::clone() const
     return std::make_unique<EventMessage>(type(), code, value, flag, text);
 }
 
-SnapshotMessage::SnapshotMessage(std::uint32_t state_, std::uint64_t counter0_, std::uint64_t counter1_,
-                                 std::uint64_t counter2_, std::uint64_t counter3_)
-    : PipeMessage(MessageKind::snapshot, EventType::snapshot), state(state_), counter0(counter0_), counter1(counter1_),
-      counter2(counter2_), counter3(counter3_)
+SnapshotMessage::SnapshotMessage(std::uint32_t newState, std::uint64_t newCounter0, std::uint64_t newCounter1,
+                                 std::uint64_t newCounter2, std::uint64_t newCounter3)
+    : PipeMessage(MessageKind::snapshot, EventType::snapshot), state(newState), counter0(newCounter0),
+      counter1(newCounter1), counter2(newCounter2), counter3(newCounter3)
 {
 }
 
@@ -165,8 +165,8 @@ std::unique_ptr<PipeMessage> SnapshotMessage::clone() const
     return std::make_unique<SnapshotMessage>(state, counter0, counter1, counter2, counter3);
 }
 
-ItemMessage::ItemMessage(std::uint64_t value_, bool flag_, MessageText text_)
-    : PipeMessage(MessageKind::item, EventType::item), value(value_), flag(flag_), text(std::move(text_))
+ItemMessage::ItemMessage(std::uint64_t newValue, bool newFlag, MessageText newText)
+    : PipeMessage(MessageKind::item, EventType::item), value(newValue), flag(newFlag), text(std::move(newText))
 {
 }
 
@@ -185,9 +185,9 @@ std::unique_ptr<PipeMessage> ItemMessage::clone() const
     return std::make_unique<ItemMessage>(value, flag, text);
 }
 
-TextTripleMessage::TextTripleMessage(MessageText text1_, MessageText text2_, MessageText text3_)
-    : PipeMessage(MessageKind::textTriple, EventType::textTriple), text1(std::move(text1_)), text2(std::move(text2_)),
-      text3(std::move(text3_))
+TextTripleMessage::TextTripleMessage(MessageText newText1, MessageText newText2, MessageText newText3)
+    : PipeMessage(MessageKind::textTriple, EventType::textTriple), text1(std::move(newText1)),
+      text2(std::move(newText2)), text3(std::move(newText3))
 {
 }
 
@@ -206,8 +206,10 @@ std::unique_ptr<PipeMessage> TextTripleMessage::clone() const
     return std::make_unique<TextTripleMessage>(text1, text2, text3);
 }
 
-CounterMessage::CounterMessage(std::uint32_t code_, std::uint64_t value1_, std::uint64_t value2_, std::uint32_t flag_)
-    : PipeMessage(MessageKind::counter, EventType::counter), code(code_), value1(value1_), value2(value2_), flag(flag_)
+CounterMessage::CounterMessage(std::uint32_t newCode, std::uint64_t newValue1, std::uint64_t newValue2,
+                               std::uint32_t newFlag)
+    : PipeMessage(MessageKind::counter, EventType::counter), code(newCode), value1(newValue1), value2(newValue2),
+      flag(newFlag)
 {
 }
 

@@ -47,6 +47,7 @@ TEST(Database, ReportsMisuseAndFailures)
         {L"DB_ERROR[1]: ", [&] { connection.compileStatement("SELEC"); }}, // deliberately without detail
         {L"DB_ERROR[1]: near \"\xE9\": syntax error", [&] { connection.execDML(wxString(L"\xE9 x")); }},
         {L"DB_RANGE[25]: Error binding string param", [&] { insert.bind(3, wxString(L"x")); }},
+        {L"DB_RANGE[25]: Error binding int64 param", [&] { insert.bind(9, std::int64_t{1}); }},
         {L"DB_CONSTRAINT[19]: UNIQUE constraint failed: t.a", [&] { insert.execDML(); }},
         {L"DB_CANTOPEN[14]: unable to open database file", [] { DbConnection().open(L"/no such folder/x.db"); }},
         {L"DB_ERROR[1]: integer overflow", [&] { failing.nextRow(); }},
