@@ -1,5 +1,3 @@
-#include "bench/Bench.h"
-
 #include <algorithm>
 #include <atomic>
 #include <chrono>
@@ -9,9 +7,9 @@
 #include <stdexcept>
 
 #include <windows.h>
-
 #include <psapi.h>
 
+#include "bench/Bench.h"
 #include "core/Handles.h"
 
 namespace tavi::bench {

@@ -2,8 +2,8 @@
 #include <cstdlib>
 #include <string>
 
-#include <wx/log.h>
 #include <zlib.h>
+#include <wx/log.h>
 
 #include "core/Utf8.h"
 #include "manifest/StoredManifest.h"

@@ -6,8 +6,8 @@
 #include <cstdlib>
 #include <cstring>
 
-#include <malloc.h>
 #include <windows.h>
+#include <malloc.h>
 
 #include "core/Boundary.h"
 

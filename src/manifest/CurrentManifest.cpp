@@ -5,12 +5,12 @@
 
 #include <wx/datetime.h>
 
-#include "exclusions/Graylist.h"
-#include "manifest/ManifestWatcher.h"
 #include "core/BackgroundThread.h"
 #include "core/Handles.h"
 #include "core/Options.h"
 #include "core/ScopeGuard.h"
+#include "exclusions/Graylist.h"
+#include "manifest/ManifestWatcher.h"
 
 namespace tavi {
 namespace {

@@ -1,7 +1,7 @@
 #include "manifest/Manifest.h"
 
-#include "manifest/ManifestParser.h"
 #include "core/Utf8.h"
+#include "manifest/ManifestParser.h"
 
 namespace tavi {
 namespace {

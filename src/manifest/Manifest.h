@@ -9,8 +9,8 @@
 
 #include <wx/string.h>
 
-#include "manifest/ManifestStorage.h"
 #include "core/RefCounted.h"
+#include "manifest/ManifestStorage.h"
 
 // The parsed backup set. A manifest is immutable: any thread that holds a reference reads it without a lock.
 namespace tavi {

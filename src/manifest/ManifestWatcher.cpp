@@ -4,9 +4,9 @@
 
 #include <wx/log.h>
 
-#include "manifest/StoredManifest.h"
 #include "core/Boundary.h"
 #include "core/InstallPaths.h"
+#include "manifest/StoredManifest.h"
 #include "statedb/Database.h"
 
 namespace tavi {

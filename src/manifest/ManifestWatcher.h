@@ -4,8 +4,8 @@
 #include <functional>
 #include <optional>
 
-#include "manifest/Manifest.h"
 #include "core/PublishedPointer.h"
+#include "manifest/Manifest.h"
 
 namespace tavi {
 

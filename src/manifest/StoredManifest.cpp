@@ -8,8 +8,8 @@
 #include <wx/mstream.h>
 #include <wx/zstream.h>
 
-#include "manifest/ManifestParser.h"
 #include "core/Utf8.h"
+#include "manifest/ManifestParser.h"
 
 namespace tavi {
 namespace {

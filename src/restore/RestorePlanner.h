@@ -6,9 +6,9 @@
 
 #include <wx/string.h>
 
-#include "manifest/Manifest.h"
 #include "core/BlockArray.h"
 #include "core/Paths.h"
+#include "manifest/Manifest.h"
 
 namespace tavi {
 

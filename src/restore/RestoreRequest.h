@@ -3,8 +3,8 @@
 #include <memory>
 #include <optional>
 
-#include "statedb/Database.h"
 #include "restore/RestorePlanner.h"
+#include "statedb/Database.h"
 
 namespace tavi {
 

@@ -4,8 +4,8 @@
 
 #include <strsafe.h>
 
-#include "manifest/CurrentManifest.h"
 #include "core/Boundary.h"
+#include "manifest/CurrentManifest.h"
 #include "ui/ContextMenu.h"
 #include "ui/PropertyPage.h"
 

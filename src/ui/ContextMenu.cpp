@@ -12,8 +12,8 @@
 #include "manifest/CurrentManifest.h"
 #include "ui/ActivationScope.h"
 #include "ui/MenuBitmap.h"
-#include "ui/VersionsDialog.h"
 #include "ui/resource.h"
+#include "ui/VersionsDialog.h"
 
 namespace tavi {
 namespace {

@@ -7,12 +7,12 @@
 #include <wx/log.h>
 
 #include "core/Boundary.h"
-#include "core/Module.h"
 #include "core/Handles.h"
+#include "core/Module.h"
 #include "core/Utf8.h"
 #include "ui/ActivationScope.h"
-#include "ui/VersionsDialog.h"
 #include "ui/resource.h"
+#include "ui/VersionsDialog.h"
 
 namespace tavi {
 namespace {

@@ -16,8 +16,8 @@
 #include "link/CommandPipe.h"
 #include "link/StatusListener.h"
 #include "ui/ActivationScope.h"
-#include "ui/WindowFrame.h"
 #include "ui/resource.h"
+#include "ui/WindowFrame.h"
 
 namespace tavi {
 namespace {

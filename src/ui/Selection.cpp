@@ -6,9 +6,9 @@
 #include <shlwapi.h>
 #include <wx/log.h>
 
-#include "manifest/CurrentManifest.h"
 #include "core/Handles.h"
 #include "core/Utf8.h"
+#include "manifest/CurrentManifest.h"
 #include "statedb/Database.h"
 #include "statedb/StateLookups.h"
 

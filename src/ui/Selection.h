@@ -4,11 +4,10 @@
 
 #include <windows.h>
 #include <shlobj.h>
-
 #include <wx/string.h>
 
-#include "manifest/Manifest.h"
 #include "core/Paths.h"
+#include "manifest/Manifest.h"
 
 namespace tavi {
 

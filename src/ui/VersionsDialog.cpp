@@ -15,17 +15,17 @@
 #include "core/Boundary.h"
 #include "core/DisplayFormat.h"
 #include "core/Handles.h"
-#include "core/ModuleThread.h"
 #include "core/LocalePattern.h"
 #include "core/Module.h"
+#include "core/ModuleThread.h"
 #include "core/ScopeGuard.h"
 #include "core/Utf8.h"
 #include "restore/RestoreRequest.h"
 #include "ui/ActivationScope.h"
 #include "ui/CopyTarget.h"
+#include "ui/resource.h"
 #include "ui/RestoreProgressWindow.h"
 #include "ui/WindowFrame.h"
-#include "ui/resource.h"
 
 namespace tavi {
 namespace {

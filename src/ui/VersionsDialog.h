@@ -7,8 +7,8 @@
 #include <windows.h>
 #include <wx/string.h>
 
-#include "manifest/Manifest.h"
 #include "core/Module.h"
+#include "manifest/Manifest.h"
 #include "ui/Selection.h"
 
 namespace tavi {

@@ -1,7 +1,6 @@
 #include "core/Paths.h"
 
 #include <windows.h>
-
 #include <gtest/gtest.h>
 
 #include "tests/support/Registry.h"

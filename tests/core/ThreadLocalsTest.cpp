@@ -2,9 +2,8 @@
 
 #include <thread>
 
-#include <malloc.h>
 #include <windows.h>
-
+#include <malloc.h>
 #include <gtest/gtest.h>
 
 namespace tavi {

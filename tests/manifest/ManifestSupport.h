@@ -6,9 +6,9 @@
 #include <wx/mstream.h>
 #include <wx/zstream.h>
 
+#include "core/Utf8.h"
 #include "manifest/ManifestParser.h"
 #include "manifest/StoredManifest.h"
-#include "core/Utf8.h"
 
 namespace tavi::test {
 

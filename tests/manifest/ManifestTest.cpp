@@ -1,8 +1,8 @@
-#include <gtest/gtest.h>
-
 #include <map>
 #include <random>
 #include <thread>
+
+#include <gtest/gtest.h>
 
 #include "core/PublishedPointer.h"
 #include "tests/manifest/ManifestSupport.h"

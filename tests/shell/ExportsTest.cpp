@@ -1,8 +1,8 @@
 #include <fstream>
 
 #include "shell/Registration.h"
-#include "tests/support/LoadedModule.h"
 #include "tests/support/Counts.h"
+#include "tests/support/LoadedModule.h"
 #include "tests/support/Pipes.h"
 #include "ui/PropertyPage.h"
 

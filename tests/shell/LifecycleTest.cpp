@@ -2,8 +2,8 @@
 
 #include <process.h>
 
-#include "tests/support/LoadedModule.h"
 #include "tests/support/Counts.h"
+#include "tests/support/LoadedModule.h"
 
 namespace tavi {
 namespace {

@@ -6,8 +6,8 @@
 #include <string>
 #include <string_view>
 
-#include <sqlite3.h>
 #include <windows.h>
+#include <sqlite3.h>
 #include <wx/msw/registry.h>
 
 #include "core/Handles.h"

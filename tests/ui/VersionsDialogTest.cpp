@@ -7,8 +7,8 @@
 #include "statedb/Database.h"
 #include "tests/manifest/ManifestSupport.h"
 #include "tests/support/Dialogs.h"
-#include "ui/RestoreProgressWindow.h"
 #include "ui/resource.h"
+#include "ui/RestoreProgressWindow.h"
 
 namespace tavi {
 namespace {

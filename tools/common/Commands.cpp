@@ -1,9 +1,9 @@
 #include "Commands.h"
 
-#include <windows.h>
-
 #include <algorithm>
 #include <exception>
+
+#include <windows.h>
 
 #include "Text.h"
 

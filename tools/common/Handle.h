@@ -1,8 +1,8 @@
 #pragma once
 
-#include <windows.h>
-
 #include <memory>
+
+#include <windows.h>
 
 namespace tools {
 

@@ -1,8 +1,8 @@
 #include "Text.h"
 
-#include <windows.h>
-
 #include <cwchar>
+
+#include <windows.h>
 
 namespace tools {
 namespace {

@@ -1,9 +1,9 @@
 #include "Controls.h"
 
-#include <commctrl.h>
-
 #include <algorithm>
 #include <vector>
+
+#include <commctrl.h>
 
 #include "common/Text.h"
 

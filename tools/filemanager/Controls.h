@@ -1,8 +1,8 @@
 #pragma once
 
-#include <windows.h>
-
 #include <string>
+
+#include <windows.h>
 
 // Windows of this process and their controls, as another thread reads and operates them. Every message to a window has
 // a time limit; what cannot be done throws a Failure.

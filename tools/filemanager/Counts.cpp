@@ -1,13 +1,13 @@
 #include "Counts.h"
 
+#include <algorithm>
+#include <atomic>
+#include <cstdint>
+
 #include <windows.h>
 #include <psapi.h>
 #include <tlhelp32.h>
 #include <winternl.h>
-
-#include <algorithm>
-#include <atomic>
-#include <cstdint>
 
 #include "common/Handle.h"
 #include "common/Text.h"

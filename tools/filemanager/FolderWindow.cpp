@@ -1,11 +1,11 @@
 #include "FolderWindow.h"
 
+#include <algorithm>
+#include <utility>
+
 #include <shellapi.h>
 #include <shlwapi.h>
 #include <windowsx.h>
-
-#include <algorithm>
-#include <utility>
 
 #include "common/Text.h"
 

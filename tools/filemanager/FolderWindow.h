@@ -1,11 +1,11 @@
 #pragma once
 
-#include <windows.h>
-#include <commctrl.h>
-
 #include <functional>
 #include <string>
 #include <vector>
+
+#include <windows.h>
+#include <commctrl.h>
 
 #include "ShellMenu.h"
 

@@ -2,9 +2,9 @@
 #include <commctrl.h>
 #include <ole2.h>
 
+#include "common/Text.h"
 #include "FolderWindow.h"
 #include "Script.h"
-#include "common/Text.h"
 
 namespace filemanager {
 namespace {

@@ -1,8 +1,8 @@
 #include "Script.h"
 
+#include "common/Text.h"
 #include "Controls.h"
 #include "Counts.h"
-#include "common/Text.h"
 
 namespace filemanager {
 namespace {

@@ -5,9 +5,9 @@
 #include <string>
 #include <vector>
 
-#include "FolderWindow.h"
 #include "common/Commands.h"
 #include "common/Handle.h"
+#include "FolderWindow.h"
 
 namespace filemanager {
 

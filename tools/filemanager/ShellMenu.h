@@ -1,12 +1,12 @@
 #pragma once
 
-#include <windows.h>
-#include <shlobj.h>
-#include <wrl/client.h>
-
 #include <memory>
 #include <string>
 #include <vector>
+
+#include <windows.h>
+#include <shlobj.h>
+#include <wrl/client.h>
 
 namespace filemanager {
 

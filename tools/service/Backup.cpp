@@ -1,18 +1,18 @@
 #include "Backup.h"
 
-#include <windows.h>
-
 #include <algorithm>
-#include <cwchar>
 #include <ctime>
+#include <cwchar>
 #include <filesystem>
 #include <map>
 
+#include <windows.h>
+
+#include "common/Text.h"
 #include "Database.h"
 #include "History.h"
 #include "Installation.h"
 #include "Manifest.h"
-#include "common/Text.h"
 
 namespace service {
 namespace {

@@ -2,8 +2,8 @@
 
 #include <memory>
 
-#include "Messages.h"
 #include "common/Text.h"
+#include "Messages.h"
 
 namespace service {
 namespace {

@@ -1,10 +1,10 @@
 #pragma once
 
-#include <sqlite3.h>
-
 #include <cstdint>
 #include <string>
 #include <string_view>
+
+#include <sqlite3.h>
 
 namespace service {
 

@@ -1,15 +1,15 @@
 #include "Installation.h"
 
-#include <windows.h>
-#include <shlwapi.h>
-
 #include <ctime>
 #include <filesystem>
 
+#include <windows.h>
+#include <shlwapi.h>
+
+#include "common/Text.h"
 #include "Database.h"
 #include "History.h"
 #include "Manifest.h"
-#include "common/Text.h"
 
 namespace service {
 namespace {

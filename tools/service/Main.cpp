@@ -1,12 +1,12 @@
-#include <windows.h>
-
 #include <exception>
 
+#include <windows.h>
+
 #include "Backup.h"
-#include "Installation.h"
-#include "Run.h"
 #include "common/Commands.h"
 #include "common/Text.h"
+#include "Installation.h"
+#include "Run.h"
 
 namespace {
 

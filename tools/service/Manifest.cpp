@@ -1,12 +1,12 @@
 #include "Manifest.h"
 
-#include <zlib.h>
-
 #include <cinttypes>
 #include <cstdio>
 
-#include "Database.h"
+#include <zlib.h>
+
 #include "common/Text.h"
+#include "Database.h"
 
 namespace service {
 namespace {

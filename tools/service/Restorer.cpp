@@ -1,14 +1,14 @@
 #include "Restorer.h"
 
-#include <windows.h>
-
 #include <algorithm>
 #include <exception>
 #include <fstream>
 #include <utility>
 
-#include "Messages.h"
+#include <windows.h>
+
 #include "common/Text.h"
+#include "Messages.h"
 
 namespace service {
 namespace {

@@ -8,10 +8,10 @@
 #include <thread>
 #include <vector>
 
+#include "common/Handle.h"
 #include "History.h"
 #include "Installation.h"
 #include "StatusServer.h"
-#include "common/Handle.h"
 
 namespace service {
 

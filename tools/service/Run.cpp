@@ -4,10 +4,10 @@
 #include <vector>
 
 #include "CommandServer.h"
-#include "Restorer.h"
-#include "StatusServer.h"
 #include "common/Commands.h"
 #include "common/Text.h"
+#include "Restorer.h"
+#include "StatusServer.h"
 
 namespace service {
 namespace {

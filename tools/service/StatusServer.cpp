@@ -4,8 +4,8 @@
 #include <cstdlib>
 #include <utility>
 
-#include "Messages.h"
 #include "common/Text.h"
+#include "Messages.h"
 
 namespace service {
 namespace {
