@@ -11,7 +11,8 @@ namespace tavi {
 // absent or is no date and time.
 std::optional<std::int64_t> readManifestTime();
 
-// Returns whether the default exclusions apply; nothing if the setting is absent.
+// Returns whether the default exclusions leave out the machine's places only, and so keep the users' places; nothing if
+// the setting is absent.
 std::optional<bool> readGraylistEnabled();
 
 } // namespace tavi
