@@ -23,9 +23,9 @@ wxString inside(const wxString& folder, const wxString& name)
     return folder.EndsWith(L"\\") ? folder + name : folder + L"\\" + name;
 }
 
-template <std::size_t N>
+template <std::size_t kCount>
 void addCarvedOut(const ExclusionSources& sources, const RuleSink& add, const wxString& folder,
-                  const wchar_t* const (&places)[N])
+                  const wchar_t* const (&places)[kCount])
 {
     for (const wchar_t* const place : places) {
         if (sources.exists(folder + place))

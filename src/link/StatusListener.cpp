@@ -18,8 +18,9 @@ constexpr DWORD kHangUpMs = 10;
 
 std::atomic<MessageSink> messageSink{nullptr};
 
-// Creates the status on its first use. Not a local static: threads that meet in its guard make the C++ runtime create
-// two semaphores and an event, which would outlive the module. Here both create a status, and one of the two is kept.
+// Creates the status on its first use. Not a local static: threads that meet in the guard of one make the C++ runtime
+// create two semaphores and an event, which would outlive the module. Here both create a status, and one of the two is
+// kept.
 class LazyStatus {
   public:
     ~LazyStatus()

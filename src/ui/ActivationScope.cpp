@@ -1,5 +1,7 @@
 #include "ui/ActivationScope.h"
 
+#include <atomic>
+
 #include "core/Handles.h"
 #include "core/Module.h"
 #include "ui/resource.h"
@@ -31,13 +33,35 @@ HANDLE createModuleContext() noexcept
     return CreateActCtxW(&request);
 }
 
+// Created on first use, released when the module is unmapped. Not a local static: threads that meet in the guard of one
+// make the C++ runtime create two semaphores and an event, which would outlive the module. Here both create a context,
+// and one of the two is kept.
+class ModuleContext {
+  public:
+    ~ModuleContext()
+    {
+        const ContextHandle released(context_);
+    }
+    HANDLE get() noexcept
+    {
+        HANDLE context = context_;
+        if (context != INVALID_HANDLE_VALUE)
+            return context;
+        ContextHandle created(createModuleContext());
+        return context_.compare_exchange_strong(context, created.get()) ? created.release() : context;
+    }
+
+  private:
+    std::atomic<HANDLE> context_{INVALID_HANDLE_VALUE};
+};
+ModuleContext moduleContext;
+
 } // namespace
 
 ActivationScope::ActivationScope() noexcept
 {
-    // Created on first use, released when the module is unmapped.
-    static const ContextHandle context(createModuleContext());
-    active_ = context && ActivateActCtx(context.get(), &cookie_);
+    const HANDLE context = moduleContext.get();
+    active_ = context != INVALID_HANDLE_VALUE && ActivateActCtx(context, &cookie_);
 }
 
 ActivationScope::~ActivationScope()

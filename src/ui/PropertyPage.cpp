@@ -47,30 +47,15 @@ UINT CALLBACK pageCallback(HWND, UINT message, PROPSHEETPAGEW* description)
     });
 }
 
-// The page functions of the common controls that the module's manifest names. Resolved on first use, in an activation
-// scope. The library stays loaded, since a page may outlive the object that added it.
-struct SheetFunctions {
-    SheetFunctions() noexcept
-    {
-        if (const HMODULE controls = LoadLibraryW(L"comctl32.dll")) {
-            findFunction(controls, "CreatePropertySheetPageW", create);
-            findFunction(controls, "DestroyPropertySheetPage", destroy);
-        }
-    }
-    decltype(&CreatePropertySheetPageW) create = nullptr;
-    decltype(&DestroyPropertySheetPage) destroy = nullptr;
-};
-
-const SheetFunctions& sheetFunctions() noexcept
+// Finds a function of the common controls that the module's manifest names; inside an activation scope. The library is
+// never freed, since a page may outlive the object that added it.
+template <class Function>
+Function sheetFunction(const char* name) noexcept
 {
-    static const SheetFunctions functions;
-    return functions;
-}
-
-BOOL destroyPage(HPROPSHEETPAGE page) noexcept
-{
-    const auto destroy = sheetFunctions().destroy;
-    return destroy ? destroy(page) : FALSE;
+    Function function = nullptr;
+    if (const HMODULE controls = LoadLibraryW(L"comctl32.dll"))
+        findFunction(controls, name, function);
+    return function;
 }
 
 } // namespace
@@ -95,7 +80,7 @@ void addPropertyPage(const Selection& selection, ManifestRef manifest, LPFNADDPR
     description.pfnCallback = pageCallback;
     static_assert(sizeof(moduleRefCount()) == sizeof(UINT), "the system counts in the module's own count");
     description.pcRefParent = reinterpret_cast<UINT*>(&moduleRefCount());
-    const auto create = sheetFunctions().create;
+    const auto create = sheetFunction<decltype(&CreatePropertySheetPageW)>("CreatePropertySheetPageW");
     const HPROPSHEETPAGE handle = create ? create(&description) : nullptr;
     if (!handle) {
         wxLogError("Unable to create the property page (%lu)", GetLastError());
@@ -103,8 +88,10 @@ void addPropertyPage(const Selection& selection, ManifestRef manifest, LPFNADDPR
     }
     // The page's callback frees it.
     static_cast<void>(page.release());
-    if (!addPage(handle, parameter))
-        destroyPage(handle);
+    if (addPage(handle, parameter))
+        return;
+    if (const auto destroy = sheetFunction<decltype(&DestroyPropertySheetPage)>("DestroyPropertySheetPage"))
+        destroy(handle);
 }
 
 } // namespace tavi

@@ -41,7 +41,7 @@ class Medium {
   public:
     explicit Medium(IDataObject& data) noexcept
     {
-        static const auto format = static_cast<CLIPFORMAT>(RegisterClipboardFormatW(L"Shell IDList Array"));
+        const auto format = static_cast<CLIPFORMAT>(RegisterClipboardFormatW(L"Shell IDList Array"));
         FORMATETC request{format, nullptr, DVASPECT_CONTENT, -1, TYMED_HGLOBAL};
         held_ = SUCCEEDED(data.GetData(&request, &medium_));
         if (held_ && medium_.tymed == TYMED_HGLOBAL && medium_.hGlobal)
@@ -131,8 +131,8 @@ RefPtr<IShellFolder> bindParent(LPCITEMIDLIST parent)
 
 bool isAccepted(const wchar_t* name, std::size_t length, DriveTypeQuery driveType)
 {
-    constexpr std::size_t driveRootLength = 3;
-    return length != 0 && name[0] != L':' && (length != driveRootLength || driveType(name) == DRIVE_FIXED);
+    constexpr std::size_t kDriveRootChars = 3;
+    return length != 0 && name[0] != L':' && (length != kDriveRootChars || driveType(name) == DRIVE_FIXED);
 }
 
 void collectItems(IDataObject& data, DriveTypeQuery driveType, PathSet& paths)
