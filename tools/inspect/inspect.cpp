@@ -15,16 +15,16 @@ using namespace tavi;
 
 const char* meaning(std::uint32_t state)
 {
-    static const char* const meanings[] = {"backed up",
-                                           "left out, but not what is listed below",
-                                           "backed up, some below left out",
-                                           "left out, some below backed up",
-                                           "backed up, nearly all below left out",
-                                           "left out, some below backed up",
-                                           "backed up, all below left out",
-                                           "left out",
-                                           "backed up"};
-    return state < std::size(meanings) ? meanings[state] : "unknown";
+    static constexpr const char* kMeanings[] = {"backed up",
+                                                "left out, but not what is listed below",
+                                                "backed up, some below left out",
+                                                "left out, some below backed up",
+                                                "backed up, nearly all below left out",
+                                                "left out, some below backed up",
+                                                "backed up, all below left out",
+                                                "left out",
+                                                "backed up"};
+    return state < std::size(kMeanings) ? kMeanings[state] : "unknown";
 }
 
 } // namespace
