@@ -4,7 +4,6 @@
 
 #include "link/PipeMessage.h"
 
-// Messages and frames in short form.
 namespace tavi::test {
 
 // Converts two hexadecimal digits per byte, with blanks between bytes.

@@ -12,17 +12,15 @@ namespace {
 using namespace test;
 using E = EventType;
 
-// Creates a message as the reader does; by default the announced length is the payload's.
-std::unique_ptr<PipeMessage> created(E type, const std::string& payload, std::size_t length = 0)
+std::unique_ptr<PipeMessage> created(E type, const std::string& payload)
 {
     const auto buffer = MessageBuffer::create();
-    buffer->ensure(static_cast<std::uint32_t>(payload.size()));
     std::memcpy(buffer->data(), payload.data(), payload.size());
-    buffer->setLength(static_cast<std::uint32_t>(length > 0 ? length : payload.size()));
+    buffer->setLength(static_cast<std::uint32_t>(payload.size()));
     return createMessage(static_cast<std::uint32_t>(type), *buffer);
 }
 
-TEST(PipeMessage, EveryKindKeepsItsLayoutInBothDirections)
+TEST(PipeMessage, MessagesKeepTheirLayoutInBothDirections)
 {
     const std::pair<std::shared_ptr<PipeMessage>, const char*> cases[] = {
         {std::make_shared<EventMessage>(E::restoreEnded),
@@ -35,69 +33,44 @@ TEST(PipeMessage, EveryKindKeepsItsLayoutInBothDirections)
          "15000000 12000000 0700000000000000 01000000 02000000 6162"},
         {std::make_shared<TextTripleMessage>(text(L"a"), text(L""), text(L"bc")),
          "16000000 0f000000 01000000 00000000 02000000 616263"},
-        {std::make_shared<CounterMessage>(9, 1, 0x100000000, 0xfffffffe),
-         "17000000 18000000 09000000 0100000000000000 0000000001000000 feffffff"},
     };
     for (const auto& [message, frame] : cases) {
         const std::string expected = bytes(frame);
         EXPECT_EQ(serialised(*message), expected) << frame;
-        const auto read = created(message->type(), expected.substr(kFrameHeaderSize));
-        ASSERT_TRUE(read) << frame;
-        EXPECT_EQ(read->kind(), message->kind());
-        EXPECT_EQ(serialised(*read->clone()), expected) << frame;
+        EXPECT_EQ(serialised(*created(message->type(), expected.substr(kFrameHeaderSize))->clone()), expected) << frame;
     }
-    // Any flag but 0 is read as true and written as 1.
-    const auto item = created(E::item, bytes("0000000000000000 07000000 00000000"));
-    EXPECT_EQ(serialised(*item), bytes("15000000 10000000 0000000000000000 01000000 00000000"));
 }
 
 TEST(PipeMessage, TypeAndLengthDecideWhatIsCreated)
 {
-    const std::string zeros(64, '\0');
-    const MessageKind special[] = {MessageKind::snapshot, MessageKind::item, MessageKind::textTriple,
-                                   MessageKind::counter};
-    const std::uint32_t lengths[] = {36, 16, 12, 24};
+    constexpr std::size_t kLengths[] = {20, 36, 16, 12, 24}; // by kind
     for (std::uint32_t type = 0; type <= 60; ++type) {
         const bool isUnused =
-            (type >= 26 && type <= 31) || type == 37 || type == 38 || (type >= 41 && type <= 50) || type > 57;
-        const bool isSpecial = type >= 20 && type <= 23;
-        const std::uint32_t least = isSpecial ? lengths[type - 20] : 20;
-        EXPECT_FALSE(created(E{type}, zeros, least - 1)) << type;
-        const auto message = created(E{type}, zeros, least);
-        ASSERT_EQ(message == nullptr, isUnused) << type;
-        EXPECT_TRUE(isUnused || message->kind() == (isSpecial ? special[type - 20] : MessageKind::event)) << type;
+            (type > 25 && type < 32) || (type > 40 && type < 51) || type == 37 || type == 38 || type > 57;
+        const std::uint32_t kind = type >= 20 && type <= 23 ? type - 19 : 0;
+        EXPECT_FALSE(created(E{type}, std::string(kLengths[kind] - 1, '\0'))) << type;
+        const auto message = created(E{type}, std::string(kLengths[kind], '\0'));
+        EXPECT_TRUE(isUnused ? !message : message && message->kind() == MessageKind{kind}) << type;
     }
-    EXPECT_FALSE(created(E{UINT32_MAX}, zeros));
 }
 
 TEST(PipeMessage, TextsExtendToTheEndOfTheBufferAtMost)
 {
-    const std::string head = bytes("00000000 0000000000000000 00000000");
     const std::pair<const char*, std::size_t> counts[] = {{"05000000", 5}, {"ffffffff", 1004}, {"00000080", 1004}};
     for (const auto& [count, length] : counts) {
-        const auto message = created(E::restoreItem, head + bytes(count) + "abc");
+        const auto message = created(E::restoreItem, std::string(16, '\0') + bytes(count) + "abc");
         const wxString& held = *static_cast<const EventMessage&>(*message).text;
-        EXPECT_EQ(held.length(), length);
-        EXPECT_TRUE(held.StartsWith(L"abc"));
+        EXPECT_TRUE(held.length() == length && held.StartsWith(L"abc")) << count;
     }
-    const auto triple = created(E::textTriple, bytes("01000000 ffffffff ffffffff") + "xyz");
-    const auto& texts = static_cast<const TextTripleMessage&>(*triple);
-    EXPECT_EQ(*texts.text1, L"x");
-    EXPECT_EQ(texts.text2->length(), 1024u - 13);
-    EXPECT_TRUE(texts.text3->empty());
 }
 
-TEST(PipeMessage, BuffersGrowByAKilobyteMoreThanNeeded)
+TEST(PipeMessage, ABufferThatCannotGrowHoldsNoMessage)
 {
     const auto buffer = MessageBuffer::create();
-    const std::pair<std::uint32_t, std::uint32_t> steps[] = {{1024, 1024}, {1025, 2049}, {2000, 2049}, {UINT32_MAX, 0}};
-    for (const auto& [size, capacity] : steps) {
-        buffer->ensure(size);
-        EXPECT_EQ(buffer->capacity(), capacity);
-        EXPECT_EQ(buffer->data() == nullptr, capacity == 0);
-    }
-    EXPECT_FALSE(createMessage(52, *buffer));
-    EXPECT_EQ(serialised(*event(E::textA, 0, wxString(L'x', 2000))).size(), 2028u);
+    buffer->ensure(1025);
+    EXPECT_EQ(buffer->capacity(), 2049u);
+    buffer->ensure(UINT32_MAX);
+    EXPECT_TRUE(!buffer->data() && buffer->capacity() == 0 && !createMessage(52, *buffer));
 }
 
 } // namespace

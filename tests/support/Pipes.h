@@ -34,20 +34,6 @@ class PipeServer {
         DWORD written = 0;
         EXPECT_TRUE(WriteFile(pipe_.get(), bytes.data(), static_cast<DWORD>(bytes.size()), &written, nullptr));
     }
-    // Reads until the client closes its end.
-    std::string readAll() const
-    {
-        std::string all;
-        waitUntil([&] {
-            char part[256];
-            DWORD count = 0;
-            if (!ReadFile(pipe_.get(), part, sizeof(part), &count, nullptr))
-                return GetLastError() == ERROR_BROKEN_PIPE;
-            all.append(part, count);
-            return false;
-        });
-        return all;
-    }
     void hangUp() const
     {
         DisconnectNamedPipe(pipe_.get());
