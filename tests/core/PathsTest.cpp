@@ -5,20 +5,14 @@
 
 #include "tests/support/Registry.h"
 
-namespace tavi {
-namespace {
-
 TEST(longPath, IsTheLongFormWithAnUpperCaseDriveLetterOrEmpty)
 {
-    const test::TemporaryFolder folder;
+    const tavi::test::TemporaryFolder folder;
     wchar_t shortPath[MAX_PATH];
     GetShortPathNameW(folder.path().c_str(), shortPath, MAX_PATH);
     EXPECT_NE(shortPath, folder.path());
     shortPath[0] = L'c';
-    const wxString path = longPath(shortPath);
+    const wxString path = tavi::longPath(shortPath);
     EXPECT_TRUE(path[0] == L'C' && path.IsSameAs(folder.path(), false)) << path.utf8_string();
-    EXPECT_EQ(longPath(folder.path() + L"\\missing"), L"");
+    EXPECT_EQ(tavi::longPath(folder.path() + L"\\missing"), L"");
 }
-
-} // namespace
-} // namespace tavi

@@ -3,12 +3,9 @@
 
 #include <gtest/gtest.h>
 
-namespace tavi {
-namespace {
-
 volatile std::size_t tooMuch = 64;
 
-[[gnu::noinline]] void writeBeyondTheArray()
+[[gnu::noinline]] static void writeBeyondTheArray()
 {
     char bytes[16];
     volatile char* const at = bytes;
@@ -18,12 +15,8 @@ volatile std::size_t tooMuch = 64;
 
 TEST(StackProtectorDeathTest, AnOverrunEndsTheProcessAtOnce)
 {
-    GTEST_FLAG_SET(death_test_style, "threadsafe");
     const testing::ExitedWithCode overrun(static_cast<int>(0xC0000409));
     EXPECT_EXIT(writeBeyondTheArray(), overrun, "");
     static char bytes[16]; // beyond the reach of the stack protector
     EXPECT_EXIT(std::memcpy(bytes, std::string(tooMuch, 'x').c_str(), tooMuch), overrun, "");
 }
-
-} // namespace
-} // namespace tavi

@@ -7,8 +7,8 @@
 #include "tests/link/Frames.h"
 #include "tests/support/Pipes.h"
 
-namespace tavi::test {
-namespace {
+using namespace tavi;
+using namespace tavi::test;
 
 TEST(CommandPipe, KeepsTheCommandOnlyIfThePipeCannotBeOpened)
 {
@@ -26,6 +26,3 @@ TEST(CommandPipe, KeepsTheCommandOnlyIfThePipeCannotBeOpened)
     EXPECT_FALSE(command);
     EXPECT_EQ(log.takeText(), "");
 }
-
-} // namespace
-} // namespace tavi::test

@@ -6,7 +6,8 @@
 
 #include "tests/link/Frames.h"
 
-namespace tavi {
+using namespace tavi;
+
 namespace {
 
 using test::bytes;
@@ -70,4 +71,3 @@ TEST(MessageReader, GivesUpAtEveryCheck)
 }
 
 } // namespace
-} // namespace tavi

@@ -7,13 +7,11 @@
 
 #include "tests/link/Frames.h"
 
-namespace tavi {
-namespace {
-
+using namespace tavi;
 using E = EventType;
 using test::event;
 
-constexpr std::size_t kMax = PendingMessages::kMaxCount;
+static constexpr std::size_t kMax = PendingMessages::kMaxCount;
 
 TEST(PendingMessages, LoseTheOldestTextsAndAmountsOnly)
 {
@@ -69,6 +67,3 @@ TEST(PendingMessages, HaveOneNotificationInFlight)
     pending.clear();
     EXPECT_TRUE(!pending.take() && pending.put(event(E::restoreDone))) << "the one before never arrived";
 }
-
-} // namespace
-} // namespace tavi

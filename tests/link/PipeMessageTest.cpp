@@ -6,13 +6,11 @@
 
 #include "tests/link/Frames.h"
 
-namespace tavi {
-namespace {
-
+using namespace tavi;
 using namespace test;
 using E = EventType;
 
-std::unique_ptr<PipeMessage> created(E type, const std::string& payload)
+static std::unique_ptr<PipeMessage> created(E type, const std::string& payload)
 {
     const auto buffer = MessageBuffer::create();
     std::memcpy(buffer->data(), payload.data(), payload.size());
@@ -72,6 +70,3 @@ TEST(PipeMessage, ABufferThatCannotGrowHoldsNoMessage)
     buffer->ensure(UINT32_MAX);
     EXPECT_TRUE(!buffer->data() && buffer->capacity() == 0 && !createMessage(52, *buffer));
 }
-
-} // namespace
-} // namespace tavi

@@ -7,7 +7,8 @@
 #include "tests/link/Frames.h"
 #include "tests/support/Pipes.h"
 
-namespace tavi {
+using namespace tavi;
+
 namespace {
 
 using namespace test;
@@ -66,4 +67,3 @@ TEST(StatusListener, WaitsForAMissingServiceAndAfterAnException)
 }
 
 } // namespace
-} // namespace tavi

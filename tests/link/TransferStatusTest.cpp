@@ -7,7 +7,8 @@
 
 #include "tests/link/Frames.h"
 
-namespace tavi {
+using namespace tavi;
+
 namespace {
 
 using E = EventType;
@@ -126,4 +127,3 @@ TEST(TransferStatus, IsReadWhileItChanges)
 }
 
 } // namespace
-} // namespace tavi

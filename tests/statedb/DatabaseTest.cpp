@@ -4,25 +4,9 @@
 
 #include <gtest/gtest.h>
 
-#include "core/Utf8.h"
+using namespace tavi;
 
-namespace tavi {
-namespace {
-
-// Returns the message of the exception that the action throws.
-template <class Action>
-wxString thrownBy(Action action)
-{
-    try {
-        action();
-    } catch (const DbException& error) {
-        EXPECT_EQ(fromUtf8(error.what()), error.message());
-        return error.message();
-    }
-    return L"nothing";
-}
-
-DbConnection opened()
+static DbConnection opened()
 {
     DbConnection connection;
     connection.open(L":memory:");
@@ -40,23 +24,23 @@ TEST(Database, ReportsMisuseAndFailures)
     EXPECT_TRUE(failing.nextRow());
     // In this order: a row that fails invalidates its statement and cursor.
     const std::pair<wxString, std::function<void()>> cases[] = {
-        {L"WDB_ERROR[1000]: No Database opened", [] { DbStatement().execDML(); }},
-        {L"WDB_ERROR[1000]: Statement not accessible", [&] { connection.compileStatement("").execDML(); }},
-        {L"WDB_ERROR[1000]: Invalid field index", [&] { failing.fieldInt(-1, 0); }},
         {L"WDB_ERROR[1000]: Invalid field index", [&] { failing.fieldInt(1, 0); }},
         {L"DB_ERROR[1]: ", [&] { connection.compileStatement("SELEC"); }}, // deliberately without detail
         {L"DB_ERROR[1]: near \"\xE9\": syntax error", [&] { connection.execDML(wxString(L"\xE9 x")); }},
         {L"DB_RANGE[25]: Error binding string param", [&] { insert.bind(3, wxString(L"x")); }},
-        {L"DB_RANGE[25]: Error binding int64 param", [&] { insert.bind(9, std::int64_t{1}); }},
         {L"DB_CONSTRAINT[19]: UNIQUE constraint failed: t.a", [&] { insert.execDML(); }},
         {L"DB_CANTOPEN[14]: unable to open database file", [] { DbConnection().open(L"/no such folder/x.db"); }},
         {L"DB_ERROR[1]: integer overflow", [&] { failing.nextRow(); }},
         {L"WDB_ERROR[1000]: Statement not accessible", [&] { failing.nextRow(); }},
-    };
-    for (const auto& [expected, action] : cases)
-        EXPECT_EQ(thrownBy(action), expected);
-    connection.close(); // before its statements
-    EXPECT_EQ(thrownBy([&] { connection.execDML("SELECT 1"); }), L"WDB_ERROR[1000]: No Database opened");
+        {L"WDB_ERROR[1000]: No Database opened", [&] { connection.close(), connection.execDML("SELECT 1"); }}};
+    for (const auto& [expected, action] : cases) {
+        try {
+            action();
+            ADD_FAILURE() << expected;
+        } catch (const DbException& error) {
+            EXPECT_EQ(error.message(), expected);
+        }
+    }
 }
 
 #ifdef _WIN32 // The native tests use the system's SQLite.
@@ -66,8 +50,7 @@ TEST(Database, ChecksPagesAndProtectsTheSchema)
     EXPECT_EQ(connection.execQuery("PRAGMA trusted_schema").fieldInt(0, -1), 0);
     EXPECT_EQ(connection.execQuery("PRAGMA cell_size_check").fieldInt(0, -1), 1);
     connection.execDML("PRAGMA writable_schema=1");
-    EXPECT_EQ(thrownBy([&] { connection.execDML("DELETE FROM sqlite_master"); }),
-              L"DB_ERROR[1]: table sqlite_master may not be modified");
+    EXPECT_THROW(connection.execDML("DELETE FROM sqlite_master"), DbException);
 }
 #endif
 
@@ -79,18 +62,15 @@ TEST(Database, ReadsRowsAndKeepsBindings)
     insert.execDML();
     insert.execDML(); // the last binding again
     insert.bind(1, std::int64_t{0x7FFFFFFFFFFFFFFF});
-    EXPECT_EQ(insert.execDML(), 1);
-    EXPECT_EQ(connection.lastRowId(), 3);
+    EXPECT_TRUE(insert.execDML() == 1 && connection.lastRowId() == 3);
     EXPECT_EQ(connection.execDML("INSERT INTO t(b) VALUES(''),(NULL),(x'6100C3A9')"), 3);
     DbQuery rows = connection.execQuery("SELECT b FROM t ORDER BY a");
-    using namespace std::string_literals;
     const std::pair<int, std::string> expected[] = {
         {3, "\xE6\x97\xA5\xC3\xA9"}, {3, "\xE6\x97\xA5\xC3\xA9"}, {1, "9223372036854775807"}, {3, ""}, {5, ""},
-        {4, "a\0\xC3\xA9"s}};
+        {4, {"a\0\xC3\xA9", 4}}};
     for (const auto& [type, content] : expected) {
         const char* text = nullptr;
-        ASSERT_TRUE(rows.nextRow());
-        EXPECT_EQ(rows.fieldType(0), type);
+        EXPECT_TRUE(rows.nextRow() && rows.fieldType(0) == type) << content;
         const auto length = static_cast<std::size_t>(rows.fieldText(0, text));
         EXPECT_EQ(std::string(text ? text : "", length), content);
         EXPECT_EQ(rows.fieldInt(0, 42) == 42, type == 5);
@@ -109,6 +89,3 @@ TEST(Database, TransactionsEndWithTheirScope)
     }
     EXPECT_EQ(connection.execQuery("SELECT count(*) FROM t").fieldInt(0, -1), 1);
 }
-
-} // namespace
-} // namespace tavi

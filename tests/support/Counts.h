@@ -25,12 +25,10 @@ inline std::size_t countThreads()
     return count;
 }
 
-// How many there are of each kind.
 using Counts = std::map<std::wstring, std::size_t>;
 
-// Handles of this process by the type of their object, its GDI objects and its threads. The system's own counters
-// answer 0 under Wine 8: each handle that can be is tried, and the table of GDI objects is read where the process has
-// it.
+// Counts this process's handles by the type of their object, its GDI objects and its threads. The system's own counters
+// return 0 under Wine 8, so each possible handle is tried and the process's table of GDI objects is read.
 inline Counts countNow()
 {
     struct GdiEntry {
