@@ -2,7 +2,6 @@
 
 #include <fstream>
 #include <regex>
-#include <thread>
 
 #include <gtest/gtest.h>
 
@@ -43,19 +42,6 @@ TEST_F(Log, LinesAreInTheFileAtOnce)
                                    "\n@ Error: Unhandled exception in another\n");
     closeLog();
     EXPECT_TRUE(DeleteFileW(path.c_str()));
-}
-
-TEST_F(Log, LinesOfTwoThreadsStayWhole)
-{
-    ASSERT_TRUE(openLog(3));
-    const auto log = [] {
-        for (int i = 0; i < 100; ++i)
-            wxLogError("%s.", wxString(L'm', 1000));
-    };
-    std::thread other(log);
-    log();
-    other.join();
-    EXPECT_EQ(wxString(contentOf(path)).Replace("@ Error: " + wxString(L'm', 1000) + ".\n", ""), 200u);
 }
 
 TEST_F(Log, BoundaryHoldsIfMemoryRunsOut)

@@ -22,7 +22,6 @@ struct RestoreRequests : testing::Test {
         EXPECT_TRUE(request.selectedPaths.empty());
         return log.takeText();
     }
-    // Runs the query; by default counts all rows.
     int count(const char* sql = "SELECT (SELECT count(*) FROM restores)+(SELECT count(*) FROM restore_files)")
     {
         return database.execQuery(sql).fieldInt(0, -1);
