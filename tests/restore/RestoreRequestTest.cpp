@@ -65,10 +65,7 @@ TEST_F(RestoreRequests, WaitAMinuteForOtherTransactions)
 {
     static int waited;
     sqlite3_vfs* const system = sqlite3_vfs_find(nullptr);
-    const auto sleep = std::exchange(system->xSleep, [](sqlite3_vfs*, int microseconds) {
-        waited += microseconds;
-        return microseconds;
-    });
+    const auto sleep = std::exchange(system->xSleep, [](sqlite3_vfs*, int time) { return waited += time, time; });
     // A reader blocks the commit, a writer the first row.
     for (const auto mode : {TransactionMode::plain, TransactionMode::immediate}) {
         const Transaction other(database, mode);
@@ -86,10 +83,7 @@ TEST_F(RestoreRequests, AreWholeOrAbsentIfMemoryRunsOut)
     for (const int failures : {1, 4, 1 << 30}) {
         std::string line;
         for (int point = 0; point < 300; ++point) {
-            {
-                const test::FailingAllocations failing(point, test::Heap::sqlite, failures);
-                line = perform();
-            }
+            line = (test::FailingAllocations(point, test::Heap::sqlite, failures), perform());
             logged.insert(line.substr(0, line.find("[7]")));
             ASSERT_EQ(count() % 3, 0) << point << " " << failures << " " << line;
         }

@@ -33,10 +33,7 @@ TEST(StateLookups, FoldersInheritFromTheNearestRecordedOne)
     std::optional<FolderStateTable::ReadScope> reading(std::in_place, states);
     EXPECT_EQ(stateOf(L"C:\\s6\\x"), 8) << "the state before is not remembered";
     EXPECT_EQ(stateOf(L"C:\\s4\\y"), 4);
-    {
-        const test::FailingAllocations failing(0); // the end unlocks without memory
-        reading.reset();
-    }
+    test::FailingAllocations(0), reading.reset(); // the end unlocks without memory
     EXPECT_EQ(writer.execDML("UPDATE filesystem SET state=5 WHERE folder='C:\\s6'"), 1);
     EXPECT_EQ(stateOf(L"C:\\s6\\x"), 7);
 }
