@@ -72,6 +72,26 @@ TEST(TransferStatus, MessagesChangeTheirFieldsOnly)
     }
 }
 
+TEST(TransferStatus, EachOutcomeAndSwitchHasItsFlag)
+{
+    using S = TransferStatus;
+    // The type that sets the flag, and the one that clears it.
+    const std::tuple<E, std::atomic<bool> S::*, E> cases[] = {
+        {E::backupEnded3, &S::ended3, E::backupReset},   {E::backupEnded4, &S::ended4, E::backupReset},
+        {E::backupEnded5, &S::ended5, E::backupReset},   {E::backupEnded6, &S::ended6, E::backupReset},
+        {E::backupEnded8, &S::ended8, E::backupReset},   {E::backupEnded9, &S::ended9, E::backupReset},
+        {E::backupEnded10, &S::ended10, E::backupReset}, {E::backupEnded10, &S::mark10, E::mark10Off},
+        {E::switch24On, &S::switch24, E::switch24Off},   {E::switch32On, &S::switch32, E::switch32Off},
+        {E::switch34On, &S::switch34, E::switch34Off},   {E::switch39On, &S::switch39, E::switch39Off}};
+    for (const auto& [on, flag, off] : cases) {
+        Status status;
+        status.apply(*event(on));
+        EXPECT_TRUE(status.*flag) << static_cast<std::uint32_t>(on);
+        status.apply(*event(off));
+        EXPECT_FALSE(status.*flag) << static_cast<std::uint32_t>(off);
+    }
+}
+
 TEST(TransferStatus, RatesAndEstimatesFollowTheClock)
 {
     now = UINT32_MAX - 700; // the tick count wraps soon
