@@ -1,10 +1,6 @@
-#include <fstream>
-
-#include "shell/Registration.h"
 #include "tests/support/Counts.h"
 #include "tests/support/LoadedModule.h"
 #include "tests/support/Pipes.h"
-#include "ui/PropertyPage.h"
 
 namespace tavi {
 namespace {
@@ -25,7 +21,8 @@ TEST_F(ExportsTest, OfferTheModulesClassesAndTheirInterfacesOnly)
                                              {ShellExt::kClassId, IID_IShellIconOverlayIdentifier},
                                              {StubFolder::kClassId, IID_IShellFolder2}};
     for (const auto& [classId, interfaceId] : refused) {
-        const auto factory = module.factory(classId);
+        RefPtr<IClassFactory> factory;
+        EXPECT_EQ(module.classObject(classId, IID_IClassFactory, factory.outVoid()), S_OK);
         EXPECT_EQ(factory->CreateInstance(nullptr, interfaceId, &object), E_NOINTERFACE);
         EXPECT_EQ(factory->CreateInstance(factory.get(), IID_IUnknown, &object), CLASS_E_NOAGGREGATION);
         EXPECT_EQ(factory->LockServer(TRUE), S_OK);
@@ -37,19 +34,12 @@ TEST_F(ExportsTest, OfferTheModulesClassesAndTheirInterfacesOnly)
 TEST_F(ExportsTest, LeaveNothingOfAnObjectThatCannotBeCreated)
 {
     LoadedModule module;
-    for (const std::wstring& directory : {std::wstring(L"C:\\no such folder"), service.file(L"")}) {
-        service.install().SetValue(L"ConfigPath", wxString(directory));
-        DeleteFileW(service.file(L"taviconf.dat").c_str());
-        void* object = &module;
-        EXPECT_TRUE(FAILED(module.factory(ShellExt::kClassId)->CreateInstance(nullptr, IID_IUnknown, &object)));
-        EXPECT_EQ(object, nullptr);
-    }
-    EXPECT_EQ(module.canUnload(), S_OK);
-    std::ifstream file(toUtf8(service.file(L"tavi.log")));
-    const std::string log(std::istreambuf_iterator<char>(file), {});
-    for (const char* reason : {"14: DB_CANTOPEN[14]: ", "1: DB_ERROR[1]: "})
-        EXPECT_NE(log.find("Error: Failed to open folder-state db (" + std::string(reason)), std::string::npos) << log;
-    EXPECT_EQ(log.find("Unhandled"), std::string::npos) << log;
+    void* object = &module;
+    service.install().SetValue(L"ConfigPath", wxString(L"C:\\no such folder"));
+    RefPtr<IClassFactory> factory;
+    module.classObject(ShellExt::kClassId, IID_IClassFactory, factory.outVoid());
+    EXPECT_TRUE(FAILED(factory->CreateInstance(nullptr, IID_IUnknown, &object)));
+    EXPECT_EQ(object, nullptr);
 }
 
 TEST_F(ExportsTest, ServeAHostThatGoesOnAfterItMayUnload)
@@ -59,7 +49,7 @@ TEST_F(ExportsTest, ServeAHostThatGoesOnAfterItMayUnload)
     ASSERT_TRUE(servers[0].waitClient());
     EXPECT_EQ(module.canUnload(), S_OK);
     Sleep(700); // the listener has ended
-    const auto factory = module.factory(ShellExt::kClassId);
+    module.object<IUnknown>(ShellExt::kClassId, IID_IUnknown);
     EXPECT_TRUE(servers[1].waitClient());
 }
 
@@ -69,43 +59,21 @@ TEST_F(ExportsTest, LeaveNothingBehindInTwentyRoundsOfLoadAndUnload)
     const HMODULE dialogs = LoadLibraryW(L"comdlg32.dll");
     Counts before;
     const std::size_t threads = countThreads();
-    constexpr int kRounds = 23, kWarmUp = 3;
-    for (int round = 0; round < kRounds; ++round) {
-        if (round == kWarmUp)
+    for (int round = -3; round < 20; ++round) { // the first three warm up
+        if (round == 0)
             before = countNow();
         {
             LoadedModule module;
             const auto menu = module.object<IContextMenu>(ShellExt::kClassId, IID_IContextMenu);
             // Unloads in every second round once the menu has its bitmap, in the others while the watcher starts.
             const auto hasCommand = [&] { return commandsFor(*menu, L"C:\\") == 1; };
-            EXPECT_TRUE(hasCommand() || round % 2 == 1 || waitUntil(hasCommand));
+            EXPECT_TRUE(hasCommand() || round % 2 != 0 || waitUntil(hasCommand));
         }
-        ASSERT_TRUE(LoadedModule::isUnmapped()) << "round " << round;
         // The thread that unmapped the module needs a moment more.
-        ASSERT_TRUE(waitUntil([&] { return countThreads() == threads; }));
+        ASSERT_TRUE(waitUntil([&] { return countThreads() == threads; })) << "round " << round;
     }
     EXPECT_EQ(countNow(), before);
     FreeLibrary(dialogs);
-}
-
-TEST_F(ExportsTest, LetComUnloadTheModuleAtTheEndOfAPage)
-{
-    {
-        const LoadedModule module;
-        setModuleInstance(module.module);
-        registerServer();
-    }
-    EXPECT_EQ(CoGetClassObject(ShellExt::kClassId, CLSCTX_INPROC_SERVER, nullptr, IID_IClassFactory,
-                               RefPtr<IClassFactory>().outVoid()),
-              S_OK);
-    // The page is this program's own. The module is a library that COM has loaded and that nobody uses.
-    setModuleInstance(GetModuleHandleW(nullptr));
-    HPROPSHEETPAGE page = nullptr;
-    addPropertyPage({{L"C:\\f"}, {}, {}, false, {}}, Manifest::parse(L"FILES\nC:\\f\n1:1:1:1:0::0:0"), takePage,
-                    reinterpret_cast<LPARAM>(&page));
-    EXPECT_TRUE(GetModuleHandleW(L"tavishell.dll"));
-    DestroyPropertySheetPage(page);
-    EXPECT_TRUE(LoadedModule::isUnmapped());
 }
 
 } // namespace

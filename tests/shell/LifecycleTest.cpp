@@ -14,7 +14,7 @@ using LifecycleTest = HostTest;
 TEST_F(LifecycleTest, AdmitsProgramsByTheBeginningOfTheirName)
 {
     const std::pair<HostKind, std::vector<const wchar_t*>> cases[] = {
-        {HostKind::fileManager, {L"C:\\Windows\\explorer.exe", L"EXPLORER.EXE", L"D:\\x\\explorer.exe.old"}},
+        {HostKind::fileManager, {L"C:\\Windows\\explorer.exe", L"EXPLORER.EXE.old"}},
         {HostKind::toolOnly, {L"C:\\windows\\regsvr32.exe", L"C:\\VerClsid.exe", L"C:\\t\\_regdll.TMP"}},
         {HostKind::refused, {L"C:\\explorer.exe\\other.exe", L"C:\\t\\_RegDLL.tm", L"C:\\rundll32.exe", L"C:\\", L""}}};
     for (const auto& [kind, paths] : cases) {
@@ -32,8 +32,7 @@ TEST_F(LifecycleTest, GivesAToolTheClassesAndNothingElse)
         EXPECT_TRUE(CopyFileW(own.wc_str(), tool.wc_str(), FALSE));
         EXPECT_EQ(_wspawnl(_P_WAIT, tool.wc_str(), tool.wc_str(), L"--gtest_filter=*GivesATool*", nullptr), 0);
         DeleteFileW(tool.wc_str());
-        // The copy has deleted the key at its end.
-        service.install().Close();
+        service.install().Close(); // the copy has deleted the key at its end
         service.install().Create();
         return;
     }

@@ -2,7 +2,8 @@
 
 #include <map>
 
-#include "core/Handles.h"
+#include <wx/stdpaths.h>
+
 #include "tests/support/Dialogs.h"
 
 namespace tavi {
@@ -39,8 +40,7 @@ struct RegistrationTest : testing::Test {
         for (const HKEY key : {HKEY_CLASSES_ROOT, HKEY_LOCAL_MACHINE})
             EXPECT_EQ(RegOverridePredefKey(key, own), ERROR_SUCCESS);
     }
-    // Returns the values below the key by their paths, but not those that the shell writes below CurrentVersion at any
-    // time.
+    // Returns the texts below the key by their paths, but not those that the shell writes below CurrentVersion.
     static Values stored(const wxString& path = kOwnKey)
     {
         Values all;
@@ -49,8 +49,7 @@ struct RegistrationTest : testing::Test {
         long at = 0;
         const bool isOfTheShell = path.Contains(L"CurrentVersion") && !path.Contains(L"Approved");
         for (bool more = key.GetFirstValue(name, at); more && !isOfTheShell; more = key.GetNextValue(name, at))
-            EXPECT_TRUE(key.GetValueType(name) == wxRegKey::Type_String &&
-                        key.QueryValue(name, all[path.substr(kOwnKey.length()) + L"\\" + name]));
+            EXPECT_TRUE(key.QueryValue(name, all[path.substr(kOwnKey.length()) + L"\\" + name]));
         for (bool more = key.GetFirstKey(name, at); more; more = key.GetNextKey(name, at))
             all.merge(stored(path + L"\\" + name));
         return all;
@@ -58,39 +57,29 @@ struct RegistrationTest : testing::Test {
     Values handlers;
 };
 
-TEST_F(RegistrationTest, WritesTheClassAndItsHandlersAndNeedsTheApprovedList)
+TEST_F(RegistrationTest, WritesTheClassAndItsHandlersAndDeletesTheClassOnly)
 {
     Values expected = handlers;
     expected[kClasses + kId + L"\\"] = kShown;
     expected[kClasses + kId + L"\\InProcServer32\\"] = wxStandardPaths::Get().GetExecutablePath();
     expected[kClasses + kId + L"\\InProcServer32\\ThreadingModel"] = L"Apartment";
-    EXPECT_EQ(registerServer(), ERROR_FILE_NOT_FOUND);
+    EXPECT_EQ(registerServer(), ERROR_FILE_NOT_FOUND) << "without the approved list";
     EXPECT_EQ(stored(), expected);
     wxRegKey(kOwnKey + kApproved).Create();
-    expected[kApproved + kId] = kShown;
-    EXPECT_EQ(registerServer(), 0);
-    EXPECT_EQ(stored(), expected);
-}
-
-// Scripts delete the handlers and the approved value themselves.
-TEST_F(RegistrationTest, DeletesOnlyTheClassUnlessEveryFormerKeyIsBelowTheClasses)
-{
-    wxRegKey(kOwnKey + kApproved).Create();
-    EXPECT_EQ(registerServer(), 0);
-    EXPECT_EQ(unregisterServer(), ERROR_FILE_NOT_FOUND);
     Values left = handlers;
-    left[kApproved + kId] = kShown;
+    left[kApproved + kId] = expected[kApproved + kId] = kShown;
+    EXPECT_EQ(registerServer(), 0);
+    EXPECT_EQ(stored(), expected);
+    EXPECT_EQ(unregisterServer(), ERROR_FILE_NOT_FOUND) << "scripts delete the handlers and the approved value";
     EXPECT_EQ(stored(), left);
-    std::vector<wxString> keys{kId, L"AllFileSystemObjects\\shellex\\PropertySheetHandlers\\Tavi"};
-    for (const wchar_t* kind :
-         {L"AllFileSystemObjects", L"Directory\\Background", L"Directory", L"Drive", L"Folder", L"*"})
-        keys.push_back(kind + kMenus);
-    for (const wxString& key : keys)
-        wxRegKey(kOwnKey + kClasses + key + L"\\a\\b").Create();
+    // With every former key below the classes the run gets to the approved value.
+    for (const wxString& key :
+         {kId, L"*" + kMenus, wxString(L"AllFileSystemObjects\\shellex\\PropertySheetHandlers\\Tavi")})
+        wxRegKey(kOwnKey + kClasses + key).Create();
+    for (const auto& [path, id] : handlers)
+        wxRegKey(kOwnKey + L"\\CLSID" + path + L"a\\b").Create();
     EXPECT_EQ(unregisterServer(), 0);
     EXPECT_EQ(stored(), handlers);
-    for (const wxString& key : keys)
-        EXPECT_FALSE(wxRegKey(kOwnKey + kClasses + key).Exists()) << key;
 }
 
 } // namespace

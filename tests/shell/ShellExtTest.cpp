@@ -21,11 +21,9 @@ TEST_F(ShellExtTest, HasTheOverlayTableBehindTheOthers)
     DWORD flags = 88;
     wchar_t file[MAX_PATH];
     EXPECT_EQ(overlay->GetOverlayInfo(file, 10, &index, &flags), HRESULT(0x8007007A));
-    EXPECT_EQ(overlay->GetOverlayInfo(file, -1, &index, &flags), E_INVALIDARG);
-    EXPECT_TRUE(index == 77 && flags == 88);
+    EXPECT_TRUE(overlay->GetOverlayInfo(file, -1, &index, &flags) == E_INVALIDARG && index == 77 && flags == 88);
     EXPECT_EQ(overlay->GetOverlayInfo(file, MAX_PATH, &index, &flags), S_OK);
-    EXPECT_TRUE(file == modulePath() && index == 3 && flags == 3);
-    EXPECT_TRUE(DestroyIcon(ExtractIconW(nullptr, file, 3)));
+    EXPECT_TRUE(file == modulePath() && index == 3 && flags == 3 && DestroyIcon(ExtractIconW(nullptr, file, 3)));
     EXPECT_TRUE(overlay->GetPriority(&priority) == S_OK && priority == 99);
 }
 
@@ -36,7 +34,6 @@ TEST_F(ShellExtTest, OffersWhatItsLastInitializeWasGiven)
     RefPtr<IUnknown> object;
     menu->QueryInterface(IID_IUnknown, object.outVoid());
     auto* const sheet = reinterpret_cast<IShellPropSheetExt*>(object.get());
-    EXPECT_EQ(sheet->ReplacePage(0, nullptr, 0), E_FAIL);
     for (const auto& [folder, used] : {std::pair(L"C:\\windows", 1), {L"C:\\windows\\system32", 0}, {nullptr, 0}}) {
         EXPECT_TRUE(waitUntil([&, from = folder, expected = used] { return commandsFor(*menu, from) == expected; }))
             << "with the manifest loaded";

@@ -1,27 +1,19 @@
 #pragma once
 
-#include <algorithm>
 #include <fstream>
 #include <functional>
 
 #include <prsht.h>
 #include <gtest/gtest.h>
-#include <wx/stdpaths.h>
 #include <wx/translation.h>
 
 #include "core/Module.h"
+#include "manifest/CurrentManifest.h"
 #include "tests/support/LogCapture.h"
 #include "tests/support/Registry.h"
 
-// What the tests of the user interface share. They drive this process's dialogs from another thread of it, by the
-// messages a user's actions would cause.
+// The tests drive this process's dialogs from another thread, by the messages that a user's actions cause.
 namespace tavi::test {
-
-inline std::wstring modulePath()
-{
-    const std::wstring own = wxStandardPaths::Get().GetExecutablePath().ToStdWstring();
-    return own.substr(0, own.rfind(L"\\tests\\")) + L"\\tavishell.dll";
-}
 
 inline bool waitUntil(const std::function<bool()>& condition)
 {
@@ -33,24 +25,23 @@ inline bool waitUntil(const std::function<bool()>& condition)
 
 inline void waitForThreads()
 {
-    EXPECT_TRUE(waitUntil([] { return moduleRefCount() == 0; }));
+    EXPECT_TRUE(waitUntil([] { return moduleRefCount() == 0 && !isWatcherActive(); }));
 }
 
-// A visible dialog of this process with that caption (null: any), other than those.
-inline HWND waitDialog(const wchar_t* caption, std::initializer_list<HWND> others = {})
+// Returns a visible dialog of this process with that caption (null: any) that is neither of the two.
+inline HWND waitDialog(const wchar_t* caption, HWND other = nullptr, HWND another = nullptr)
 {
     HWND window = nullptr;
-    const bool found = waitUntil([&] {
+    EXPECT_TRUE(waitUntil([&] {
         DWORD process = 0;
         window = FindWindowExW(nullptr, window, L"#32770", caption);
         GetWindowThreadProcessId(window, &process);
-        return process == GetCurrentProcessId() && IsWindowVisible(window) &&
-               std::find(others.begin(), others.end(), window) == others.end();
-    });
-    return found ? window : nullptr;
+        return process == GetCurrentProcessId() && IsWindowVisible(window) && window != other && window != another;
+    }));
+    return window;
 }
 
-// Posted: a click that opens a box does not return before the box is gone.
+// Posts the click: one that opens a box does not return before the box is gone.
 inline BOOL click(HWND dialog, int id)
 {
     return PostMessageW(GetDlgItem(dialog, id), BM_CLICK, 0, 0);
@@ -65,9 +56,7 @@ inline std::wstring controlText(HWND dialog, int id)
 // Accepts a page into the handle that the parameter points at; refuses it without one.
 inline BOOL CALLBACK takePage(HPROPSHEETPAGE page, LPARAM taken)
 {
-    if (taken)
-        *reinterpret_cast<HPROPSHEETPAGE*>(taken) = page;
-    return taken != 0;
+    return taken && (*reinterpret_cast<HPROPSHEETPAGE*>(taken) = page);
 }
 
 struct UiTest : testing::Test {
@@ -77,23 +66,23 @@ struct UiTest : testing::Test {
     }
     ~UiTest() override
     {
+        stopManifestWatcher();
         waitForThreads();
         wxTranslations::Set(nullptr);
     }
     wxString in(const wxString& name) const
     {
-        return folder.path() + L"\\" + name;
+        return service.file(name.wc_str());
     }
-    // Puts a message catalogue of one text in force.
+    // Loads a gettext catalogue of one text: a header, the length and offset of either text, the texts.
     void translate(const std::string& text, const std::string& translation) const
     {
-        // The file form of gettext: a header, the length and offset of either text, the texts.
-        const auto length = static_cast<unsigned>(text.size()), after = static_cast<unsigned>(translation.size());
+        const auto length = unsigned(text.size()), after = unsigned(translation.size());
         const unsigned head[] = {0x950412de, 0, 1, 28, 36, 0, 0, length, 44, after, 45 + length};
         CreateDirectoryW(in(L"de").wc_str(), nullptr);
         std::ofstream(in(L"de\\tavi.mo").wc_str(), std::ios::binary)
             << std::string(reinterpret_cast<const char*>(head), sizeof(head)) << text << '\0' << translation << '\0';
-        wxFileTranslationsLoader::AddCatalogLookupPathPrefix(folder.path());
+        wxFileTranslationsLoader::AddCatalogLookupPathPrefix(service.file(L""));
         wxTranslations::Set(new wxTranslations);
         wxTranslations::Get()->SetLanguage("de");
         wxTranslations::Get()->AddCatalog("tavi", wxLANGUAGE_ENGLISH);
@@ -101,7 +90,6 @@ struct UiTest : testing::Test {
 
     LogCapture log;
     InstalledService service;
-    TemporaryFolder folder;
 };
 
 } // namespace tavi::test

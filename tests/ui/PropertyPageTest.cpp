@@ -1,8 +1,9 @@
 #include "ui/PropertyPage.h"
 
+#include <thread>
+
 #include <commctrl.h>
 
-#include "tests/manifest/ManifestSupport.h"
 #include "tests/support/Dialogs.h"
 #include "ui/resource.h"
 
@@ -21,24 +22,19 @@ HPROPSHEETPAGE pageFor(const PathSet& paths, bool isAccepted = true)
     return page;
 }
 
-HWND openSheet()
+HWND openSheet(HWND owner = nullptr)
 {
     HPROPSHEETPAGE page = pageFor({L"C:\\f"});
-    PROPSHEETHEADERW header{};
-    header.dwSize = sizeof(header);
-    header.dwFlags = PSH_MODELESS;
-    header.nPages = 1;
+    PROPSHEETHEADERW header{sizeof(header), PSH_MODELESS, owner, nullptr, {}, nullptr, 1, {}, {}, nullptr, {}, {}, {}};
     header.phpage = &page;
     return reinterpret_cast<HWND>(PropertySheetW(&header));
 }
 
-// Wine ignores the page description's reference counter. Windows adds one to each module count below while its page
-// exists.
+// Wine ignores the page's reference counter. Windows adds one to each module count below while its page exists.
 TEST_F(PropertyPageTest, IsOfferedForABackedUpFileAndDestroyedOnce)
 {
-    const std::pair<PathSet, int> cases[] = {
-        {{}, 0}, {{L"C:\\"}, 0}, {{L"C:\\none"}, 0}, {{L"C:\\gone"}, 0}, {{L"C:\\f"}, 1}, {{L"C:\\none", L"C:\\f"}, 1}};
-    for (const auto& [paths, count] : cases) {
+    for (const auto& [paths, count] :
+         {std::pair<PathSet, int>({L"C:\\"}, 0), {{L"C:\\gone"}, 0}, {{L"C:\\none", L"C:\\f"}, 1}}) {
         const HPROPSHEETPAGE page = pageFor(paths);
         EXPECT_EQ(page != nullptr, count == 1);
         EXPECT_EQ(moduleRefCount(), count);
@@ -52,23 +48,15 @@ TEST_F(PropertyPageTest, IsOfferedForABackedUpFileAndDestroyedOnce)
 
 TEST_F(PropertyPageTest, EndsWithItsSheetAndNotBefore)
 {
-    translate("Tavi", "Sicherung");
-    const std::tuple<bool, UINT, WPARAM> cases[] = {
-        {true, WM_COMMAND, IDCANCEL}, {false, PSM_PRESSBUTTON, PSBTN_OK}, {false, WM_SYSCOMMAND, SC_CLOSE}};
-    for (const auto& [isOfPage, end, parameter] : cases) {
+    for (const auto& [end, parameter] : {std::pair(WM_COMMAND, IDCANCEL), {PSM_PRESSBUTTON, PSBTN_OK}}) {
         const HWND sheet = openSheet(), page = PropSheet_GetCurrentPageHwnd(sheet);
-        wchar_t title[50] = L"";
-        TCITEMW tab{TCIF_TEXT, 0, 0, title, 50, 0, 0};
-        TabCtrl_GetItem(PropSheet_GetTabControl(sheet), 0, &tab);
-        EXPECT_STREQ(title, L"Sicherung");
         EXPECT_EQ(ListView_GetItemCount(GetDlgItem(page, TAVI_VERSIONS_LIST)), 1);
         PostMessageW(page, WM_CLOSE, 0, 0); // must do nothing
-        PostMessageW(isOfPage ? page : sheet, end, parameter, 0);
+        PostMessageW(end == WM_COMMAND ? page : sheet, UINT(end), WPARAM(parameter), 0);
         MSG message;
         EXPECT_TRUE(waitUntil([&] {
             EXPECT_TRUE(IsWindow(page));
-            if (PeekMessageW(&message, nullptr, 0, 0, PM_REMOVE) &&
-                !SendMessageW(sheet, PSM_ISDIALOGMESSAGE, 0, reinterpret_cast<LPARAM>(&message)))
+            if (PeekMessageW(&message, nullptr, 0, 0, PM_REMOVE))
                 DispatchMessageW(&message);
             return !PropSheet_GetCurrentPageHwnd(sheet);
         })) << "the sheet ends";
@@ -79,26 +67,19 @@ TEST_F(PropertyPageTest, EndsWithItsSheetAndNotBefore)
     }
 }
 
-HWND questionedSheet;
-
-// Destroys the sheet while its page asks a question, on the sheet's own thread.
-void CALLBACK destroyDuringQuestion(HWND, UINT, UINT_PTR timer, DWORD)
-{
-    const HWND box = FindWindowW(L"#32770", L"Tavi Remote Backup");
-    if (!box)
-        return;
-    KillTimer(nullptr, timer);
-    DestroyWindow(questionedSheet);
-    EXPECT_EQ(moduleRefCount(), 1) << "the frames of the question";
-    PostMessageW(box, WM_COMMAND, IDCANCEL, 0);
-}
-
 TEST_F(PropertyPageTest, CountsUntilItsLastFrameHasReturned)
 {
-    questionedSheet = openSheet();
-    SetTimer(nullptr, 0, 10, destroyDuringQuestion);
-    SendMessageW(PropSheet_GetCurrentPageHwnd(questionedSheet), WM_COMMAND, TAVI_VERSIONS_RESTORE, 0);
-    EXPECT_FALSE(IsWindow(questionedSheet));
+    const HWND owner = CreateWindowW(L"STATIC", L"", WS_POPUP, 0, 0, 9, 9, nullptr, nullptr, nullptr, nullptr);
+    const HWND page = PropSheet_GetCurrentPageHwnd(openSheet(owner));
+    std::thread host([&, thread = GetCurrentThreadId()] {
+        waitDialog(L"Tavi Remote Backup");
+        SendMessageW(owner, WM_CLOSE, 0, 0); // destroys the sheet
+        EXPECT_EQ(moduleRefCount(), 1) << "the frames of the question";
+        PostThreadMessageW(thread, WM_NULL, 0, 0); // wakes the question's message loop
+    });
+    SendMessageW(page, WM_COMMAND, TAVI_VERSIONS_RESTORE, 0);
+    host.join();
+    EXPECT_FALSE(IsWindow(page));
     EXPECT_EQ(moduleRefCount(), 0);
 }
 

@@ -1,11 +1,6 @@
 #include "ui/Selection.h"
 
-#include <memory>
-
-#include "core/Handles.h"
-#include "statedb/Database.h"
 #include "statedb/StateLookups.h"
-#include "tests/manifest/ManifestSupport.h"
 #include "tests/support/Dialogs.h"
 
 namespace tavi {
@@ -40,7 +35,7 @@ PathSet collect(const wxString& parent, const std::vector<IdList>& items, const 
 
 TEST_F(SelectionTest, TakesTheShellsItemsButNoneTooLong)
 {
-    const wxString parent = in(wxString(L'd', 199 - folder.path().size())), name = L"00000" + wxString(L'f', 53),
+    const wxString parent = in(wxString(L'd', 200 - in(L"").size())), name = L"00000" + wxString(L'f', 53),
                    rare = parent + L"\\\u65e5\U0001F4BE", sub = parent + L"\\sub";
     std::filesystem::create_directories(sub.wc_str());
     for (const wxString& each : {in(name), in(name + L"f"), rare})
@@ -61,39 +56,35 @@ TEST_F(SelectionTest, TakesTheShellsItemsButNoneTooLong)
 
 TEST_F(SelectionTest, TakesNoVirtualItemAndNoDriveThatIsNotFixed)
 {
-    const wxString computer = L"::{20D04FE0-3AEA-1069-A2D8-08002B30309D}",
-                   controlPanel = computer + L"\\::{21EC2020-3AEA-1069-A2DD-08002B30309D}";
+    const wxString computer = L"::{20D04FE0-3AEA-1069-A2D8-08002B30309D}";
+    const IdList controlPanel = idsOf(computer + L"\\::{21EC2020-3AEA-1069-A2DD-08002B30309D}");
     for (driveType = DRIVE_UNKNOWN; driveType <= DRIVE_RAMDISK; ++driveType)
-        EXPECT_EQ(collect(computer, {idsOf(controlPanel), idsOf(L"C:\\")}),
-                  driveType == DRIVE_FIXED ? PathSet({L"C:\\"}) : PathSet());
+        EXPECT_EQ(collect(computer, {controlPanel, idsOf(L"C:\\")}).size(), driveType == DRIVE_FIXED ? 1u : 0u);
 }
 
 TEST_F(SelectionTest, NeverReadsOutsideAForgedBlock)
 {
     // Counts and offsets beyond the block, and lists that do not end inside it.
-    const std::vector<UINT> blocks[] = {{1},
-                                        {0x40000000, 0},
-                                        {0xFFFFFFFE, 0, 0},
-                                        {1, 12, 15, 0},
-                                        {1, 12, 14, 0x10000},
-                                        {1, 12, 14, 0x7FFF0000},
-                                        {1, 0xFFFFFFFF, 0xFFFFFFF0, 0}};
-    FORMATETC format{static_cast<CLIPFORMAT>(RegisterClipboardFormatW(L"Shell IDList Array")), nullptr,
-                     DVASPECT_CONTENT, -1, TYMED_HGLOBAL};
-    for (const auto& block : blocks) {
+    const auto format = CLIPFORMAT(RegisterClipboardFormatW(CFSTR_SHELLIDLIST));
+    FORMATETC request{format, nullptr, DVASPECT_CONTENT, -1, TYMED_HGLOBAL};
+    for (const auto& block : {std::vector<UINT>{1},
+                              {1 << 30, 0},
+                              {~1u, 0, 0},
+                              {1, 12, 15, 0},
+                              {1, 12, 14, 1 << 16},
+                              {1, 12, 14, 0x7FFF0000},
+                              {1, ~0u, ~15u, 0}}) {
         DWORD connection = 0;
         STGMEDIUM medium{TYMED_HGLOBAL, {}, nullptr};
         medium.hGlobal = GlobalAlloc(GMEM_FIXED, block.size() * sizeof(UINT));
         std::copy(block.begin(), block.end(), static_cast<UINT*>(medium.hGlobal));
-        // OLE's data cache accepts any block.
-        RefPtr<IOleCache> cache;
+        RefPtr<IOleCache> cache; // accepts any block
         RefPtr<IDataObject> data;
         CreateDataCache(nullptr, CLSID_NULL, IID_IOleCache, cache.outVoid());
         cache->QueryInterface(IID_IDataObject, data.outVoid());
-        cache->Cache(&format, 0, &connection);
-        cache->SetData(&format, &medium, TRUE);
-        EXPECT_EQ(data->GetData(&format, &medium), S_OK);
-        ReleaseStgMedium(&medium);
+        cache->Cache(&request, 0, &connection);
+        cache->SetData(&request, &medium, TRUE);
+        EXPECT_EQ(data->QueryGetData(&request), S_OK);
         EXPECT_TRUE(collectPaths(nullptr, data.get(), chosenDriveType).empty()) << testing::PrintToString(block);
     }
 }
@@ -103,11 +94,9 @@ TEST_F(SelectionTest, SummarizesVersionsAndStates)
     const ManifestRef manifest = Manifest::parse(L"FILES\n" + in(L"a.txt\n5:5:5:9:0::0:0\n6:6:6:-1:0::0:0\n\n") +
                                                  in(L"sub\\deep\\c.txt\n5:5:5:9:0::0:0\n"));
     CreateDirectoryW(in(L"sub").wc_str(), nullptr);
-    DbConnection database;
-    database.open(service.file(L"taviconf.dat"));
-    database.execDML("CREATE TABLE filesystem(folder TEXT PRIMARY KEY, state INTEGER)");
-    for (const wxString& value : {wxString(folder.path()) + L"',2", in(L"sub',6"), in(L"b.txt',7")})
-        database.execDML(L"INSERT INTO filesystem VALUES('" + value + L")");
+    service.createTables();
+    for (const wxString& folder : {L"2,'" + in(L"").BeforeLast(L'\\'), L"6,'" + in(L"sub"), L"7,'" + in(L"b.txt")})
+        service.database(L"taviconf.dat").execDML(L"INSERT INTO filesystem VALUES(" + folder + L"')");
     constexpr Coverage kNone = Coverage::none, kSome = Coverage::some, kAll = Coverage::all;
     using Summary = std::tuple<Coverage, Coverage, bool, wxString>; // versions, states, is there a folder, name
     const std::pair<PathSet, Summary> cases[] = {
@@ -117,7 +106,6 @@ TEST_F(SelectionTest, SummarizesVersionsAndStates)
         {{in(L"sub")}, {kAll, kAll, true, L"sub"}},
         {{in(L"sub\\")}, {kAll, kAll, true, L""}},
         {{in(L"a.txt"), in(L"b.txt"), in(L"sub"), in(L"gone.txt")}, {kSome, kSome, true, L""}},
-        {{in(L"sub\\deep\\c.txt"), in(L"sub")}, {kAll, kAll, true, L""}},
     };
     FolderStateTable states;
     for (const auto& [paths, summary] : cases) {
@@ -127,7 +115,7 @@ TEST_F(SelectionTest, SummarizesVersionsAndStates)
         summarizeVersions(of, nullptr);
         EXPECT_TRUE(of.restoreMode == kNone && !of.isFolder);
     }
-    database.execDML("DROP TABLE filesystem");
+    service.database(L"taviconf.dat").execDML("DROP TABLE filesystem");
     EXPECT_EQ(summarizeStates({in(L"sub")}, states), kNone) << "a table that can no longer be read";
 }
 
