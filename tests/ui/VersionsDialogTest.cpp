@@ -29,51 +29,38 @@ struct VersionsDialogTest : UiTest {
     HWND dialog = nullptr, list = nullptr;
 };
 
-TEST_F(VersionsDialogTest, ListsTheVersionsOfTheSelection)
+TEST_F(VersionsDialogTest, ListsEachRunOnceAndSelectsTheNewest)
 {
-    _putenv("TZ=UTC0");
     const wchar_t* const files =
-        L"C:\\d\\50% & "
-        L"more.txt\n1700000000:1600000000:1:10:0::0:0\n1700000000:1:1:11:0::0:0\n1700100000:1:1:-1:0::0:0\n"
-        L"1700200000:1600000002:1:2048:0::0:0\n4102444800:4102444860:1:1048577:0::0:0\n\n"
-        L"C:\\d\\ends.txt\n1700000000:1600000000:1:10:0::0:0\n1700000001:5:5:-1:0::0:0\n\n"
-        L"simple.map\n1700000000:1:1:1:0::0:0\n1700200000:1:1:1:0::0:0";
-    // A line for each row; the selected row begins with a star.
-    const std::wstring ends = L"\n11/14/2023 10:13 PM|09/13/2020 12:26 PM|10 bytes|",
-                       runs = L"\n11/14/2023 10:13 PM|\n*11/17/2023 05:46 AM|",
-                       all = ends + L"\n11/17/2023 05:46 AM|09/13/2020 12:26 PM|2.0 KB|"
-                                    L"\n*01/01/2100 12:00 AM|01/01/2100 12:01 AM|1.0 MB|";
-    const std::tuple<PathSet, bool, std::wstring, std::wstring> cases[] = {
-        {{L"C:\\d\\50% & more.txt"}, false, L"50% & more.txt are", all},
-        {{L"C:\\d\\ends.txt"}, false, L"ends.txt are", ends},
-        {{L"C:\\d"}, true, L"the items you selected are", runs},
-        {{L"C:\\a", L"C:\\b"}, true, L"some of the items you selected are", runs},
+        L"C:\\d\\50% & more.txt\n4:5:1:10:0::0:0\n4:1:1:11:0::0:0\n5:1:1:-1:0::0:0\n6:5:1:9:0::0:0\n\n"
+        L"C:\\d\\ends.txt\n5:5:5:10:0::0:0\n6:5:5:-1:0::0:0\n\n"
+        L"simple.map\n4:1:1:1:0::0:0\n5:1:1:1:0::0:0\n6:1:1:1:0::0:0";
+    const std::tuple<PathSet, bool, std::wstring, int, int> cases[] = {
+        {{L"C:\\d\\50% & more.txt"}, false, L"50% & more.txt are", 2, 1},
+        {{L"C:\\d\\ends.txt"}, false, L"ends.txt are", 1, -1},
+        {{L"C:\\d"}, true, L"the items you selected are", 3, 2},
+        {{L"C:\\a", L"C:\\b"}, true, L"some of the items you selected are", 3, 2},
     };
-    for (const auto& [paths, isFolder, message, expected] : cases) {
+    for (const auto& [paths, isFolder, message, rows, selected] : cases) {
         open(paths, isFolder, files);
         EXPECT_EQ(controlText(dialog, TAVI_VERSIONS_MESSAGE).find(L"The following versions of " + message), 0u);
         EXPECT_EQ(controlText(dialog, TAVI_VERSIONS_LABEL), isFolder ? L"Available &Versions:" : L"File &Versions:");
-        std::wstring rows;
-        for (int row = 0; row < ListView_GetItemCount(list); ++row) {
-            rows += ListView_GetItemState(list, row, LVIS_SELECTED) ? L"\n*" : L"\n";
-            for (int column = 0; column < Header_GetItemCount(ListView_GetHeader(list)); ++column) {
-                wchar_t text[100] = L"";
-                ListView_GetItemText(list, row, column, text, 100);
-                rows += text + std::wstring(L"|");
-            }
-        }
-        EXPECT_EQ(rows, expected);
-        EXPECT_EQ(enabledActions(), expected == ends ? 0 : 2);
+        EXPECT_EQ(ListView_GetItemCount(list), rows);
+        EXPECT_EQ(ListView_GetNextItem(list, -1, LVNI_SELECTED), selected);
+        EXPECT_EQ(enabledActions(), selected < 0 ? 0 : 2);
+        wchar_t size[20] = L"";
+        ListView_GetItemText(list, 0, 2, size, 20);
+        EXPECT_STREQ(size, isFolder ? L"" : L"10 bytes") << "the first of two versions of one run";
         PostMessageW(list, WM_KEYDOWN, VK_ESCAPE, 0);
         waitForThreads();
     }
 }
 
-TEST_F(VersionsDialogTest, EnablesItsButtonsForASelectedRowAndShortensALongName)
+TEST_F(VersionsDialogTest, DisablesItsButtonsWithoutARowAndShortensALongName)
 {
     const wxString name = L"C:\\d\\begin" + wxString(L'x', 200) + L"end.txt";
-    open({name}, false, name + L"\n5:5:5:5:0::0:0\n6:5:5:5:0::0:0");
-    ListView_SetItemState(list, 1, 0, LVIS_SELECTED);
+    open({name}, false, name + L"\n5:5:5:5:0::0:0");
+    ListView_SetItemState(list, 0, 0, LVIS_SELECTED);
     EXPECT_EQ(enabledActions(), 0);
     SIZE ideal{};
     EXPECT_TRUE(Button_GetIdealSize(GetDlgItem(dialog, IDCANCEL), &ideal)) << "a button of version 6 of the controls";
