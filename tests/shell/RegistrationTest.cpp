@@ -25,7 +25,8 @@ struct RegistrationTest : testing::Test {
         setModuleInstance(GetModuleHandleW(nullptr));
         RegistryKey own;
         RegCreateKeyW(HKEY_CURRENT_USER, L"Software\\TaviTest", own.out());
-        redirectTo(own.get());
+        for (const HKEY key : {HKEY_CLASSES_ROOT, HKEY_LOCAL_MACHINE})
+            EXPECT_EQ(RegOverridePredefKey(key, own.get()), ERROR_SUCCESS);
         for (const wchar_t* kind :
              {L"AllFilesystemObjects", L"Drive", L"Directory", L"Directory\\Background", L"Folder"})
             handlers[L"\\" + (kind + kMenus) + L"\\"] = kId;
@@ -33,12 +34,8 @@ struct RegistrationTest : testing::Test {
     ~RegistrationTest() override
     {
         wxRegKey(kOwnKey).DeleteSelf();
-        redirectTo(nullptr);
-    }
-    static void redirectTo(HKEY own)
-    {
         for (const HKEY key : {HKEY_CLASSES_ROOT, HKEY_LOCAL_MACHINE})
-            EXPECT_EQ(RegOverridePredefKey(key, own), ERROR_SUCCESS);
+            RegOverridePredefKey(key, nullptr);
     }
     // Returns the texts below the key by their paths, but not those that the shell writes below CurrentVersion.
     static Values stored(const wxString& path = kOwnKey)

@@ -21,7 +21,7 @@ TEST_F(StubFolderTest, HasTwoTablesAndNoCurFolderInTheFirst)
     MEMORY_BASIC_INFORMATION behind{};
     VirtualQuery(fields[0][5], &behind, sizeof(behind));
     EXPECT_NE(behind.Protect, DWORD{PAGE_EXECUTE_READ}) << "the first table ends after 5 entries";
-    EXPECT_EQ(persist->Initialize(nullptr), S_OK);
+    EXPECT_EQ(persist->Initialize(ItemIdList(ILCreateFromPathW(L"C:\\")).get()), S_OK);
 }
 
 TEST_F(StubFolderTest, ParsesEveryNameToTheEmptyListAndRefusesTheRest)

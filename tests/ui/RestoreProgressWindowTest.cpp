@@ -17,11 +17,6 @@ using namespace test;
 constexpr auto kStarted = EventType::restoreStarted, kEnded = EventType::restoreEnded, kItem = EventType::restoreItem,
                kTotal = EventType::restoreTotal, kDone = EventType::restoreDone;
 
-void tell(EventType type, std::uint64_t value = 0, const wxString& item = wxString())
-{
-    dispatch(event(type, value, item));
-}
-
 struct RestoreProgressWindowTest : UiTest {
     // Queues a restore and returns the dialog, still hidden.
     static HWND open()
@@ -47,18 +42,18 @@ TEST_F(RestoreProgressWindowTest, ShowsItselfLateAndFollowsRestoresToTheLastEnd)
     const HWND dialog = open();
     ASSERT_EQ(waitDialog(L"Restoring..."), dialog);
     EXPECT_GE(GetTickCount() - start, 490u);
-    tell(kStarted);
-    tell(kDone, 1 << 30); // before the first item: not part of its speed
-    tell(kTotal, 1000);
-    tell(kItem, 0, "C:\\d\\A & B.txt");
+    dispatch(event(kStarted));
+    dispatch(event(kDone, 1 << 30)); // before the first item: not part of its speed
+    dispatch(event(kTotal, 1000));
+    dispatch(event(kItem, 0, "C:\\d\\A & B.txt"));
     EXPECT_TRUE(shows(dialog, L"C:\\d\\A & B.txt"));
     EXPECT_EQ(transferStatus().restoreRing.rateOver(60000), 0);
-    tell(kDone, 500);
+    dispatch(event(kDone, 500));
     EXPECT_TRUE(waitUntil([&] { return SendDlgItemMessageW(dialog, TAVI_PROGRESS_BAR, PBM_GETPOS, 0, 0) == 125; }));
-    tell(kEnded);
-    tell(kStarted);
+    dispatch(event(kEnded));
+    dispatch(event(kStarted));
     EXPECT_TRUE(shows(dialog, L"Finding file on server..."));
-    tell(kEnded);
+    dispatch(event(kEnded));
     EXPECT_TRUE(closes(dialog));
 }
 
@@ -78,15 +73,15 @@ TEST_F(RestoreProgressWindowTest, HoldsFewMessagesWhileBusyAndCatchesUpInOneGo)
     const HWND dialog = open();
     isBusy = true;
     procedure = reinterpret_cast<WNDPROC>(SetWindowLongPtrW(dialog, GWLP_WNDPROC, LONG_PTR(&waitWhileBusy)));
-    tell(kEnded);
+    dispatch(event(kEnded));
     const auto item = text(L"item");
     for (int round = 0; round < 50000; ++round)
         dispatch(std::make_unique<EventMessage>(round % 100 == 0 ? kStarted : kItem, 0, 0, 0, item));
     EXPECT_TRUE(item.use_count() > 1 && item.use_count() <= 1001) << item.use_count();
-    tell(kStarted);
+    dispatch(event(kStarted));
     isBusy = false;
     EXPECT_TRUE(shows(dialog, L"Sucht die Datei..."));
-    tell(kEnded);
+    dispatch(event(kEnded));
     EXPECT_TRUE(closes(dialog)) << "neither end was lost";
     EXPECT_TRUE(waitUntil([&] { return item.use_count() == 1; }));
 }
@@ -98,7 +93,7 @@ TEST_F(RestoreProgressWindowTest, ClosesByEveryButtonThoughItCannotCancel)
         {WM_COMMAND, TAVI_PROGRESS_CANCEL, 2}, {WM_COMMAND, TAVI_PROGRESS_CLOSE, 0}, {WM_CLOSE, 0, 0}};
     for (const auto& [message, command, lines] : cases) {
         const HWND dialog = open();
-        tell(kStarted);
+        dispatch(event(kStarted));
         PostMessageW(dialog, message, command, 0);
         EXPECT_TRUE(closes(dialog));
         EXPECT_EQ(log.take().size(), lines);
@@ -111,7 +106,7 @@ TEST_F(RestoreProgressWindowTest, SurvivesRestoresThatStartEndAndCloseOnSeveralT
     std::atomic<bool> done{false};
     std::thread ends([&] {
         for (int round = 0; !done; ++round)
-            tell(round % 3 == 0 ? kEnded : kStarted);
+            dispatch(event(round % 3 == 0 ? kEnded : kStarted));
     });
     const auto close = [] {
         if (const auto window = RestoreProgressWindow::current())
