@@ -1,6 +1,10 @@
+#include <fstream>
+
+#include "shell/Registration.h"
 #include "tests/support/Counts.h"
 #include "tests/support/LoadedModule.h"
 #include "tests/support/Pipes.h"
+#include "ui/PropertyPage.h"
 
 namespace tavi {
 namespace {
@@ -40,6 +44,9 @@ TEST_F(ExportsTest, LeaveNothingOfAnObjectThatCannotBeCreated)
     module.classObject(ShellExt::kClassId, IID_IClassFactory, factory.outVoid());
     EXPECT_TRUE(FAILED(factory->CreateInstance(nullptr, IID_IUnknown, &object)));
     EXPECT_EQ(object, nullptr);
+    std::ifstream file(toUtf8(service.file(L"tavi.log")));
+    const std::string log(std::istreambuf_iterator<char>(file), {});
+    EXPECT_NE(log.find("Error: Failed to open folder-state db (14: DB_CANTOPEN[14]: "), std::string::npos) << log;
 }
 
 TEST_F(ExportsTest, ServeAHostThatGoesOnAfterItMayUnload)
@@ -74,6 +81,26 @@ TEST_F(ExportsTest, LeaveNothingBehindInTwentyRoundsOfLoadAndUnload)
     }
     EXPECT_EQ(countNow(), before);
     FreeLibrary(dialogs);
+}
+
+TEST_F(ExportsTest, LetComUnloadTheModuleAtTheEndOfAPage)
+{
+    {
+        const LoadedModule module;
+        setModuleInstance(module.module);
+        registerServer();
+    }
+    EXPECT_EQ(CoGetClassObject(ShellExt::kClassId, CLSCTX_INPROC_SERVER, nullptr, IID_IClassFactory,
+                               RefPtr<IClassFactory>().outVoid()),
+              S_OK);
+    // The page is this program's own. The module is a library that COM has loaded and that nothing uses.
+    setModuleInstance(GetModuleHandleW(nullptr));
+    HPROPSHEETPAGE page = nullptr;
+    addPropertyPage({{L"C:\\f"}, {}, {}, false, {}}, Manifest::parse(L"FILES\nC:\\f\n1:1:1:1:0::0:0"), takePage,
+                    reinterpret_cast<LPARAM>(&page));
+    EXPECT_TRUE(GetModuleHandleW(L"tavishell.dll"));
+    DestroyPropertySheetPage(page);
+    EXPECT_TRUE(waitUntil([] { return !GetModuleHandleW(L"tavishell.dll"); }));
 }
 
 } // namespace

@@ -49,12 +49,35 @@ TEST_F(RestoreProgressWindowTest, ShowsItselfLateAndFollowsRestoresToTheLastEnd)
     EXPECT_TRUE(shows(dialog, L"C:\\d\\A & B.txt"));
     EXPECT_EQ(transferStatus().restoreRing.rateOver(60000), 0);
     dispatch(event(kDone, 500));
-    EXPECT_TRUE(waitUntil([&] { return SendDlgItemMessageW(dialog, TAVI_PROGRESS_BAR, PBM_GETPOS, 0, 0) == 125; }));
+    const auto position = [&] { return SendDlgItemMessageW(dialog, TAVI_PROGRESS_BAR, PBM_GETPOS, 0, 0); };
+    EXPECT_TRUE(waitUntil([&] { return position() == 125; }));
+    dispatch(event(kItem, 0, "C:\\d\\B.txt"));
+    EXPECT_TRUE(waitUntil([] { return transferStatus().restoreSpeed() > 0; })) << "only the first item clears it";
+    transferStatus().restoreRateLong = 1000;
+    EXPECT_TRUE(waitUntil([&] { return controlText(dialog, TAVI_PROGRESS_REMAINING) == L"4 seconds"; }));
+    dispatch(std::make_unique<SnapshotMessage>(7, 0, 0, 0, 0));
+    EXPECT_TRUE(waitUntil([&] { return controlText(dialog, TAVI_PROGRESS_REMAINING) == L"Unknown"; }));
     dispatch(event(kEnded));
     dispatch(event(kStarted));
     EXPECT_TRUE(shows(dialog, L"Finding file on server..."));
+    EXPECT_EQ(position(), 125) << "until an amount moves it";
+    // The dialog manager uses the number of the window's own message, too.
+    SendMessageW(dialog, DM_SETDEFID, TAVI_PROGRESS_CANCEL, 0);
+    EXPECT_EQ(LOWORD(SendMessageW(dialog, DM_GETDEFID, 0, 0)), TAVI_PROGRESS_CANCEL);
     dispatch(event(kEnded));
     EXPECT_TRUE(closes(dialog));
+}
+
+TEST_F(RestoreProgressWindowTest, StaysRegisteredThoughItsDialogCannotBeCreated)
+{
+    setModuleInstance(GetModuleHandleW(L"kernel32.dll"));
+    RestoreProgressWindow::getOrCreate();
+    EXPECT_TRUE(waitUntil([&] { return log.take().size() == 1; }));
+    dispatch(event(kItem, 0, "not shown"));
+    EXPECT_EQ(moduleRefCount(), 2);
+    RestoreProgressWindow::current()->handleMessage(nullptr, WM_DESTROY, 0, 0);
+    EXPECT_FALSE(RestoreProgressWindow::current());
+    EXPECT_EQ(moduleRefCount()--, 1) << "the thread's stays raised";
 }
 
 // Instead of the dialog's window procedure: makes its thread wait.
