@@ -56,12 +56,14 @@ TEST_F(VersionsDialogTest, ListsEachRunOnceAndSelectsTheNewest)
     }
 }
 
-TEST_F(VersionsDialogTest, DisablesItsButtonsWithoutARowAndShortensALongName)
+TEST_F(VersionsDialogTest, EnablesItsButtonsForARowAndShortensALongName)
 {
     const wxString name = L"C:\\d\\begin" + wxString(L'x', 200) + L"end.txt";
     open({name}, false, name + L"\n5:5:5:5:0::0:0");
     ListView_SetItemState(list, 0, 0, LVIS_SELECTED);
     EXPECT_EQ(enabledActions(), 0);
+    ListView_SetItemState(list, 0, LVIS_SELECTED, LVIS_SELECTED);
+    EXPECT_EQ(enabledActions(), 2);
     SIZE ideal{};
     EXPECT_TRUE(Button_GetIdealSize(GetDlgItem(dialog, IDCANCEL), &ideal)) << "a button of version 6 of the controls";
     const std::wstring message = controlText(dialog, TAVI_VERSIONS_MESSAGE);
