@@ -1,22 +1,12 @@
 #pragma once
 
-#include <string>
 #include <vector>
 
-#include <windows.h>
 #include <gtest/gtest.h>
 
-#include "core/Handles.h"
-#include "core/Privileges.h"
+#include "tests/support/Registry.h"
 
 namespace tavi::test {
-
-inline KernelHandle processToken()
-{
-    KernelHandle token;
-    OpenProcessToken(GetCurrentProcess(), TOKEN_ADJUST_PRIVILEGES | TOKEN_QUERY, token.out());
-    return token;
-}
 
 // Returns the hives that the module has loaded.
 inline std::vector<std::wstring> temporaryHives()
