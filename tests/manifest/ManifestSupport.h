@@ -1,7 +1,6 @@
 #pragma once
 
 #include <sstream>
-#include <string>
 
 #include <wx/mstream.h>
 #include <wx/zstream.h>
@@ -25,21 +24,14 @@ inline ManifestRef stored(const std::string& blob)
     return parseStoredManifest(blob.data(), blob.size());
 }
 
-inline std::string utf8(const wxString& text)
-{
-    return toUtf8(view(text));
-}
-
 // Returns the versions in the layout of eight fields.
 inline std::string dump(const ManifestPatchList& patches)
 {
     std::ostringstream out;
-    for (std::size_t i = 0; i < patches.size(); ++i) {
-        const ManifestPatch patch = patches[i];
-        out << std::dec << patch.timestamp() << ':' << patch.modifiedTime() << ':' << patch.ctime() << ':'
-            << patch.fileSize() << ':' << patch.aux1() << ':' << utf8(patch.auxText()) << ':' << patch.aux2() << ':'
-            << std::oct << static_cast<unsigned>(patch.attributes()) << ' ';
-    }
+    for (std::size_t i = 0; i < patches.size(); ++i)
+        out << std::dec << patches[i].timestamp() << ':' << patches[i].modifiedTime() << ':' << patches[i].ctime()
+            << ':' << patches[i].fileSize() << ':' << patches[i].aux1() << ':' << toUtf8(view(patches[i].auxText()))
+            << ':' << patches[i].aux2() << ':' << std::oct << patches[i].attributes() << ' ';
     return out.str();
 }
 
@@ -50,9 +42,9 @@ inline std::string dump(const ManifestRef& manifest)
         return "none";
     std::string out;
     if (manifest->hash() != "da39a3ee5e6b4b0d3255bfef95601890afd80709" || !manifest->userText().empty())
-        out = utf8(manifest->hash()) + '[' + utf8(manifest->userText()) + "] ";
+        out = toUtf8(view(manifest->hash() + "[" + manifest->userText() + "] "));
     for (std::uint32_t file = 0; file < manifest->fileCount(); ++file)
-        out += utf8(manifest->filePath(file)) + " = " + dump(manifest->patches(file));
+        out += toUtf8(view(manifest->filePath(file))) + " = " + dump(manifest->patches(file));
     return out;
 }
 

@@ -21,78 +21,56 @@ TEST(Manifest, StaysWholeForItsReadersWhileOthersReplaceIt)
         for (std::size_t turn = 0; !isDone; ++turn) {
             kept[turn % kept.size()] = published.acquire();
             for (const ManifestRef& manifest : kept)
-                ASSERT_TRUE(!manifest || utf8(manifest->hash()) == std::to_string(manifest->patches(0)[0].timestamp()));
+                ASSERT_TRUE(!manifest || manifest->hash() == std::to_string(manifest->patches(0)[0].timestamp()));
         }
     };
     std::thread readers[] = {std::thread(read), std::thread(read), std::thread(read)};
-    for (int version = 1; version <= 400; ++version) {
-        const std::string number = std::to_string(version);
+    for (int version = 1; version <= 400; ++version)
         published.replace(
-            Manifest::parse(fromUtf8("USER\n_hash|" + number + "\n\n\nFILES\nC:\\a\n" + number + ":1:2:3:0:x:0:40")));
-    }
+            Manifest::parse(wxString::Format("USER\n_hash|%d\n\n\nFILES\na\n%d:::::::", version, version)));
     isDone = true;
     for (std::thread& reader : readers)
         reader.join();
 }
 
-// Converts to UTF-8 with surrogates in three-byte form, so that every prefix in UTF-16 is a prefix in bytes too.
-std::string inHalves(const wxString& text)
-{
-    std::string bytes;
-    for (const wchar_t unit : view(text)) {
-        const auto point = static_cast<char32_t>(unit);
-        if (point >= 0x10000)
-            appendUtf8(std::wstring(1, static_cast<wchar_t>(0xD7C0 + (point >> 10))), bytes);
-        appendUtf8(std::wstring(1, static_cast<wchar_t>(point >= 0x10000 ? 0xDC00 + (point & 0x3FF) : point)), bytes);
-    }
-    return bytes;
-}
-
-// Uses few characters, so that paths, folders and prefixes coincide. Surrogates are among them.
+// Uses few characters, so that paths, folders and prefixes coincide. Only 16-bit wide characters have surrogates.
 std::wstring randomPath(std::mt19937& random, std::size_t longest)
 {
-    constexpr wchar_t kCharacters[] = {L'a',   L'b',   L'\\',  L'\\',  0xE4,   0x65E5,
-                                       0xFFFD, 0xD83D, 0xD83D, 0xDE00, 0xDE01, 0xDFFF};
-    std::wstring path;
-    for (std::size_t length = random() % (longest + 1); path.size() < length;)
-        path.push_back(kCharacters[random() % std::size(kCharacters)]);
+    const wchar_t characters[] = {'a', 'b', '\\', '\\', 0xE4, 0x65E5, 0xFFFD, 0xD83D, 0xD83D, 0xDE00, 0xDE01, 0xDFFF};
+    std::wstring path(random() % (longest + 1), 0);
+    for (wchar_t& character : path)
+        character = characters[random() % (sizeof(wchar_t) == 2 ? 12 : 7)];
     return path;
 }
 
 bool existed(const ManifestPatchList& patches, std::uint32_t time)
 {
-    bool exists = time == kAnyTime;
+    bool exists = false;
     for (std::size_t i = 0; i < patches.size(); ++i)
-        exists = time == kAnyTime || (time != 0 && patches[i].timestamp() > time) ? exists : !patches[i].isDeletion();
-    return exists;
+        exists = time == 0 || patches[i].timestamp() <= time ? !patches[i].isDeletion() : exists;
+    return exists || time == kAnyTime;
 }
 
-// The versions of each path, as dump() writes them.
-using Model = std::map<std::string, std::string>;
-
-// A large text has more than a block of everything, and lines longer than a block or a read.
-std::wstring randomText(std::mt19937& random, bool isLarge, Model& model)
+// Adds the versions of each path to the model, as dump() writes them. A large text has more than a block of everything,
+// and lines longer than a block or a read.
+std::string randomText(std::mt19937& random, bool isLarge, std::map<std::wstring, std::string>& model)
 {
-    std::wstring text = L"FILES";
-    for (std::size_t files = isLarge ? 20000 : random() % 300; files-- > 0;) {
+    std::string text = "FILES";
+    for (std::size_t files = isLarge ? 20000 : 1 + random() % 300; files-- > 0;) {
         const std::size_t extra = isLarge && files == 10000 ? 1500000 : 0;
-        if (random() % 20 == 0 && text.back() == L'\n')
-            text += L"\n\nFILES";
         const std::wstring path = L"C" + std::wstring(extra, L'd') + randomPath(random, isLarge ? 15 : 7);
-        text += L"\n" + path + L"\n";
-        std::string& versions = model[inHalves(path)] = "";
+        text += (random() % 20 == 0 && !model.empty() ? "\n\nFILES\n" : "\n") + toUtf8(path) + "\n";
+        std::string& versions = model[path] = "";
         for (std::size_t count = 1 + random() % 3; count-- > 0;) {
-            const std::string time = std::to_string(random() % 50);
-            const std::string size = std::to_string(static_cast<int>(random() % 4) - 1);
-            const std::string digest = std::string(32, 'a') + std::to_string(10000000 + random() % 90000000);
+            const std::string digest = std::to_string(random() % 8) + "123456789abcdef0123456789abcdef01234567";
             const std::string aux = extra != 0 ? std::string(extra, 'o') : random() % 4 == 0 ? "odd" : digest;
-            const std::string version = time + ":1:2:" + size + ":0:" + aux + ":0:40";
-            text += std::wstring(version.begin(), version.end()) + L"\n";
-            versions += version + " ";
+            const char* const size = random() % 4 == 0 ? ":1:2:-1:0:" : ":1:2:3:0:";
+            versions += std::to_string(random() % 50) + size + aux + ":0:40 ";
         }
+        text += versions;
+        std::replace(text.end() - static_cast<std::ptrdiff_t>(versions.size()), text.end(), ' ', '\n');
     }
-    if (text.back() == L'\n')
-        text.pop_back();
+    text.pop_back();
     return text;
 }
 
@@ -100,38 +78,33 @@ TEST(Manifest, AnswersAsAWalkOverAllEntriesDoes)
 {
     std::mt19937 random(20261121);
     for (int round = 0; round < 60; ++round) {
-        Model model;
-        const std::wstring text = randomText(random, round == 0, model);
-        const ManifestRef manifest = Manifest::parse(text);
-        ASSERT_EQ(dump(stored(packed(inHalves(text)))), dump(manifest)) << "characters stored in halves";
+        std::map<std::wstring, std::string> model;
+        const std::string text = randomText(random, round == 0, model);
+        const ManifestRef manifest = stored(packed(text));
+        ASSERT_EQ(dump(Manifest::parse(fromUtf8(text))), dump(manifest));
         ASSERT_EQ(manifest->fileCount(), model.size());
-        std::vector<std::string> order;
+        std::vector<std::wstring> order;
         for (std::uint32_t file = 0; file < manifest->fileCount(); ++file) {
-            const wxString path = manifest->filePath(file);
-            order.push_back(inHalves(path));
-            EXPECT_EQ(dump(manifest->findPatches(view(path)).value()), model[order.back()]);
+            order.push_back(manifest->filePath(file).ToStdWstring());
+            EXPECT_EQ(dump(manifest->findPatches(order.back()).value()), model[order.back()]);
         }
         for (int question = 0; question < (round == 0 ? 30 : 300); ++question) {
-            const std::wstring wide = question == 0 ? L"" : L"C" + randomPath(random, 5);
-            const std::string prefix = inHalves(wide);
+            const std::wstring prefix = question == 0 ? L"" : L"C" + randomPath(random, 5);
             const std::uint32_t time = random() % 3 == 0 ? kAnyTime : random() % 60 * (random() % 2);
             std::vector<std::uint32_t> expected, visited;
-            bool isBackedUp = false, isFileBackedUp = false;
+            bool isBackedUp = false;
             for (std::uint32_t file = 0; file < order.size(); ++file) {
                 if (order[file].compare(0, prefix.size(), prefix) == 0) {
                     expected.push_back(file);
-                    const bool exists = existed(manifest->patches(file), time);
-                    isBackedUp = isBackedUp || exists;
-                    isFileBackedUp = isFileBackedUp || (exists && order[file] == prefix);
+                    isBackedUp = isBackedUp || existed(manifest->patches(file), time);
                 }
             }
-            manifest->forEachUnder(wide, [&](std::uint32_t file) {
-                visited.push_back(file);
-                return true;
-            });
+            manifest->forEachUnder(prefix, [&](std::uint32_t file) { return visited.push_back(file), true; });
             ASSERT_EQ(visited, expected);
-            ASSERT_EQ(manifest->hasBackedUpUnder(wide, time), isBackedUp);
-            ASSERT_EQ(manifest->isBackedUp(wide, time), isFileBackedUp);
+            ASSERT_EQ(manifest->hasBackedUpUnder(prefix, time), isBackedUp);
+            const auto patches = manifest->findPatches(prefix);
+            ASSERT_EQ(patches.has_value(), model.count(prefix) != 0);
+            ASSERT_EQ(manifest->isBackedUp(prefix, time), patches && existed(*patches, time));
         }
     }
 }
