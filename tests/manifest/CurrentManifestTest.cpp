@@ -12,13 +12,9 @@ namespace {
 
 using namespace test;
 
-struct CurrentManifestTest : UiTest {
-    ~CurrentManifestTest() override
-    {
-        stopManifestWatcher();
-    }
-    static constexpr auto isLoaded = [] { return static_cast<bool>(getCurrentManifest()); };
-};
+struct CurrentManifestTest : UiTest {};
+
+constexpr auto isLoaded = [] { return static_cast<bool>(getCurrentManifest()); };
 
 TEST_F(CurrentManifestTest, IsNullAtOnceUntilOneWatcherHasLoadedIt)
 {
@@ -37,6 +33,7 @@ TEST_F(CurrentManifestTest, IsNullAtOnceUntilOneWatcherHasLoadedIt)
     EXPECT_TRUE(waitUntil([] { return !isWatcherActive(); }));
     std::thread([] { EXPECT_FALSE(isLoaded() || isWatcherActive()); }).join();
     EXPECT_TRUE(waitUntil(isLoaded)) << "started by the owner of the mutex";
+    stopManifestWatcher();
 }
 
 TEST_F(CurrentManifestTest, IsKeptForTheNewestMenuOnly)

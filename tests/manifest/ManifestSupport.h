@@ -6,7 +6,6 @@
 #include <wx/zstream.h>
 
 #include "core/Utf8.h"
-#include "manifest/ManifestParser.h"
 #include "manifest/StoredManifest.h"
 
 namespace tavi::test {

@@ -1,6 +1,6 @@
+#include <future>
 #include <map>
 #include <random>
-#include <thread>
 
 #include <gtest/gtest.h>
 
@@ -17,20 +17,18 @@ TEST(Manifest, StaysWholeForItsReadersWhileOthersReplaceIt)
     PublishedPointer<const Manifest> published;
     std::atomic<bool> isDone{false};
     const auto read = [&] {
-        std::vector<ManifestRef> kept(4); // beyond later replacements
-        for (std::size_t turn = 0; !isDone; ++turn) {
-            kept[turn % kept.size()] = published.acquire();
+        for (ManifestRef kept[2]; !isDone; std::swap(kept[0], kept[1])) { // one is kept beyond a replacement
+            kept[0] = published.acquire();
             for (const ManifestRef& manifest : kept)
                 ASSERT_TRUE(!manifest || manifest->hash() == std::to_string(manifest->patches(0)[0].timestamp()));
         }
     };
-    std::thread readers[] = {std::thread(read), std::thread(read), std::thread(read)};
+    const auto start = [&] { return std::async(std::launch::async, read); };
+    const std::future<void> readers[] = {start(), start(), start()}; // join on destruction
     for (int version = 1; version <= 400; ++version)
         published.replace(
             Manifest::parse(wxString::Format("USER\n_hash|%d\n\n\nFILES\na\n%d:::::::", version, version)));
     isDone = true;
-    for (std::thread& reader : readers)
-        reader.join();
 }
 
 // Uses few characters, so that paths, folders and prefixes coincide. Only 16-bit wide characters have surrogates.

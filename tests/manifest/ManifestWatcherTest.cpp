@@ -43,7 +43,6 @@ TEST(ManifestWatcher, LoadsChangedManifestsOnlyAndRebuildsTheExclusionsEvery18th
     }
     length = 5000 * 55 + 1500;
     runManifestWatcher(state, services);
-    EXPECT_EQ(slept, length);
     EXPECT_EQ(loads, 4);
     EXPECT_EQ(dump(state.manifest.acquire()), "2[] ");
     EXPECT_EQ(builds, (std::vector<std::size_t>{0, 0, 0, 0, 0, 0, 23, 41, 59}));
@@ -60,8 +59,7 @@ TEST(readStoredManifest, IsEmptyWhereThereIsNoneAndLogsFailures)
     const std::string failed = "2: Warning: Failed to retrieve stored manifest ";
     EXPECT_EQ(read(), failed + "(1: DB_ERROR[1]: )");
     DbConnection database = service.database(L"tavistate.dat");
-    for (const char* const sql :
-         {"CREATE TABLE manifest(contents)", "INSERT INTO manifest VALUES(NULL)", "UPDATE manifest SET contents=x''"}) {
+    for (const char* const sql : {"CREATE TABLE manifest(contents)", "INSERT INTO manifest VALUES(NULL)"}) {
         database.execDML(sql);
         EXPECT_EQ(read(), "") << sql;
     }

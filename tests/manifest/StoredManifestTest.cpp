@@ -25,8 +25,8 @@ TEST(StoredManifest, EndsAtTheFirstZeroOrMalformedSequence)
     const std::string valid = "a\xC3\xA4\xE6\x97\xA5\xED\xA0\x80\xF0\x9F\x98\x80";
     const std::string later = "\0"s + std::string(100000, 'x') + "\xC3\xA4\n1:2:3:4:5:6:7:8:9";
     for (const std::string& fault : {"\x80"s, "\xFF"s, "\xE6\x97z"s, "\xC3\xC3\xA4"s, "\0b\0"s, "\0\xFF"s, later}) {
-        // Also behind the first read, at every offset in a machine word.
-        for (const std::size_t length : {0u, 100000u, 100001u, 100002u, 100003u}) {
+        // The end of the first read cuts each character at each place.
+        for (std::size_t length = 64 * 1024 - 40; length < 64 * 1024; ++length) {
             const std::string before = std::string(length, 'x') + valid;
             EXPECT_EQ(auxText(packed(kHead + before + fault + "z")), before) << fault;
             EXPECT_EQ(auxText(packed(kHead + before + "z")), before + "z") << "left behind by " << fault;
@@ -34,13 +34,9 @@ TEST(StoredManifest, EndsAtTheFirstZeroOrMalformedSequence)
     }
 }
 
-TEST(StoredManifest, KeepsACharacterThatAReadOrTheEndOfATextCutsInTwo)
+TEST(StoredManifest, KeepsACharacterThatTheEndOfATextCutsInTwo)
 {
     for (const std::string whole : {"\xC3\xA4", "\xE6\x97\xA5", "\xF0\x9F\x98\x80"}) {
-        for (std::size_t behind = 1; behind <= whole.size(); ++behind) {
-            const std::string text = std::string(64 * 1024 - kHead.size() - behind, 'x') + whole + "end";
-            EXPECT_EQ(auxText(packed(kHead + text)), text);
-        }
         for (std::size_t cut = 1; cut < whole.size(); ++cut) {
             EXPECT_EQ(auxText(packed(kHead + "a" + whole.substr(0, cut))), "a");
             EXPECT_EQ(auxText(packed(whole.substr(cut) + "x\n\n\n" + kHead + "b")), "b");
