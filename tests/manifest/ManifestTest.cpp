@@ -90,16 +90,15 @@ TEST(Manifest, AnswersAsAWalkOverAllEntriesDoes)
             const std::wstring prefix = question == 0 ? L"" : L"C" + randomPath(random, 5);
             const std::uint32_t time = random() % 3 == 0 ? kAnyTime : random() % 60 * (random() % 2);
             std::vector<std::uint32_t> expected, visited;
-            bool isBackedUp = false;
             for (std::uint32_t file = 0; file < order.size(); ++file) {
-                if (order[file].compare(0, prefix.size(), prefix) == 0) {
+                if (order[file].compare(0, prefix.size(), prefix) == 0)
                     expected.push_back(file);
-                    isBackedUp = isBackedUp || existed(manifest->patches(file), time);
-                }
             }
             manifest->forEachUnder(prefix, [&](std::uint32_t file) { return visited.push_back(file), true; });
             ASSERT_EQ(visited, expected);
-            ASSERT_EQ(manifest->hasBackedUpUnder(prefix, time), isBackedUp);
+            const auto didExist = [&](std::uint32_t file) { return existed(manifest->patches(file), time); };
+            ASSERT_EQ(manifest->hasBackedUpUnder(prefix, time),
+                      std::any_of(expected.begin(), expected.end(), didExist));
             const auto patches = manifest->findPatches(prefix);
             ASSERT_EQ(patches.has_value(), model.count(prefix) != 0);
             ASSERT_EQ(manifest->isBackedUp(prefix, time), patches && existed(*patches, time));
