@@ -2,7 +2,6 @@
 #include <stdexcept>
 
 #include <windows.h>
-#include <sqlite3.h>
 #include <zlib.h>
 
 #include "bench/Bench.h"
@@ -105,22 +104,6 @@ void questionFigures(Bench& bench)
     bench.report("selection of 1000 folders" + at, times[4] * 1e3, 4, "ms");
 }
 
-// Creates the service's table of the compressed text.
-void storeManifest(const std::wstring& databaseFile, const std::vector<char>& blob)
-{
-    sqlite3* database = nullptr;
-    sqlite3_stmt* insert = nullptr;
-    sqlite3_open(toUtf8(databaseFile).c_str(), &database);
-    sqlite3_exec(database, "CREATE TABLE manifest(contents BLOB)", nullptr, nullptr, nullptr);
-    sqlite3_prepare_v2(database, "INSERT INTO manifest VALUES(?)", -1, &insert, nullptr);
-    sqlite3_bind_blob(insert, 1, blob.data(), static_cast<int>(blob.size()), SQLITE_STATIC);
-    const bool isStored = sqlite3_step(insert) == SQLITE_DONE;
-    sqlite3_finalize(insert);
-    sqlite3_close(database);
-    if (!isStored)
-        throw std::runtime_error("cannot store the manifest");
-}
-
 } // namespace
 
 // Returns bytes: the peak of a load, the manifest without its blob, and the peak of a second load beside the first
@@ -147,8 +130,9 @@ void runDatabase(Bench& bench)
     const StoredText text = storedText(bench.dataFolder, bench.files, FileOrder::walk);
     const std::string at = ", " + std::to_string(bench.files) + " files";
     const test::InstalledService service;
+    service.createTables();
     std::vector<char> blob = readBlob(text.file);
-    storeManifest(service.file(L"tavistate.dat"), blob);
+    service.storeManifest({blob.data(), blob.size()});
     const auto load = [&] { return checked(readStoredManifest(), bench.files); };
     const auto times = loadTimes(bench.quick ? 3 : 5, text, blob, load);
     bench.report("database to manifest / inflating" + at, times[1] / times[0], 2.5, "x");

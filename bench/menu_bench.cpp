@@ -12,7 +12,6 @@
 #include "core/Handles.h"
 #include "core/Module.h"
 #include "core/ScopeGuard.h"
-#include "core/Utf8.h"
 #include "manifest/CurrentManifest.h"
 #include "statedb/StateLookups.h"
 #include "tests/support/Registry.h"
@@ -103,12 +102,8 @@ class BenchFolder {
 void runMenu(Bench& bench)
 {
     const test::InstalledService service;
-    service.database(L"taviconf.dat")
-        .execDML("CREATE TABLE filesystem(state INTEGER, folder TEXT PRIMARY KEY);"
-                 "INSERT INTO filesystem VALUES(1,'C:\\users')");
-    service.database(L"tavistate.dat")
-        .execDML("CREATE TABLE manifest(contents BLOB);"
-                 "CREATE TABLE file_states(filename TEXT PRIMARY KEY, state INTEGER)");
+    service.createTables();
+    service.database(L"taviconf.dat").execDML("INSERT INTO filesystem VALUES(1,'C:\\users')");
     OleInitialize(nullptr);
     const ScopeGuard ole([] { OleUninitialize(); });
     setModuleInstance(GetModuleHandleW(nullptr));

@@ -56,11 +56,8 @@ void runRestore(Bench& bench)
     const std::string at = ", " + std::to_string(bench.files) + " rows";
     const ManifestRef manifest = loadSet(text.file, bench.files);
     const test::InstalledService service;
+    service.createTables();
     DbConnection database = service.database(L"tavistate.dat");
-    database.execDML("CREATE TABLE restores(request_time INTEGER, machine_id TEXT, machine_alias TEXT, "
-                     "encryption_key TEXT);"
-                     "CREATE TABLE restore_files(restore_id INTEGER, manifest_path TEXT, file_size INTEGER, timestamp "
-                     "INTEGER, ctime INTEGER, attributes INTEGER, target_path TEXT, overwrite INTEGER)");
     const auto clear = [&] { database.execDML("DELETE FROM restores; DELETE FROM restore_files"); };
     const auto insert = [&] { bareInserts(database, bench.files); };
     const auto request = [&] {

@@ -4,13 +4,16 @@
 #include <map>
 #include <stdexcept>
 #include <string>
+#include <string_view>
 
 #include <windows.h>
+#include <sqlite3.h>
 #include <wx/msw/registry.h>
 
 #include "core/Handles.h"
 #include "core/InstallPaths.h"
 #include "core/Privileges.h"
+#include "core/Utf8.h"
 #include "statedb/Database.h"
 
 namespace tavi::test {
@@ -68,6 +71,34 @@ class InstalledService {
         DbConnection database;
         database.open(file(name));
         return database;
+    }
+
+    // Creates all tables that the module reads or writes.
+    void createTables() const
+    {
+        database(L"taviconf.dat").execDML("CREATE TABLE filesystem(state INTEGER, folder TEXT PRIMARY KEY)");
+        database(L"tavistate.dat")
+            .execDML("CREATE TABLE manifest(contents BLOB);"
+                     "CREATE TABLE file_states(filename TEXT PRIMARY KEY, state INTEGER);"
+                     "CREATE TABLE restores(request_time INTEGER, machine_id TEXT, machine_alias TEXT, "
+                     "encryption_key TEXT);"
+                     "CREATE TABLE restore_files(restore_id INTEGER, manifest_path TEXT, file_size INTEGER, timestamp "
+                     "INTEGER, ctime INTEGER, attributes INTEGER, target_path TEXT, overwrite INTEGER)");
+    }
+    // Stores a compressed manifest text.
+    void storeManifest(std::string_view blob) const
+    {
+        sqlite3* database = nullptr;
+        sqlite3_stmt* insert = nullptr;
+        const bool stored =
+            sqlite3_open(toUtf8(file(L"tavistate.dat")).c_str(), &database) == SQLITE_OK &&
+            sqlite3_prepare_v2(database, "INSERT INTO manifest VALUES(?)", -1, &insert, nullptr) == SQLITE_OK &&
+            sqlite3_bind_blob(insert, 1, blob.data(), static_cast<int>(blob.size()), SQLITE_STATIC) == SQLITE_OK &&
+            sqlite3_step(insert) == SQLITE_DONE;
+        sqlite3_finalize(insert);
+        sqlite3_close(database);
+        if (!stored)
+            throw std::runtime_error("cannot store the manifest");
     }
 
   private:
