@@ -14,7 +14,10 @@ namespace {
 
 using namespace test;
 
-constexpr auto adopt = RefPtr<const PathTree>::adopt;
+RefPtr<const PathTree> adopt(const PathTree* tree)
+{
+    return RefPtr<const PathTree>::adopt(tree);
+}
 
 // Users whose folders get every odd state, by which they are named. Each build logs one line, since the install key
 // names no data folder.

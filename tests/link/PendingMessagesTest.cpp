@@ -43,8 +43,8 @@ TEST(PendingMessages, CountStartsEndsAndSnapshotsBeyondTheBound)
 
 TEST(PendingMessages, HoldTextsUpToTheirBound)
 {
-    constexpr std::size_t bound = PendingMessages::kMaxTextBytes / sizeof(wchar_t);
-    for (const auto& [length, held] : {std::pair(bound / 3, 3), std::pair(bound + 1, 0)}) {
+    constexpr std::size_t kBound = PendingMessages::kMaxTextBytes / sizeof(wchar_t);
+    for (const auto& [length, held] : {std::pair(kBound / 3, 3), std::pair(kBound + 1, 0)}) {
         PendingMessages pending;
         for (int i = 0; i < 20; ++i)
             pending.put(event(E::restoreItem, 0, wxString(L'x', length)));

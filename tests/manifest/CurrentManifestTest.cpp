@@ -14,7 +14,10 @@ using namespace test;
 
 struct CurrentManifestTest : UiTest {};
 
-constexpr auto isLoaded = [] { return static_cast<bool>(getCurrentManifest()); };
+bool isLoaded()
+{
+    return static_cast<bool>(getCurrentManifest());
+}
 
 TEST_F(CurrentManifestTest, IsNullAtOnceUntilOneWatcherHasLoadedIt)
 {

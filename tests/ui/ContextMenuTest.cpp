@@ -37,15 +37,15 @@ TEST_F(ContextMenuTest, InsertsASeparatorAndTheCommandThatFits)
 TEST_F(ContextMenuTest, CopiesVerbsAndHelpTexts)
 {
     translate("Restore files in %s from the Tavi servers.", "Aus %s (100 %) holen: %s");
-    constexpr HRESULT cut = static_cast<HRESULT>(0x8007007A);
+    constexpr HRESULT kCut = static_cast<HRESULT>(0x8007007A);
     const std::tuple<UINT, UINT, const Selection&, UINT, HRESULT, wxString> cases[] = {
         {1, GCS_VERBW, kFile, 11, S_OK, L"TaviBackup"},
-        {2, GCS_VERBA, kFile, 14, cut, L"TaviDontBacku"},
+        {2, GCS_VERBA, kFile, 14, kCut, L"TaviDontBacku"},
         {0, GCS_VERBW, kFile, 0, E_INVALIDARG, L"?"},
         {0, GCS_HELPTEXTW, kFile, 0x80000000, E_INVALIDARG, L"?"},
         {0, GCS_HELPTEXTW, kFile, 100, S_OK, L"Restore an older version of 50%s & more.txt from the Tavi servers."},
         {0, GCS_HELPTEXTW, kFolder, 100, S_OK, L"Aus caf\u00e9 (100 %) holen: %s"},
-        {0, GCS_HELPTEXTA, kFolder, 9, cut, L"Aus caf\u00e9"},
+        {0, GCS_HELPTEXTA, kFolder, 9, kCut, L"Aus caf\u00e9"},
         {1, GCS_VALIDATEW, kFile, 100, S_OK, L"?"},
         {3, GCS_VERBW, kFile, 100, E_INVALIDARG, L"?"},
     };

@@ -10,8 +10,8 @@ using MenuBitmapTest = test::UiTest;
 
 TEST_F(MenuBitmapTest, KeepsTheIconOnItsFirstBackgroundUntilFreed)
 {
-    constexpr COLORREF plain = 0x202020;
-    const HBITMAP bitmap = menuBitmap(TAVI_ICON_MENU, plain);
+    constexpr COLORREF kPlain = 0x202020;
+    const HBITMAP bitmap = menuBitmap(TAVI_ICON_MENU, kPlain);
     EXPECT_EQ(menuBitmap(TAVI_ICON_MENU, 0x00FF00), bitmap);
     EXPECT_EQ(menuBitmap(136, 0), nullptr) << "no such icon";
     const MemoryDc dc(CreateCompatibleDC(nullptr));
@@ -19,7 +19,7 @@ TEST_F(MenuBitmapTest, KeepsTheIconOnItsFirstBackgroundUntilFreed)
     const int width = GetSystemMetrics(SM_CXMENUCHECK), size = width * GetSystemMetrics(SM_CYMENUCHECK);
     int bare = 0;
     for (int i = 0; i < size; ++i)
-        bare += GetPixel(dc.get(), i % width, i / width) == plain ? 1 : 0;
+        bare += GetPixel(dc.get(), i % width, i / width) == kPlain ? 1 : 0;
     EXPECT_TRUE(bare > size / 5 && bare < size * 4 / 5) << bare << " pixels of background";
     SelectObject(dc.get(), before);
     freeMenuBitmaps();
