@@ -71,9 +71,10 @@ ManifestRef getCurrentManifest() noexcept
 
 void holdManifestForMenu() noexcept
 {
-    const ManifestRef current = getCurrentManifest();
-    ManifestRef previous = menuManifest.exchange(current);
-    if (previous && previous.get() != current.get())
+    ManifestRef current = getCurrentManifest();
+    const Manifest* const held = current.get();
+    ManifestRef previous = menuManifest.exchange(std::move(current));
+    if (previous && previous.get() != held)
         retiredManifest.exchange(std::move(previous));
 }
 

@@ -12,6 +12,7 @@
 namespace tavi {
 namespace {
 
+constexpr const char* kSelectManifest = "SELECT contents FROM manifest LIMIT 1";
 // Short, so that a stop request takes effect soon.
 constexpr std::uint32_t kSleepMs = 500;
 constexpr int kSleepsPerPoll = 10;
@@ -24,7 +25,7 @@ ManifestRef readStoredManifest()
     try {
         DbConnection database;
         database.open(getDataFilePath(DataFile::stateDatabase));
-        DbQuery rows = database.execQuery("SELECT contents FROM manifest LIMIT 1");
+        DbQuery rows = database.execQuery(kSelectManifest);
         if (rows.nextRow()) {
             const char* blob = nullptr;
             const int length = rows.fieldText(0, blob);

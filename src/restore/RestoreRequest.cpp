@@ -52,13 +52,14 @@ class TargetProbe {
 
 void RestoreRequestWriter::open()
 {
+    disconnect();
     try {
         connection_ = std::make_unique<DbConnection>();
         connection_->open(getDataFilePath(DataFile::stateDatabase));
         transaction_.emplace(*connection_);
     } catch (const DbException& error) {
         wxLogError("Failed to open state db for restores: %s", error.message());
-        connection_.reset();
+        disconnect();
     }
 }
 

@@ -41,6 +41,12 @@ DWORD readModulePath(wxString& path)
 
 ShellExt::ShellExt() = default;
 
+ShellExt::~ShellExt()
+{
+    // Before the destruction of the lock, after which COM may unload the module.
+    folder_.reset();
+}
+
 STDMETHODIMP ShellExt::AddPages(LPFNADDPROPSHEETPAGE addPage, LPARAM parameter)
 {
     guarded("ShellExt::AddPages", [&] { addPropertyPage(selection_, getCurrentManifest(), addPage, parameter); });

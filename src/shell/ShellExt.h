@@ -27,6 +27,7 @@ class ShellExt final
 
     // Throws DbException when the service's configuration database cannot be used.
     ShellExt();
+    ~ShellExt();
 
     STDMETHODIMP AddPages(LPFNADDPROPSHEETPAGE addPage, LPARAM parameter) override;
     STDMETHODIMP ReplacePage(EXPPS pageId, LPFNADDPROPSHEETPAGE replacePage, LPARAM parameter) override;
