@@ -43,14 +43,7 @@ class Bytes {
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t length)
 {
     Bytes input(bytes, length);
-    const std::size_t seed = input.next();
-    // From no entries to more than there are names.
-    const EntryCounter counter = [seed](const wxString& folder, bool) {
-        std::size_t sum = seed;
-        for (const wchar_t character : view(folder))
-            sum = sum * 31 + static_cast<std::size_t>(character);
-        return static_cast<std::uint32_t>(sum % 1009 % 5);
-    };
+    const EntryCounter counter = test::arbitraryEntryCounts(input.next());
     const RefPtr<PathTree> tree = PathTree::create(false, counter);
     test::PathTreeModel model(counter);
     std::set<std::wstring> asked;
