@@ -212,7 +212,7 @@ void bareWatch()
         RegistryKey key;
         wchar_t text[64];
         DWORD size = sizeof text;
-        RegOpenKeyExW(HKEY_LOCAL_MACHINE, name.wc_str(), 0, KEY_READ, key.out());
+        RegOpenKeyExW(HKEY_LOCAL_MACHINE, name.wc_str(), 0, KEY_READ | KEY_WOW64_32KEY, key.out());
         RegQueryValueExW(key.get(), L"options.manifestmtime", nullptr, nullptr, reinterpret_cast<BYTE*>(text), &size);
     }
 }
@@ -269,7 +269,7 @@ void runLink(Bench& bench)
 {
     reportMessages(bench);
     const test::InstalledService service;
-    wxRegKey settings(getSettingsKeyName());
+    wxRegKey settings = settingsKey();
     settings.Create();
     settings.SetValue(L"options.manifestmtime", L"2020-01-02 03:04:05");
     if (!readManifestTime())

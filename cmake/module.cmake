@@ -2,6 +2,9 @@
 enable_language(RC)
 
 set(CMAKE_CROSSCOMPILING_EMULATOR "${CMAKE_SOURCE_DIR}/scripts/wine-run;${CMAKE_BINARY_DIR}/wineprefix")
+if(CMAKE_SIZEOF_VOID_P EQUAL 8)
+    list(PREPEND CMAKE_CROSSCOMPILING_EMULATOR env WINEARCH=win64)
+endif()
 
 if(NOT TAVI_DEPS)
     message(FATAL_ERROR "TAVI_DEPS is not set: build with scripts/build")

@@ -4,20 +4,30 @@
 # Of the programs here and of those under Wine (scripts/wine-run sets the same).
 export LC_ALL=C.UTF-8 TZ=UTC0
 
-service_program="$build/tools/service/taviservice.exe"
-manager_program="$build/tools/filemanager/explorer.exe"
+# use_programs ARCH: the file manager and the module of that architecture, and a Wine prefix of its kind. The service is a 32-bit
+# program also on a 64-bit Windows, unless only 64-bit programs are built.
+use_programs() {
+    programs=$(build_of "$1")
+    export WINEARCH
+    WINEARCH=$(wine_of "$1")
+    manager_program="$programs/tools/filemanager/explorer.exe"
+    module="$programs/tavishell.dll"
+    service_program="$build/tools/service/taviservice.exe"
+    [ -f "$service_program" ] || service_program="$programs/tools/service/taviservice.exe"
+}
+use_programs "${arches[0]}"
 # The class of the module.
 class='{5E0C31A7-8D42-4B19-A6F3-2C7D90E1B845}'
 
 trap 'printf "error: line %s: %s\n" "$LINENO" "$BASH_COMMAND" >&2' ERR
 trap 'exit 130' INT TERM
 
-# open_session NAME: a prefix and an empty output folder below build/, for one run at a time.
+# open_session NAME: a prefix and an empty output folder in the build folder of the programs, for one run at a time.
 open_session() {
-    prefix="$build/$1-prefix"
-    out="$build/$1"
+    prefix="$programs/$1-prefix"
+    out="$programs/$1"
     mkdir -p "$out"
-    exec 7>"$build/$1.lock"
+    exec 7>"$out.lock"
     flock -n 7 || die "another scripts/$1 is running"
     rm -rf "${out:?}"/*
 }

@@ -2,9 +2,6 @@
 
 #include <cstddef>
 
-#include <windows.h>
-#include <wx/msw/registry.h>
-
 namespace tavi {
 namespace {
 
@@ -18,7 +15,7 @@ wxString filePath(const wchar_t* directoryValue, const wchar_t* const (&names)[k
     if (file >= kSize)
         return wxString();
     wxString directory;
-    const wxRegKey key(getInstallKeyName());
+    const wxRegKey key = installKey();
     if (key.Exists() && !key.QueryValue(directoryValue, directory))
         directory.clear();
     return directory + names[file];
@@ -34,6 +31,16 @@ wxString getInstallKeyName()
 wxString getSettingsKeyName()
 {
     return getInstallKeyName() + L"\\params";
+}
+
+wxRegKey installKey()
+{
+    return {getInstallKeyName(), wxRegKey::WOW64ViewMode_32};
+}
+
+wxRegKey settingsKey()
+{
+    return {getSettingsKeyName(), wxRegKey::WOW64ViewMode_32};
 }
 
 wxString getConfigFilePath(ConfigFile file)

@@ -1,12 +1,19 @@
 #pragma once
 
+#include <windows.h>
 #include <wx/string.h>
+
+#include <wx/msw/registry.h>
 
 // The paths of the backup service's files. Each call reads the registry; any thread.
 namespace tavi {
 
 wxString getInstallKeyName();
 wxString getSettingsKeyName();
+
+// The two keys. The service is a 32-bit program, so they are in the registry's 32-bit view, also for a 64-bit module.
+wxRegKey installKey();
+wxRegKey settingsKey();
 
 // The service's files, by the numbers that it uses for them.
 enum class ConfigFile { database = 0, key = 1 };

@@ -1,8 +1,6 @@
 #include "core/Options.h"
 
-#include <windows.h>
 #include <wx/datetime.h>
-#include <wx/msw/registry.h>
 
 #include "core/InstallPaths.h"
 #include "core/Log.h"
@@ -14,7 +12,7 @@ template <class Value, class Read>
 std::optional<Value> readOption(const wchar_t* name, Read read)
 {
     const LogSilencer silence;
-    wxRegKey settings(getSettingsKeyName());
+    wxRegKey settings = settingsKey();
     if (!settings.Exists())
         return std::nullopt;
     // A failed read may store a part of the value.

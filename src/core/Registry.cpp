@@ -3,15 +3,20 @@
 #include <cwchar>
 #include <vector>
 
+#include "core/Handles.h"
+
 namespace tavi {
 
 std::optional<wxString> readRegistryText(HKEY root, const wxString& path, const wxString& name)
 {
+    RegistryKey key;
+    if (RegOpenKeyExW(root, path.wc_str(), 0, kReadNative, key.out()) != ERROR_SUCCESS)
+        return std::nullopt;
     std::vector<wchar_t> buffer(MAX_PATH);
     for (;;) {
         DWORD bytes = static_cast<DWORD>(buffer.size()) * DWORD{sizeof(wchar_t)};
         const LONG result =
-            RegGetValueW(root, path.wc_str(), name.wc_str(), RRF_RT_REG_SZ, nullptr, buffer.data(), &bytes);
+            RegGetValueW(key.get(), nullptr, name.wc_str(), RRF_RT_REG_SZ, nullptr, buffer.data(), &bytes);
         if (result == ERROR_SUCCESS)
             return wxString(buffer.data(), wcsnlen(buffer.data(), bytes / sizeof(wchar_t)));
         if (result != ERROR_MORE_DATA)
@@ -24,9 +29,12 @@ std::optional<wxString> readRegistryText(HKEY root, const wxString& path, const 
 std::vector<wxString> readRegistryTexts(HKEY root, const wxString& path, const wxString& name)
 {
     std::vector<wxString> texts;
+    RegistryKey key;
+    if (RegOpenKeyExW(root, path.wc_str(), 0, kReadNative, key.out()) != ERROR_SUCCESS)
+        return texts;
     DWORD bytes = 0;
     const auto query = [&](wchar_t* into) {
-        return RegGetValueW(root, path.wc_str(), name.wc_str(), RRF_RT_REG_MULTI_SZ, nullptr, into, &bytes) ==
+        return RegGetValueW(key.get(), nullptr, name.wc_str(), RRF_RT_REG_MULTI_SZ, nullptr, into, &bytes) ==
                ERROR_SUCCESS;
     };
     if (!query(nullptr))

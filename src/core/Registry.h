@@ -8,11 +8,15 @@
 
 namespace tavi {
 
-// Reads a text value (REG_SZ, or REG_EXPAND_SZ with its references expanded). Returns nothing, and logs nothing, if the
+// Access to a key as the machine's own programs see it: on a 64-bit Windows, the 64-bit view. What Windows stores about
+// the machine is there; the 32-bit view may have another value or none.
+constexpr REGSAM kReadNative = KEY_READ | KEY_WOW64_64KEY;
+
+// Reads a text value of the native view (REG_SZ, or REG_EXPAND_SZ with its references expanded). Returns nothing, and logs nothing, if the
 // key or the value is missing or is of another type. Any thread.
 std::optional<wxString> readRegistryText(HKEY root, const wxString& path, const wxString& name);
 
-// Reads a REG_MULTI_SZ value; empty if it cannot be read. Any thread.
+// Reads a REG_MULTI_SZ value of the native view; empty if it cannot be read. Any thread.
 std::vector<wxString> readRegistryTexts(HKEY root, const wxString& path, const wxString& name);
 
 } // namespace tavi

@@ -14,8 +14,27 @@ namespace tavi {
 
 namespace {
 
+// For both kinds of programs, the shell gives a 32-bit process on a 64-bit Windows the folders of the 32-bit ones.
+std::optional<wxString> foldersOf64BitPrograms(SpecialFolder folder)
+{
+    constexpr const wchar_t* kKey = L"Software\\Microsoft\\Windows\\CurrentVersion";
+    BOOL isWow64 = FALSE;
+    if (!IsWow64Process(GetCurrentProcess(), &isWow64) || !isWow64)
+        return std::nullopt;
+    switch (folder) {
+    case SpecialFolder::programFiles:
+        return readRegistryText(HKEY_LOCAL_MACHINE, kKey, L"ProgramFilesDir");
+    case SpecialFolder::commonFiles:
+        return readRegistryText(HKEY_LOCAL_MACHINE, kKey, L"CommonFilesDir");
+    default:
+        return std::nullopt;
+    }
+}
+
 std::optional<wxString> specialFolder(SpecialFolder folder)
 {
+    if (auto other = foldersOf64BitPrograms(folder))
+        return other;
     wchar_t path[MAX_PATH] = L"";
     if (!SHGetSpecialFolderPathW(nullptr, path, static_cast<int>(folder), FALSE))
         return std::nullopt;

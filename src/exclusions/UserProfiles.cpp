@@ -70,7 +70,7 @@ std::vector<wxString> subKeys(HKEY root, const wchar_t* path)
 {
     std::vector<wxString> names;
     RegistryKey key;
-    if (RegOpenKeyExW(root, path, 0, KEY_READ, key.out()) != ERROR_SUCCESS)
+    if (RegOpenKeyExW(root, path, 0, kReadNative, key.out()) != ERROR_SUCCESS)
         return names;
     wchar_t name[256];
     for (DWORD index = 0;; ++index) {
@@ -88,7 +88,7 @@ bool readOwner(const wxString& profile, wxString& owner)
     RegistryKey key;
     BYTE sid[kMaxSidBytes];
     DWORD size = sizeof(sid);
-    if (RegOpenKeyExW(HKEY_LOCAL_MACHINE, profile.wc_str(), 0, KEY_READ, key.out()) != ERROR_SUCCESS ||
+    if (RegOpenKeyExW(HKEY_LOCAL_MACHINE, profile.wc_str(), 0, kReadNative, key.out()) != ERROR_SUCCESS ||
         RegQueryValueExW(key.get(), L"Sid", nullptr, nullptr, sid, &size) != ERROR_SUCCESS || !IsValidSid(sid))
         return false;
     LocalText text;

@@ -8,7 +8,7 @@
 TEST(Options, ValuesOfAnotherTypeAreDeletedInSilence)
 {
     const tavi::test::InstalledService service;
-    wxRegKey settings(tavi::getSettingsKeyName());
+    wxRegKey settings = tavi::settingsKey();
     settings.Create();
     tavi::test::LogCapture log;
     settings.SetValue(L"options.graylist", 2L);

@@ -29,7 +29,7 @@ struct Graylists : testing::Test {
             std::filesystem::create_directories(root.path() + name);
         // The folders of this test are below the real one.
         SetEnvironmentVariableW(L"TEMP", L"C:\\elsewhere\\..\\scratch");
-        wxRegKey(getSettingsKeyName()).Create();
+        settingsKey().Create();
         service.install().DeleteValue(L"DataPath");
         dropGraylist();
     }
@@ -46,7 +46,7 @@ TEST_F(Graylists, HoldTheSystemsPlacesAndTheUsersUnlessSwitchedOff)
 {
     service.install().SetValue(L"DataPath", L"C:\\served");
     for (const bool keeps : {true, false}) {
-        wxRegKey(getSettingsKeyName()).SetValue(L"options.graylist", long{keeps});
+        settingsKey().SetValue(L"options.graylist", long{keeps});
         getGraylist(true)->Release();
         EXPECT_TRUE(isGrayed(L"C:\\windows\\Temp\\x") && isGrayed(L"C:\\served") && isGrayed(L"C:\\scratch\\x"));
         EXPECT_TRUE(isGrayed(L"C:\\windows\\notepad.exe") == !keeps && isGrayed(here) == !keeps);

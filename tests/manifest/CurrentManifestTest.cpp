@@ -47,7 +47,7 @@ TEST_F(CurrentManifestTest, IsKeptForTheNewestMenuOnly)
     holdManifestForMenu();
     holdManifestForMenu();
     // Makes the watcher load the manifest again, within five seconds.
-    wxRegKey settings(getSettingsKeyName());
+    wxRegKey settings = settingsKey();
     settings.Create();
     settings.SetValue(L"options.manifestmtime", L"2037-01-02 03:04:05");
     EXPECT_TRUE(waitUntil([&] { return getCurrentManifest().get() != manifest; }));

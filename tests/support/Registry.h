@@ -103,7 +103,7 @@ class InstalledService {
 
   private:
     TemporaryFolder folder_;
-    wxRegKey install_{getInstallKeyName()};
+    wxRegKey install_ = installKey();
 };
 
 inline KernelHandle processToken()

@@ -2,6 +2,7 @@
 
 #include <ctime>
 #include <filesystem>
+#include <memory>
 
 #include <windows.h>
 #include <shlwapi.h>
@@ -17,10 +18,27 @@ namespace {
 constexpr wchar_t kInstallKey[] = L"Software\\Tavi";
 constexpr wchar_t kSettingsKey[] = L"Software\\Tavi\\params";
 
+struct KeyCloser {
+    using pointer = HKEY;
+    void operator()(HKEY key) const noexcept
+    {
+        RegCloseKey(key);
+    }
+};
+using Key = std::unique_ptr<HKEY, KeyCloser>;
+
+// The service that this program stands in for is a 32-bit one, whose keys are in the 32-bit view.
+constexpr REGSAM kRead = KEY_READ | KEY_WOW64_32KEY;
+constexpr REGSAM kWrite = KEY_WRITE | KEY_WOW64_32KEY;
+
 void setText(const wchar_t* key, const wchar_t* value, const std::wstring& text)
 {
-    const auto bytes = (static_cast<DWORD>(text.size()) + 1) * sizeof(wchar_t);
-    const LONG result = RegSetKeyValueW(HKEY_LOCAL_MACHINE, key, value, REG_SZ, text.c_str(), bytes);
+    const auto bytes = (static_cast<DWORD>(text.size()) + 1) * DWORD{sizeof(wchar_t)};
+    HKEY opened = nullptr;
+    LONG result = RegCreateKeyExW(HKEY_LOCAL_MACHINE, key, 0, nullptr, 0, kWrite, nullptr, &opened, nullptr);
+    const Key closing(opened);
+    if (result == ERROR_SUCCESS)
+        result = RegSetValueExW(opened, value, 0, REG_SZ, reinterpret_cast<const BYTE*>(text.c_str()), bytes);
     if (result != ERROR_SUCCESS)
         throw tools::systemFailure(std::wstring(L"cannot write HKLM\\") + key, static_cast<DWORD>(result));
 }
@@ -82,8 +100,11 @@ Installation findInstallation()
 {
     wchar_t data[MAX_PATH] = L"";
     DWORD bytes = sizeof data;
-    const LONG result =
-        RegGetValueW(HKEY_LOCAL_MACHINE, kInstallKey, L"DataPath", RRF_RT_REG_SZ, nullptr, data, &bytes);
+    HKEY opened = nullptr;
+    LONG result = RegOpenKeyExW(HKEY_LOCAL_MACHINE, kInstallKey, 0, kRead, &opened);
+    const Key closing(opened);
+    if (result == ERROR_SUCCESS)
+        result = RegGetValueW(opened, nullptr, L"DataPath", RRF_RT_REG_SZ, nullptr, data, &bytes);
     if (result != ERROR_SUCCESS || !PathRemoveFileSpecW(data))
         throw tools::Failure{L"the service is not installed on this machine"};
     return {data};
