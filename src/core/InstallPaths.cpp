@@ -2,6 +2,9 @@
 
 #include <cstddef>
 
+#include <windows.h>
+#include <wx/msw/registry.h>
+
 namespace tavi {
 namespace {
 

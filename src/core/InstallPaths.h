@@ -1,9 +1,8 @@
 #pragma once
 
-#include <windows.h>
 #include <wx/string.h>
 
-#include <wx/msw/registry.h>
+class wxRegKey;
 
 // The paths of the backup service's files. Each call reads the registry; any thread.
 namespace tavi {

@@ -1,6 +1,8 @@
 #include "core/Options.h"
 
+#include <windows.h>
 #include <wx/datetime.h>
+#include <wx/msw/registry.h>
 
 #include "core/InstallPaths.h"
 #include "core/Log.h"

@@ -12,8 +12,8 @@ namespace tavi {
 // the machine is there; the 32-bit view may have another value or none.
 constexpr REGSAM kReadNative = KEY_READ | KEY_WOW64_64KEY;
 
-// Reads a text value of the native view (REG_SZ, or REG_EXPAND_SZ with its references expanded). Returns nothing, and logs nothing, if the
-// key or the value is missing or is of another type. Any thread.
+// Reads a text value of the native view (REG_SZ, or REG_EXPAND_SZ with its references expanded). Returns nothing, and
+// logs nothing, if the key or the value is missing or is of another type. Any thread.
 std::optional<wxString> readRegistryText(HKEY root, const wxString& path, const wxString& name);
 
 // Reads a REG_MULTI_SZ value of the native view; empty if it cannot be read. Any thread.

@@ -15,6 +15,15 @@ struct HandleCloser {
 };
 using Handle = std::unique_ptr<HANDLE, HandleCloser>;
 
+struct KeyCloser {
+    using pointer = HKEY;
+    void operator()(HKEY key) const noexcept
+    {
+        RegCloseKey(key);
+    }
+};
+using RegistryKey = std::unique_ptr<HKEY, KeyCloser>;
+
 // Returns a manual-reset event that is not signalled.
 inline Handle createEvent()
 {

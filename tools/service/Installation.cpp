@@ -2,11 +2,11 @@
 
 #include <ctime>
 #include <filesystem>
-#include <memory>
 
 #include <windows.h>
 #include <shlwapi.h>
 
+#include "common/Handle.h"
 #include "common/Text.h"
 #include "Database.h"
 #include "History.h"
@@ -18,15 +18,6 @@ namespace {
 constexpr wchar_t kInstallKey[] = L"Software\\Tavi";
 constexpr wchar_t kSettingsKey[] = L"Software\\Tavi\\params";
 
-struct KeyCloser {
-    using pointer = HKEY;
-    void operator()(HKEY key) const noexcept
-    {
-        RegCloseKey(key);
-    }
-};
-using Key = std::unique_ptr<HKEY, KeyCloser>;
-
 // The service that this program stands in for is a 32-bit one, whose keys are in the 32-bit view.
 constexpr REGSAM kRead = KEY_READ | KEY_WOW64_32KEY;
 constexpr REGSAM kWrite = KEY_WRITE | KEY_WOW64_32KEY;
@@ -36,7 +27,7 @@ void setText(const wchar_t* key, const wchar_t* value, const std::wstring& text)
     const auto bytes = (static_cast<DWORD>(text.size()) + 1) * DWORD{sizeof(wchar_t)};
     HKEY opened = nullptr;
     LONG result = RegCreateKeyExW(HKEY_LOCAL_MACHINE, key, 0, nullptr, 0, kWrite, nullptr, &opened, nullptr);
-    const Key closing(opened);
+    const tools::RegistryKey closing(opened);
     if (result == ERROR_SUCCESS)
         result = RegSetValueExW(opened, value, 0, REG_SZ, reinterpret_cast<const BYTE*>(text.c_str()), bytes);
     if (result != ERROR_SUCCESS)
@@ -102,7 +93,7 @@ Installation findInstallation()
     DWORD bytes = sizeof data;
     HKEY opened = nullptr;
     LONG result = RegOpenKeyExW(HKEY_LOCAL_MACHINE, kInstallKey, 0, kRead, &opened);
-    const Key closing(opened);
+    const tools::RegistryKey closing(opened);
     if (result == ERROR_SUCCESS)
         result = RegGetValueW(opened, nullptr, L"DataPath", RRF_RT_REG_SZ, nullptr, data, &bytes);
     if (result != ERROR_SUCCESS || !PathRemoveFileSpecW(data))
