@@ -26,6 +26,22 @@ FunctionEnd
 
 # --- files
 
+# With _?= the uninstaller can run in its own folder, and NSIS keeps it open in a way that prevents renaming it. A silent run reads
+# nothing more from that file, because the plug-in is unpacked: close it.
+Function un.ReleaseOwnFile
+    StrCpy $1 4
+    ${DoWhile} $1 < 0x1000
+        System::Call 'kernel32::GetFinalPathNameByHandleW(p r1, w.r2, i ${NSIS_MAX_STRLEN}, i 0)i.r3'
+        ${If} $3 > 0
+        ${AndIf} $3 < ${NSIS_MAX_STRLEN}
+        ${AndIf} $2 == "\\?\$EXEPATH"
+            System::Call 'kernel32::CloseHandle(p r1)'
+        ${EndIf}
+        # Handles are multiples of 4.
+        IntOp $1 $1 + 4
+    ${Loop}
+FunctionEnd
+
 Function un.SetFilesAside
     StrCpy $9 "$INSTDIR\${MODULE32}"
     ${Try} un.SetFileAside done
@@ -34,6 +50,13 @@ Function un.SetFilesAside
     StrCpy $9 "$INSTDIR\${NOTICES}"
     ${Try} un.SetFileAside done
     StrCpy $9 "$INSTDIR\${UNINSTALLER}"
+    ${If} $9 == $EXEPATH
+        ${IfNot} ${Silent}
+            ${Log} "Stays, since it is running: $9"
+            Return
+        ${EndIf}
+        Call un.ReleaseOwnFile
+    ${EndIf}
     ${Try} un.SetFileAside done
     done:
 FunctionEnd
