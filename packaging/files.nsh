@@ -102,6 +102,10 @@ FunctionEnd
 Function ${UN}RemoveFolder
     StrCpy $4 $Scheduled
     StrCpy $Scheduled 0
+    Call ${UN}GetKind
+    ${If} $1 != folder
+        Return
+    ${EndIf}
     ClearErrors
     RMDir $0
     ${IfNot} ${Errors}
@@ -109,10 +113,6 @@ Function ${UN}RemoveFolder
         Return
     ${EndIf}
     ClearErrors
-    Call ${UN}GetKind
-    ${If} $1 != folder
-        Return
-    ${EndIf}
     StrCpy $1 0
     FindFirst $2 $3 "$0\*.*"
     ${DoUntil} $3 == ""

@@ -83,17 +83,16 @@ Function DescribeRun
         StrCpy $0 "Warning: the Tavi Remote Backup service is not installed."
         ${Log} "$0 Until it is, the file manager stops for 30 seconds each time it loads the extension."
     ${EndIf}
-    ${If} $OldVersion == ""
-        ${Log} "No version is in the list of programs"
-    ${Else}
+    ${If} $OldVersion != ""
         ${VersionCompare} "${VERSION}" $OldVersion $0
         ${If} $0 = 0
-            ${Log} "Repairing version $OldVersion in $OldFolder"
+            StrCpy $0 "this version"
         ${ElseIf} $0 = 1
-            ${Log} "Upgrading from version $OldVersion in $OldFolder"
+            StrCpy $0 "the older version $OldVersion"
         ${Else}
-            ${Log} "Replacing the newer version $OldVersion in $OldFolder"
+            StrCpy $0 "the newer version $OldVersion"
         ${EndIf}
+        ${Log} "Found in the list of programs: $0 in $OldFolder"
     ${EndIf}
     StrCpy $Index ${VALUE_PATH}
     Call DescribeRegistration
@@ -192,6 +191,8 @@ Function UniteFolders
         StrCpy $0 $INSTDIR
         Call IdentifyFolder
         ${If} $1 == $9
+        ${AndIf} $INSTDIR != $OldFolder
+            ${Log} "$INSTDIR is the same folder as $OldFolder"
             StrCpy $INSTDIR $OldFolder
         ${EndIf}
     ${EndIf}
@@ -386,7 +387,7 @@ FunctionEnd
 Function RemoveOldFiles
     StrCpy $Folder $INSTDIR
     Call SweepFolder
-    StrCpy $FinishNote "It is available in each window of the file manager that you open from now on."
+    StrCpy $FinishNote "The command appears in all windows of the file manager that you open from now on."
     ${If} $Scheduled > 0
         StrCpy $FinishNote "A program still uses the old version. The file manager will use the new one when it starts the next time,"
         StrCpy $FinishNote "$FinishNote for example after you have signed out and in again. There is no need to restart the computer."
@@ -430,6 +431,7 @@ Function RollBack
 FunctionEnd
 
 Section
+    AddSize ${INSTALLED_KB}
     Call ChooseFolder
     Call DescribeRun
     ${Try} SaveRegistry unchanged

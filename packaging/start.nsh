@@ -7,7 +7,10 @@ Function ${UN}WriteLog
     Push $2
     Push $3
     ${If} $0 != ""
+        # The progress page shows the lines of the log only.
+        SetDetailsPrint both
         DetailPrint $0
+        SetDetailsPrint none
     ${EndIf}
     ${If} $LogFile != ""
         System::Call 'kernel32::GetDateFormatW(i 0x7f, i 0, p 0, w "yyyy-MM-dd", w.r1, i ${NSIS_MAX_STRLEN})'
