@@ -27,6 +27,8 @@ Var HasModule64
 Var LogFile
 # The first error, as a sentence; empty if there is none.
 Var Failure
+# The failure that made the run put everything back; $Failure then is that of the putting back.
+Var Cause
 # The code of the last file operation, 0 for success.
 Var WinError
 # Output of DescribeError.
@@ -84,6 +86,28 @@ Var IsLogEnded
 !macroend
 !define Undo "!insertmacro Undo"
 !define BeginUndo "Push begin"
+
+# ${BeginRollback}, ${EndFailedRun} DONE: before and after the steps are undone. DONE: what has failed, as in "could not be DONE".
+!macro BeginRollback
+    ${Log} "Putting back what was there before"
+    StrCpy $Cause $Failure
+    StrCpy $Failure ""
+!macroend
+!define BeginRollback "!insertmacro BeginRollback"
+!macro EndFailedRun DONE
+    SetErrorLevel ${EXIT_FAILED}
+    StrCpy $0 ${EXIT_FAILED}
+    ${CallShared} EndLog
+    StrCpy $0 "Everything is as it was before."
+    ${If} $Cause == ""
+        StrCpy $Cause $Failure
+    ${ElseIf} $Failure != ""
+        StrCpy $0 "Not everything could be put back: $Failure"
+    ${EndIf}
+    MessageBox MB_OK|MB_ICONSTOP "${PRODUCT} could not be ${DONE}.$\n$\n$Cause$\n$\n$0$\n$\nDetails: $LogFile" /SD IDOK
+    Abort "${PRODUCT} could not be ${DONE}. $Cause"
+!macroend
+!define EndFailedRun "!insertmacro EndFailedRun"
 
 # The folder of the product: that of this run, or the one that it leaves.
 Var Folder

@@ -154,8 +154,10 @@ Function ${UN}ClearFolder
     StrCpy $Scheduled 0
     StrCpy $0 "$Folder\${MODULE64}"
     Call ${UN}Sweep
-    StrCpy $0 "$Folder\x64"
-    Call ${UN}RemoveFolder
+    ${If} $HasModule64 != ""
+        StrCpy $0 "$Folder\x64"
+        Call ${UN}RemoveFolder
+    ${EndIf}
     StrCpy $0 "$Folder\${MODULE32}"
     Call ${UN}Sweep
     StrCpy $0 "$Folder\${NOTICES}"

@@ -8,6 +8,7 @@ Function .onInit
     StrCpy $0 "Setup of ${PRODUCT} ${VERSION}"
     Call Start
     Call ReadEntry
+    Call ReadFolderSwitch
     Call ChooseFolder
     # Nothing of this program may keep a folder of the product in use.
     SetOutPath $TEMP
@@ -53,6 +54,18 @@ Function ReadEntry
         Call FullPath
         StrCpy $OldFolder $0
     ${EndIf}
+FunctionEnd
+
+# Takes the folder of /D= as it is: NSIS ignores one that it finds invalid, and the setup would use the default instead.
+Function ReadFolderSwitch
+    System::Call 'kernel32::GetCommandLineW()w.r0'
+    ${DoUntil} $0 == ""
+        StrCpy $1 $0 4
+        StrCmpS $1 " /D=" 0 +3
+            StrCpy $INSTDIR $0 "" 4
+            Return
+        StrCpy $0 $0 "" 1
+    ${Loop}
 FunctionEnd
 
 Function ChooseFolder
@@ -186,10 +199,10 @@ Function UniteFolders
     ${EndIf}
     ${If} $OldFolder != ""
         StrCpy $0 $OldFolder
-        Call IdentifyFolder
+        Call Identify
         StrCpy $9 $1
         StrCpy $0 $INSTDIR
-        Call IdentifyFolder
+        Call Identify
         ${If} $1 == $9
         ${AndIf} $INSTDIR != $OldFolder
             ${Log} "$INSTDIR is the same folder as $OldFolder"
@@ -198,8 +211,8 @@ Function UniteFolders
     ${EndIf}
 FunctionEnd
 
-# What is the same for all spellings of the folder $0, to $1.
-Function IdentifyFolder
+# What is the same for all spellings of the file or folder $0, to $1.
+Function Identify
     StrCpy $1 $0
     # FILE_SHARE of all kinds, OPEN_EXISTING, FILE_FLAG_BACKUP_SEMANTICS, which opens folders.
     System::Call 'kernel32::CreateFileW(w r0, i 0, i 7, p 0, i 3, i 0x02000000, p 0)p.r2'
@@ -417,17 +430,26 @@ Function SetOldFileAside
     ${If} $1 != file
         Return
     ${EndIf}
+    # One of the folders can be the other's folder x64.
+    Call Identify
+    StrCpy $8 $0
+    StrCpy $9 $1
+    StrCpy $0 "$INSTDIR\${MODULE32}"
+    Call Identify
+    ${If} $1 == $9
+        Return
+    ${EndIf}
+    StrCpy $0 "$INSTDIR\${MODULE64}"
+    Call Identify
+    ${If} $1 == $9
+        Return
+    ${EndIf}
+    StrCpy $0 $8
     Call SetAside
     ${If} $AsidePath == ""
         Call DescribeError
         ${Log} "Stays, since it is in use: $0: $ErrorText"
     ${EndIf}
-FunctionEnd
-
-Function RollBack
-    ${Log} "Putting back what was there before"
-    Call UndoFiles
-    Call RestoreRegistry
 FunctionEnd
 
 Section
@@ -446,12 +468,9 @@ Section
     Return
 
     failed:
-    Call RollBack
+    ${BeginRollback}
+    Call UndoFiles
+    Call RestoreRegistry
     unchanged:
-    SetErrorLevel ${EXIT_FAILED}
-    StrCpy $0 ${EXIT_FAILED}
-    Call EndLog
-    StrCpy $0 "${PRODUCT} could not be installed. Everything is as it was before."
-    MessageBox MB_OK|MB_ICONSTOP "$0$\n$\n$Failure$\n$\nDetails: $LogFile" /SD IDOK
-    Abort "The installation failed: $Failure"
+    ${EndFailedRun} "installed"
 SectionEnd

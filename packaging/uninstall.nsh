@@ -161,23 +161,17 @@ Section Uninstall
     ${Try} un.SaveRegistry unchanged
     ${BeginUndo}
     ${Try} un.SetFilesAside failed
-    ${Try} un.UnregisterModules restore
-    ${Try} un.DeleteEntry restore
+    ${Try} un.UnregisterModules failed
+    ${Try} un.DeleteEntry failed
     Call un.AnnounceChange
     StrCpy $Folder $INSTDIR
     Call un.ClearFolder
     Return
 
-    restore:
-    Call un.RestoreRegistry
     failed:
-    ${Log} "Putting back what was there before"
+    ${BeginRollback}
+    Call un.RestoreRegistry
     Call un.UndoFiles
     unchanged:
-    SetErrorLevel ${EXIT_FAILED}
-    StrCpy $0 ${EXIT_FAILED}
-    Call un.EndLog
-    StrCpy $0 "${PRODUCT} could not be uninstalled. Everything is as it was before."
-    MessageBox MB_OK|MB_ICONSTOP "$0$\n$\n$Failure$\n$\nDetails: $LogFile" /SD IDOK
-    Abort "The uninstallation failed: $Failure"
+    ${EndFailedRun} "uninstalled"
 SectionEnd
