@@ -63,7 +63,7 @@ Var IsLogEnded
 # ${FailWithError} TEXT: the same, with the message of the last file operation.
 !macro FailWithError TEXT
     ${CallShared} DescribeError
-    ${Fail} `${TEXT}: $ErrorText`
+    ${Fail} `${TEXT}: $ErrorText.`
 !macroend
 !define FailWithError "!insertmacro FailWithError"
 
@@ -104,7 +104,10 @@ Var IsLogEnded
     ${ElseIf} $Failure != ""
         StrCpy $0 "Not everything could be put back: $Failure"
     ${EndIf}
-    MessageBox MB_OK|MB_ICONSTOP "${PRODUCT} could not be ${DONE}.$\n$\n$Cause$\n$\n$0$\n$\nDetails: $LogFile" /SD IDOK
+    ${If} $LogFile != ""
+        StrCpy $0 "$0$\n$\nDetails: $LogFile"
+    ${EndIf}
+    MessageBox MB_OK|MB_ICONSTOP "${PRODUCT} could not be ${DONE}.$\n$\n$Cause$\n$\n$0" /SD IDOK
     Abort "${PRODUCT} could not be ${DONE}. $Cause"
 !macroend
 !define EndFailedRun "!insertmacro EndFailedRun"

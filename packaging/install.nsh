@@ -171,7 +171,7 @@ Function CreateFolders
     StrLen $0 $INSTDIR
     # The longest name is that of an old 64-bit module; the limit of Windows is 260.
     ${If} $0 > 220
-        ${Fail} "The name of the folder is too long: $INSTDIR"
+        ${Fail} "The name of the folder is too long: $INSTDIR."
         Return
     ${EndIf}
     StrCpy $0 $INSTDIR
@@ -261,7 +261,7 @@ Function CopyFile
     StrCpy $0 $9
     Call GetKind
     ${If} $1 == folder
-        ${Fail} "$9 cannot be written: it is a folder"
+        ${Fail} "$9 cannot be written: it is a folder."
         Return
     ${EndIf}
     ${Undo} delete "$9.new" ""
@@ -347,7 +347,7 @@ Function CheckValue
         ${If} $Root = ${HKEY_MACHINE}
             StrCpy $0 HKLM
         ${EndIf}
-        ${Fail} '$Module could not be registered: $0\$Key, value "$ValueName" is "$Value" instead of "$Expected"'
+        ${Fail} '$Module could not be registered: $0\$Key, value "$ValueName" is "$Value" instead of "$Expected".'
     ${EndIf}
 FunctionEnd
 
@@ -374,7 +374,7 @@ Function WriteEntry
     WriteRegDWORD HKLM "${UNINSTALL_KEY}" "NoModify" 1
     WriteRegDWORD HKLM "${UNINSTALL_KEY}" "NoRepair" 1
     ${If} ${Errors}
-        ${Fail} "The entry in the list of programs cannot be written: HKLM\${UNINSTALL_KEY}"
+        ${Fail} "The entry in the list of programs cannot be written: HKLM\${UNINSTALL_KEY}."
     ${Else}
         ${Log} "Written: the entry in the list of programs"
     ${EndIf}

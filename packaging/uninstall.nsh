@@ -149,7 +149,7 @@ Function un.DeleteEntry
     ClearErrors
     DeleteRegKey HKLM "${UNINSTALL_KEY}"
     ${If} ${Errors}
-        ${Fail} "The entry in the list of programs cannot be deleted: HKLM\${UNINSTALL_KEY}"
+        ${Fail} "The entry in the list of programs cannot be deleted: HKLM\${UNINSTALL_KEY}."
         Return
     ${EndIf}
     ${Log} "Deleted: the entry in the list of programs"
