@@ -25,6 +25,9 @@ Var Is64BitWindows
 Var HasModule64
 # The path of the log; empty if it cannot be written.
 Var LogFile
+# The version and folder of the entry in the list of programs; empty without one.
+Var OldVersion
+Var OldFolder
 # The first error, as a sentence; empty if there is none.
 Var Failure
 # The failure that made the run put everything back; $Failure then is that of the putting back.
@@ -45,6 +48,16 @@ Var IsLogEnded
     !endif
 !macroend
 !define CallShared "!insertmacro CallShared"
+
+# ${UseNativeView}: the next instructions see the registry as a program of the word size of Windows does.
+!macro UseNativeView
+    ${If} $Is64BitWindows != ""
+        SetRegView 64
+    ${Else}
+        SetRegView 32
+    ${EndIf}
+!macroend
+!define UseNativeView "!insertmacro UseNativeView"
 
 # ${Log} TEXT: writes a line to the log and to the details of the progress page.
 !macro Log TEXT

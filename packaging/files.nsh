@@ -16,6 +16,34 @@ Function ${UN}GetKind
     ${EndIf}
 FunctionEnd
 
+# What is the same for all spellings of the file or folder $0, to $1; the path itself if there is none.
+Function ${UN}Identify
+    # All kinds of sharing, OPEN_EXISTING, FILE_FLAG_BACKUP_SEMANTICS, which opens folders.
+    System::Call 'kernel32::CreateFileW(w r0, i 0, i 7, p 0, i 3, i 0x02000000, p 0)p.r2'
+    StrCpy $1 $0
+    ${If} $2 <> -1
+        Call ${UN}IdentifyHandle
+        System::Call 'kernel32::CloseHandle(p r2)'
+    ${EndIf}
+FunctionEnd
+
+# The same for the open file $2, to $1; empty if it is no file.
+Function ${UN}IdentifyHandle
+    StrCpy $1 ""
+    System::Alloc 52
+    Pop $3
+    # BY_HANDLE_FILE_INFORMATION has the serial number of the volume at 28 and the number of the file at 44.
+    System::Call 'kernel32::GetFileInformationByHandle(p r2, p r3)i.r4'
+    ${If} $4 <> 0
+        IntOp $4 $3 + 28
+        System::Call '*$4(i.r5)'
+        IntOp $4 $3 + 44
+        System::Call '*$4(i.r6, i.r7)'
+        StrCpy $1 "$5:$6:$7"
+    ${EndIf}
+    System::Free $3
+FunctionEnd
+
 # Renames the file $0 to $1.
 Function ${UN}RenameFile
     System::Call 'kernel32::MoveFileExW(w r0, w r1, i ${MOVEFILE_WRITE_THROUGH})i.r2 ?e'
@@ -134,12 +162,12 @@ Function ${UN}RemoveFolder
     ${EndIf}
 FunctionEnd
 
-!if "${UN}" == ""
-# Deletes the renamed files in $Folder.
-Function ${UN}SweepFolder
-    StrCpy $Scheduled 0
+# Deletes the renamed files of the 64-bit module, and of the others, in $Folder.
+Function ${UN}SweepFolder64
     StrCpy $0 "$Folder\${MODULE64}"
     Call ${UN}Sweep
+FunctionEnd
+Function ${UN}SweepFolder
     StrCpy $0 "$Folder\${MODULE32}"
     Call ${UN}Sweep
     StrCpy $0 "$Folder\${NOTICES}"
@@ -147,23 +175,16 @@ Function ${UN}SweepFolder
     StrCpy $0 "$Folder\${UNINSTALLER}"
     Call ${UN}Sweep
 FunctionEnd
-!endif
 
 # Deletes the renamed files in $Folder, and the folders if they are empty then.
 Function ${UN}ClearFolder
     StrCpy $Scheduled 0
-    StrCpy $0 "$Folder\${MODULE64}"
-    Call ${UN}Sweep
+    Call ${UN}SweepFolder64
     ${If} $HasModule64 != ""
         StrCpy $0 "$Folder\x64"
         Call ${UN}RemoveFolder
     ${EndIf}
-    StrCpy $0 "$Folder\${MODULE32}"
-    Call ${UN}Sweep
-    StrCpy $0 "$Folder\${NOTICES}"
-    Call ${UN}Sweep
-    StrCpy $0 "$Folder\${UNINSTALLER}"
-    Call ${UN}Sweep
+    Call ${UN}SweepFolder
     StrCpy $0 $Folder
     Call ${UN}RemoveFolder
 FunctionEnd

@@ -1,9 +1,5 @@
 # The installation.
 
-# The version and folder of the entry in the list of programs; empty without one.
-Var OldVersion
-Var OldFolder
-
 Function .onInit
     StrCpy $0 "Setup of ${PRODUCT} ${VERSION}"
     Call Start
@@ -35,26 +31,6 @@ Function .onInstFailed
 FunctionEnd
 
 # --- what is there
-
-!macro UseNativeView
-    ${If} $Is64BitWindows != ""
-        SetRegView 64
-    ${Else}
-        SetRegView 32
-    ${EndIf}
-!macroend
-
-Function ReadEntry
-    !insertmacro UseNativeView
-    ReadRegStr $OldVersion HKLM "${UNINSTALL_KEY}" "DisplayVersion"
-    ReadRegStr $OldFolder HKLM "${UNINSTALL_KEY}" "InstallLocation"
-    ClearErrors
-    ${If} $OldFolder != ""
-        StrCpy $0 $OldFolder
-        Call FullPath
-        StrCpy $OldFolder $0
-    ${EndIf}
-FunctionEnd
 
 # Takes the folder of /D= as it is: NSIS ignores one that it finds invalid, and the setup would use the default instead.
 Function ReadFolderSwitch
@@ -186,52 +162,7 @@ Function CreateFolders
             Return
         ${EndIf}
     ${EndIf}
-    Call UniteFolders
-FunctionEnd
-
-# One folder can have two spellings, such as a short name. The installed one stays, or the old files would be deleted as another
-# folder's.
-Function UniteFolders
-    System::Call 'kernel32::GetLongPathNameW(w "$INSTDIR", w.r0, i ${NSIS_MAX_STRLEN})i.r1'
-    ${If} $1 > 0
-    ${AndIf} $1 < ${NSIS_MAX_STRLEN}
-        StrCpy $INSTDIR $0
-    ${EndIf}
-    ${If} $OldFolder != ""
-        StrCpy $0 $OldFolder
-        Call Identify
-        StrCpy $9 $1
-        StrCpy $0 $INSTDIR
-        Call Identify
-        ${If} $1 == $9
-        ${AndIf} $INSTDIR != $OldFolder
-            ${Log} "$INSTDIR is the same folder as $OldFolder"
-            StrCpy $INSTDIR $OldFolder
-        ${EndIf}
-    ${EndIf}
-FunctionEnd
-
-# What is the same for all spellings of the file or folder $0, to $1.
-Function Identify
-    StrCpy $1 $0
-    # FILE_SHARE of all kinds, OPEN_EXISTING, FILE_FLAG_BACKUP_SEMANTICS, which opens folders.
-    System::Call 'kernel32::CreateFileW(w r0, i 0, i 7, p 0, i 3, i 0x02000000, p 0)p.r2'
-    ${If} $2 = -1
-        Return
-    ${EndIf}
-    # BY_HANDLE_FILE_INFORMATION: the serial number of the volume is at 28, the number of the file at 44.
-    System::Alloc 52
-    Pop $3
-    System::Call 'kernel32::GetFileInformationByHandle(p r2, p r3)i.r4'
-    ${If} $4 <> 0
-        IntOp $4 $3 + 28
-        System::Call '*$4(i.r5)'
-        IntOp $4 $3 + 44
-        System::Call '*$4(i.r6, i.r7)'
-        StrCpy $1 "$5:$6:$7"
-    ${EndIf}
-    System::Free $3
-    System::Call 'kernel32::CloseHandle(p r2)'
+    Call UseInstalledSpelling
 FunctionEnd
 
 # ${ForEachNewFile} FUNCTION: calls the function with $8, the unpacked file, and $9, its final path, until it fails.
@@ -361,7 +292,7 @@ Function WriteEntry
     Call AddFileSize
     StrCpy $0 "$INSTDIR\${UNINSTALLER}"
     Call AddFileSize
-    !insertmacro UseNativeView
+    ${UseNativeView}
     ClearErrors
     WriteRegStr HKLM "${UNINSTALL_KEY}" "DisplayName" "${PRODUCT}"
     WriteRegStr HKLM "${UNINSTALL_KEY}" "DisplayVersion" "${VERSION}"
@@ -399,6 +330,8 @@ FunctionEnd
 # From here on nothing fails: the new version is in place. What is left of an old one does no harm.
 Function RemoveOldFiles
     StrCpy $Folder $INSTDIR
+    StrCpy $Scheduled 0
+    Call SweepFolder64
     Call SweepFolder
     StrCpy $FinishNote "The command appears in all windows of the file manager that you open from now on."
     ${If} $Scheduled > 0

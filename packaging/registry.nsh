@@ -230,6 +230,42 @@ Function ${UN}DeleteValue
     ${EndIf}
 FunctionEnd
 
+# Reads the version and the folder from the list of programs.
+Function ${UN}ReadEntry
+    ${UseNativeView}
+    ReadRegStr $OldVersion HKLM "${UNINSTALL_KEY}" "DisplayVersion"
+    ReadRegStr $OldFolder HKLM "${UNINSTALL_KEY}" "InstallLocation"
+    ClearErrors
+    ${If} $OldFolder != ""
+        StrCpy $0 $OldFolder
+        Call ${UN}FullPath
+        StrCpy $OldFolder $0
+    ${EndIf}
+FunctionEnd
+
+# One folder can have two spellings, such as a short name. $INSTDIR takes that of the list of programs; otherwise the setup would delete
+# the old files as another folder's, and the uninstaller would not recognize its registration.
+Function ${UN}UseInstalledSpelling
+    System::Call 'kernel32::GetLongPathNameW(w "$INSTDIR", w.r0, i ${NSIS_MAX_STRLEN})i.r1'
+    ${If} $1 > 0
+    ${AndIf} $1 < ${NSIS_MAX_STRLEN}
+        StrCpy $INSTDIR $0
+    ${EndIf}
+    ${If} $OldFolder == ""
+    ${OrIf} $OldFolder == $INSTDIR
+        Return
+    ${EndIf}
+    StrCpy $0 $OldFolder
+    Call ${UN}Identify
+    StrCpy $9 $1
+    StrCpy $0 $INSTDIR
+    Call ${UN}Identify
+    ${If} $1 == $9
+        ${Log} "$INSTDIR is the same folder as $OldFolder"
+        StrCpy $INSTDIR $OldFolder
+    ${EndIf}
+FunctionEnd
+
 # Tells the file manager to read the registration anew.
 Function ${UN}AnnounceChange
     System::Call 'shell32::SHChangeNotify(i 0x08000000, i 0, p 0, p 0)'

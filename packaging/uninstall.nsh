@@ -10,6 +10,8 @@ Function un.onInit
     StrCpy $0 $INSTDIR
     Call un.FullPath
     StrCpy $INSTDIR $0
+    Call un.ReadEntry
+    Call un.UseInstalledSpelling
     # Nothing of this program may keep a folder of the product in use.
     SetOutPath $TEMP
 FunctionEnd
@@ -29,17 +31,26 @@ FunctionEnd
 # With _?= the uninstaller can run in its own folder, and NSIS keeps it open in a way that prevents renaming it. A silent run reads
 # nothing more from that file, because the plug-in is unpacked: close it.
 Function un.ReleaseOwnFile
-    StrCpy $1 4
-    ${DoWhile} $1 < 0x1000
-        System::Call 'kernel32::GetFinalPathNameByHandleW(p r1, w.r2, i ${NSIS_MAX_STRLEN}, i 0)i.r3'
-        ${If} $3 > 0
-        ${AndIf} $3 < ${NSIS_MAX_STRLEN}
-        ${AndIf} $2 == "\\?\$EXEPATH"
-            System::Call 'kernel32::CloseHandle(p r1)'
+    StrCpy $0 $EXEPATH
+    Call un.Identify
+    StrCpy $9 $1
+    # Standard handles belong to the caller; a question about a pipe can block.
+    System::Call 'kernel32::GetStdHandle(i -10)p.R0'
+    System::Call 'kernel32::GetStdHandle(i -11)p.R1'
+    System::Call 'kernel32::GetStdHandle(i -12)p.R2'
+    # Handles are multiples of 4.
+    ${For} $2 4 4096
+        ${If} $2 <> $R0
+        ${AndIf} $2 <> $R1
+        ${AndIf} $2 <> $R2
+            Call un.IdentifyHandle
+            ${If} $1 == $9
+                System::Call 'kernel32::CloseHandle(p r2)'
+                Return
+            ${EndIf}
         ${EndIf}
-        # Handles are multiples of 4.
-        IntOp $1 $1 + 4
-    ${Loop}
+        IntOp $2 $2 + 3
+    ${Next}
 FunctionEnd
 
 Function un.SetFilesAside
@@ -49,18 +60,33 @@ Function un.SetFilesAside
     ${Try} un.SetFileAside done
     StrCpy $9 "$INSTDIR\${NOTICES}"
     ${Try} un.SetFileAside done
-    StrCpy $9 "$INSTDIR\${UNINSTALLER}"
-    ${If} $9 == $EXEPATH
+    Call un.IsRunningInPlace
+    ${If} $0 != ""
         ${IfNot} ${Silent}
-            ${Log} "Stays, since it is running: $9"
+            ${Log} "Stays, since it is running: $EXEPATH"
             Return
         ${EndIf}
         Call un.ReleaseOwnFile
     ${EndIf}
+    StrCpy $9 "$INSTDIR\${UNINSTALLER}"
     ${Try} un.SetFileAside done
     done:
 FunctionEnd
 
+# Whether this program is the installed uninstaller, not its copy in the temporary folder, to $0.
+Function un.IsRunningInPlace
+    StrCpy $0 $EXEPATH
+    Call un.Identify
+    StrCpy $9 $1
+    StrCpy $0 "$INSTDIR\${UNINSTALLER}"
+    Call un.Identify
+    StrCpy $0 ""
+    ${If} $1 == $9
+        StrCpy $0 yes
+    ${EndIf}
+FunctionEnd
+
+# Renames the file $9, if there is one.
 Function un.SetFileAside
     StrCpy $0 $9
     Call un.GetKind
@@ -134,18 +160,12 @@ FunctionEnd
 # --- the entry in the list of programs
 
 Function un.DeleteEntry
-    ${If} $Is64BitWindows != ""
-        SetRegView 64
-    ${Else}
-        SetRegView 32
-    ${EndIf}
-    ReadRegStr $0 HKLM "${UNINSTALL_KEY}" "InstallLocation"
-    ${If} $0 == ""
-    ${OrIf} $0 != $INSTDIR
+    ${If} $OldFolder == ""
+    ${OrIf} $OldFolder != $INSTDIR
         ${Log} "The list of programs has no entry of this folder"
-        ClearErrors
         Return
     ${EndIf}
+    ${UseNativeView}
     ClearErrors
     DeleteRegKey HKLM "${UNINSTALL_KEY}"
     ${If} ${Errors}
