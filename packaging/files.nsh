@@ -53,7 +53,7 @@ Function ${UN}RenameFile
     ${EndIf}
 FunctionEnd
 
-# Renames the file $0 to the first free name NAME.N.old. A file that is not there is none to rename.
+# Renames the file $0 to the first free name NAME.N.old. Without such a file, it does nothing and succeeds.
 Function ${UN}SetAside
     StrCpy $AsidePath ""
     StrCpy $WinError 0
@@ -116,6 +116,7 @@ Function ${UN}Sweep
                 ${Log} "Deleted: $0"
             ${EndIf}
         ${EndIf}
+        ClearErrors
         FindNext $8 $9
         ${If} ${Errors}
             StrCpy $9 ""
@@ -192,7 +193,6 @@ FunctionEnd
 # Takes back the recorded steps, the last one first.
 Function ${UN}UndoFiles
     ${Do}
-        # The function's own values stay in variables: the stack holds the records.
         Pop $5
         ${If} $5 == begin
             ${Break}
@@ -221,10 +221,10 @@ Function ${UN}UndoFiles
     ClearErrors
 FunctionEnd
 
-# Deletes the file $0, or renames it if a program has loaded it meanwhile.
+# Deletes the file $0, or renames it if a program has loaded it in the meantime.
 Function ${UN}DeleteNewFile
     Call ${UN}GetKind
-    ${If} $1 == none
+    ${If} $1 != file
         Return
     ${EndIf}
     ClearErrors

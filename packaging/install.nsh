@@ -195,6 +195,12 @@ Function CopyFile
         ${Fail} "$9 cannot be written: it is a folder."
         Return
     ${EndIf}
+    StrCpy $0 "$9.new"
+    Call GetKind
+    ${If} $1 == folder
+        ${Fail} "$0 cannot be written: it is a folder."
+        Return
+    ${EndIf}
     ${Undo} delete "$9.new" ""
     System::Call 'kernel32::CopyFileW(w r8, w "$9.new", i 0)i.r0 ?e'
     Pop $WinError
@@ -241,26 +247,20 @@ Function RegisterModules
     ${EndIf}
 FunctionEnd
 
-# Runs the tool that registers modules, of the word size of $View. $0: its options and the module. A registration that failed may end
-# with code 0, so the caller reads the registry.
-Function RunRegistrationTool
-    StrCpy $1 "$SYSDIR\regsvr32.exe"
+# Registers $Module in $View, by the tool of that word size. The tool may end with code 0 although the registration has failed, so
+# the registry decides.
+Function RegisterModule
+    StrCpy $0 "$SYSDIR\regsvr32.exe"
     ${If} $View = ${VIEW_64}
-        # The system folder that a 32-bit program sees holds the 32-bit tool.
-        StrCpy $1 "$WINDIR\Sysnative\regsvr32.exe"
+        # Windows shows a 32-bit program the 32-bit system folder.
+        StrCpy $0 "$WINDIR\Sysnative\regsvr32.exe"
     ${EndIf}
-    ${Log} "Running: $1 $0"
-    nsExec::Exec /TIMEOUT=120000 '"$1" $0'
+    ${Log} 'Running: $0 /s "$Module"'
+    nsExec::Exec /TIMEOUT=120000 '"$0" /s "$Module"'
     Pop $0
     ${If} $0 != 0
         ${Log} "The registration tool ended with: $0"
     ${EndIf}
-FunctionEnd
-
-# Registers $Module in $View.
-Function RegisterModule
-    StrCpy $0 '/s "$Module"'
-    Call RunRegistrationTool
     ${If} $View = ${VIEW_64}
         ${ForEachValue64} 0 ${VALUE_APPROVED} CheckValue
     ${Else}
