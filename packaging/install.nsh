@@ -23,7 +23,7 @@ FunctionEnd
 # Also called after an error of NSIS itself, which stops the section: the files could not be unpacked, and nothing was changed yet.
 Function .onInstFailed
     SetErrorLevel ${EXIT_FAILED}
-    ${If} $Failure == ""
+    ${If} $IsLogEnded == ""
         ${Fail} "The files could not be unpacked to $PLUGINSDIR. Is the disk full?"
     ${EndIf}
     StrCpy $0 ${EXIT_FAILED}
@@ -109,7 +109,7 @@ Function UnpackFiles
     File "/oname=$PLUGINSDIR\third-party-notices.txt" "third-party-notices.txt"
     WriteUninstaller "$PLUGINSDIR\uninstall.exe"
     ${If} ${Errors}
-        ${Fail} "The files cannot be unpacked to $PLUGINSDIR. Is the disk full?"
+        ${Fail} "The files could not be unpacked to $PLUGINSDIR. Is the disk full?"
     ${EndIf}
 FunctionEnd
 
