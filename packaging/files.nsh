@@ -21,15 +21,9 @@ Function ${UN}Identify
     # All kinds of sharing, OPEN_EXISTING, FILE_FLAG_BACKUP_SEMANTICS, which opens folders.
     System::Call 'kernel32::CreateFileW(w r0, i 0, i 7, p 0, i 3, i 0x02000000, p 0)p.r2'
     StrCpy $1 $0
-    ${If} $2 <> -1
-        Call ${UN}IdentifyHandle
-        System::Call 'kernel32::CloseHandle(p r2)'
+    ${If} $2 = -1
+        Return
     ${EndIf}
-FunctionEnd
-
-# The same for the open file $2, to $1; empty if it is no file.
-Function ${UN}IdentifyHandle
-    StrCpy $1 ""
     System::Alloc 52
     Pop $3
     # BY_HANDLE_FILE_INFORMATION has the serial number of the volume at 28 and the number of the file at 44.
@@ -42,6 +36,7 @@ Function ${UN}IdentifyHandle
         StrCpy $1 "$5:$6:$7"
     ${EndIf}
     System::Free $3
+    System::Call 'kernel32::CloseHandle(p r2)'
 FunctionEnd
 
 # Renames the file $0 to $1.

@@ -28,31 +28,6 @@ FunctionEnd
 
 # --- files
 
-# With _?= the uninstaller can run in its own folder, and NSIS keeps it open in a way that prevents renaming it. A silent run reads
-# nothing more from that file, because the plug-in is unpacked: close it.
-Function un.ReleaseOwnFile
-    StrCpy $0 $EXEPATH
-    Call un.Identify
-    StrCpy $9 $1
-    # Standard handles belong to the caller; a question about a pipe can block.
-    System::Call 'kernel32::GetStdHandle(i -10)p.R0'
-    System::Call 'kernel32::GetStdHandle(i -11)p.R1'
-    System::Call 'kernel32::GetStdHandle(i -12)p.R2'
-    # Handles are multiples of 4.
-    ${For} $2 4 4096
-        ${If} $2 <> $R0
-        ${AndIf} $2 <> $R1
-        ${AndIf} $2 <> $R2
-            Call un.IdentifyHandle
-            ${If} $1 == $9
-                System::Call 'kernel32::CloseHandle(p r2)'
-                Return
-            ${EndIf}
-        ${EndIf}
-        IntOp $2 $2 + 3
-    ${Next}
-FunctionEnd
-
 Function un.SetFilesAside
     StrCpy $9 "$INSTDIR\${MODULE32}"
     ${Try} un.SetFileAside done
@@ -62,18 +37,16 @@ Function un.SetFilesAside
     ${Try} un.SetFileAside done
     Call un.IsRunningInPlace
     ${If} $0 != ""
-        ${IfNot} ${Silent}
-            ${Log} "Stays, since it is running: $EXEPATH"
-            Return
-        ${EndIf}
-        Call un.ReleaseOwnFile
+        # NSIS keeps its file open in a way that prevents renaming.
+        ${Log} "Stays, since it is running: $EXEPATH"
+        Return
     ${EndIf}
     StrCpy $9 "$INSTDIR\${UNINSTALLER}"
     ${Try} un.SetFileAside done
     done:
 FunctionEnd
 
-# Whether this program is the installed uninstaller, not its copy in the temporary folder, to $0.
+# Whether this program is the installed uninstaller, which _?= runs in place, and not its copy in the temporary folder, to $0.
 Function un.IsRunningInPlace
     StrCpy $0 $EXEPATH
     Call un.Identify
