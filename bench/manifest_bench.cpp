@@ -14,6 +14,9 @@
 namespace tavi::bench {
 namespace {
 
+// The heap of a 64-bit process costs more for each of its blocks.
+constexpr bool k64Bit = sizeof(void*) == 8;
+
 // The least work of any reader: inflates the blob into 64 KB and drops the text. Throws unless it has `expected` bytes.
 void inflateOnly(std::vector<char>& blob, std::uint64_t expected)
 {
@@ -60,11 +63,12 @@ void memoryFigures(Bench& bench, std::uint32_t files, FileOrder order)
     const auto bytes = bench.inOwnProcess("manifest", {std::to_string(files), text.file});
     const double textBytes = static_cast<double>(text.textBytes);
     bench.report("peak of a load, blob included / text" + text.title, bytes[0] / textBytes, 1.05, "x");
-    bench.report("resident after a load, without the blob / text" + text.title, bytes[1] / textBytes, 0.55, "x");
+    bench.report("resident after a load, without the blob / text" + text.title, bytes[1] / textBytes,
+                 k64Bit ? 0.6 : 0.55, "x");
     bench.report("peak of a reload, old manifest held / text" + text.title, bytes[2] / textBytes, 1.6, "x");
     bench.report("peak of a reload" + text.title, bytes[2] / 1e6, kNoBound, "MB");
-    // A file manager may have no more than this, so the figures above must not come from a larger address space.
-    bench.report("address space" + text.title, bytes[3] / 1e6, 2048 * 1.048576, "MB");
+    // A 32-bit file manager may have no more than this, so its figures above must not come from a larger address space.
+    bench.report("address space" + text.title, bytes[3] / 1e6, k64Bit ? kNoBound : 2048 * 1.048576, "MB");
 }
 
 void questionFigures(Bench& bench)
