@@ -164,6 +164,7 @@ case_by_hand() {
     gone=''
     expect "an installation beside it" "$there"$'\n'"$(installed "$version")"
     expect "its uninstallation" "$there" 0 "$(uninstall)"
+    rm -r "$c/By Hand" "$c/Program Files/Tavi"
 }
 regsvr() { [ "$1" = 64 ] && echo 'C:\windows\system32\regsvr32.exe /s' || echo 'C:\windows\syswow64\regsvr32.exe /s'; } # BITS
 
