@@ -30,6 +30,17 @@ case_fresh() {
     check "the uninstaller's part of the log" 2 "$(grep -c 'exit code 0' "$default_log")"
 }
 
+# The same input gives the same bytes, wherever and whenever.
+case_reproducible() {
+    (
+        umask 077
+        export TZ=NZST-12
+        touch -d '2001-02-03' "$work/modules/$version-32.dll"
+        package "$version" again
+    )
+    cmp "$shared/current.exe" "$shared/again.exe"
+}
+
 case_again() {
     expect "an older version" "$(installed $old_version)" 0 "$old"
     expect "an upgrade" "$(installed "$version")" 0 "$current"

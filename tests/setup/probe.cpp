@@ -1,11 +1,10 @@
 // Run under Wine by setup_test.
-//   probe registry FILE FILE           saves HKEY_LOCAL_MACHINE and HKEY_CURRENT_USER as Wine stores them, with the
-//   keys of
-//                                      both word sizes, and prints what the next start renames or deletes
-//   probe pages CAPTION [BUTTON ...]   waits for a window whose caption begins with CAPTION and presses its buttons by
-//   their
-//                                      numbers, each when its page is there and the button enabled; prints the texts
-//                                      shown
+//   probe registry FILE FILE
+//     Saves HKEY_LOCAL_MACHINE and HKEY_CURRENT_USER as Wine stores them, with the keys of both word sizes, and prints
+//     what the next start renames or deletes.
+//   probe pages CAPTION [BUTTON ...]
+//     Waits for a window whose caption begins with CAPTION and presses its buttons by their numbers, each when its page
+//     is there and the button enabled; prints the texts shown.
 
 #include <cstdio>
 #include <cstdlib>
