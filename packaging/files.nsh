@@ -16,7 +16,8 @@ Function ${UN}GetKind
     ${EndIf}
 FunctionEnd
 
-# What is the same for all spellings of the file or folder $0, to $1; the path itself if there is none.
+# Stores in $1 what identifies the file or folder $0 whatever the spelling of its path (volume and file number), or the path itself
+# if there is no such file.
 Function ${UN}Identify
     # All kinds of sharing, OPEN_EXISTING, FILE_FLAG_BACKUP_SEMANTICS, which opens folders.
     System::Call 'kernel32::CreateFileW(w r0, i 0, i 7, p 0, i 3, i 0x02000000, p 0)p.r2'
@@ -39,13 +40,21 @@ Function ${UN}Identify
     System::Call 'kernel32::CloseHandle(p r2)'
 FunctionEnd
 
-# Renames the file $0 to $1.
+# Renames the file $0 to $1. Repeats that for a second: a virus scanner may have a new file open, and the uninstaller that has started
+# this copy may not have ended.
 Function ${UN}RenameFile
-    System::Call 'kernel32::MoveFileExW(w r0, w r1, i ${MOVEFILE_WRITE_THROUGH})i.r2 ?e'
-    Pop $WinError
-    ${If} $2 <> 0
-        StrCpy $WinError 0
-    ${EndIf}
+    ${For} $5 1 10
+        System::Call 'kernel32::MoveFileExW(w r0, w r1, i ${MOVEFILE_WRITE_THROUGH})i.r2 ?e'
+        Pop $WinError
+        ${If} $2 <> 0
+            StrCpy $WinError 0
+        ${EndIf}
+        ${If} $WinError <> ${ERROR_ACCESS_DENIED}
+        ${AndIf} $WinError <> ${ERROR_SHARING_VIOLATION}
+            Return
+        ${EndIf}
+        Sleep 100
+    ${Next}
 FunctionEnd
 
 # Renames the file $0 to the first free name NAME.N.old. Without such a file, it does nothing and succeeds.
@@ -71,6 +80,7 @@ Function ${UN}SetAside
     Call ${UN}RenameFile
     ${If} $WinError = 0
         StrCpy $AsidePath $1
+        ${Log} "Renamed: $0 to $1"
     ${EndIf}
 FunctionEnd
 
@@ -188,17 +198,21 @@ FunctionEnd
 # Takes back the recorded steps, the last one first.
 Function ${UN}UndoFiles
     ${Do}
-        Pop $5
-        ${If} $5 == begin
+        ClearErrors
+        Pop $8
+        ${If} ${Errors}
+        ${OrIf} $8 == begin
             ${Break}
         ${EndIf}
         Pop $0
         Pop $1
-        ${Switch} $5
+        ${Switch} $8
             ${Case} move
                 Call ${UN}RenameFile
                 ${If} $WinError <> 0
                     ${FailWithError} "$1 cannot be put back"
+                ${Else}
+                    ${Log} "Put back: $1"
                 ${EndIf}
                 ${Break}
             ${Case} delete

@@ -4,10 +4,13 @@ Function .onInit
     StrCpy $0 "Setup of ${PRODUCT} ${VERSION}"
     Call Start
     Call ReadEntry
-    Call ReadFolderSwitch
+    ${If} $INSTDIR == ""
+        Call ReadFolderSwitch
+    ${EndIf}
     Call ChooseFolder
-    # Nothing of this program may keep a folder of the product in use.
-    SetOutPath $TEMP
+    # The current folder: nothing of this program keeps a folder of the product in use, and a program that it starts loads no library
+    # from a folder that others can write.
+    SetOutPath $WINDIR
 FunctionEnd
 
 Function OnCancel
@@ -72,6 +75,10 @@ Function DescribeRun
         StrCpy $0 "Warning: the Tavi Remote Backup service is not installed."
         ${Log} "$0 Until it is, the file manager stops for 30 seconds each time it loads the extension."
     ${EndIf}
+    ${If} $Is64BitWindows != ""
+    ${AndIf} $HasModule64 == ""
+        ${Log} "Warning: the file manager of this Windows cannot load x86 modules. Only the 32-bit module is installed."
+    ${EndIf}
     ${If} $OldVersion != ""
         ${VersionCompare} "${VERSION}" $OldVersion $0
         ${If} $0 = 0
@@ -99,7 +106,8 @@ Function DescribeRegistration
     ${EndIf}
 FunctionEnd
 
-# The files are unpacked before anything is changed: NSIS stops the section if it cannot write them, as on a full disk.
+# The files are unpacked before anything is changed: NSIS stops the section if it cannot write them, as on a full disk. The plug-in that
+# runs the registration tool is one of them; NSIS does not unpack it again at its first call.
 Function UnpackFiles
     InitPluginsDir
     ClearErrors
@@ -107,6 +115,7 @@ Function UnpackFiles
     File "/oname=$PLUGINSDIR\tavishell32.dll" "tavishell32.dll"
     File "/oname=$PLUGINSDIR\tavishell64.dll" "tavishell64.dll"
     File "/oname=$PLUGINSDIR\third-party-notices.txt" "third-party-notices.txt"
+    File "/oname=$PLUGINSDIR\nsExec.dll" "${NSISDIR}\Plugins\x86-unicode\nsExec.dll"
     WriteUninstaller "$PLUGINSDIR\uninstall.exe"
     ${If} ${Errors}
         ${Fail} "The files could not be unpacked to $PLUGINSDIR. Is the disk full?"
@@ -145,7 +154,7 @@ FunctionEnd
 
 Function CreateFolders
     StrLen $0 $INSTDIR
-    # The longest name is that of an old 64-bit module; the limit of Windows is 260.
+    # The longest name, that of the renamed notices, has 30 characters; the limit of Windows is 260.
     ${If} $0 > 220
         ${Fail} "The name of the folder is too long: $INSTDIR."
         Return
@@ -334,6 +343,10 @@ Function RemoveOldFiles
     Call SweepFolder64
     Call SweepFolder
     StrCpy $FinishNote "The command appears in all windows of the file manager that you open from now on."
+    ${If} $Is64BitWindows != ""
+    ${AndIf} $HasModule64 == ""
+        StrCpy $FinishNote "On this computer, the command appears in 32-bit file managers only."
+    ${EndIf}
     ${If} $Scheduled > 0
         StrCpy $FinishNote "A program still uses the old version. The file manager will use the new one when it starts the next time,"
         StrCpy $FinishNote "$FinishNote for example after you have signed out and in again. There is no need to restart the computer."

@@ -173,10 +173,15 @@ Function ${UN}SaveValue
         Pop $5
         System::Call 'advapi32::RegQueryValueExW(p r1, w "$ValueName", p 0, p 0, p r5, *i r4)i.r0'
         System::Call '*$9(i 2, i r3, i r4, p r5)'
-    ${Else}
+    ${ElseIf} $0 = ${ERROR_FILE_NOT_FOUND}
         System::Call '*$9(i 1, i 0, i 0, p 0)'
+        StrCpy $0 0
     ${EndIf}
     System::Call 'advapi32::RegCloseKey(p r1)'
+    ${If} $0 <> 0
+        StrCpy $WinError $0
+        ${FailWithError} "The registry value $Key $ValueName cannot be read"
+    ${EndIf}
 FunctionEnd
 
 Function ${UN}RestoreRegistry
@@ -187,14 +192,21 @@ FunctionEnd
 Function ${UN}RestoreValue
     Call ${UN}FindSaved
     System::Call '*$9(i.r6, i.r3, i.r4, p.r5)'
-    ${If} $6 <> 2
+    ${If} $6 = 0
         Call ${UN}DeleteValue
         Return
     ${EndIf}
     IntOp $2 ${READ_WRITE_ACCESS} | $View
     System::Call 'advapi32::RegCreateKeyExW(p $Root, w "$Key", i 0, p 0, i 0, i r2, p 0, *p.r1, p 0)i.r0'
     ${If} $0 = 0
-        System::Call 'advapi32::RegSetValueExW(p r1, w "$ValueName", i 0, i r3, p r5, i r4)i.r0'
+        ${If} $6 = 2
+            System::Call 'advapi32::RegSetValueExW(p r1, w "$ValueName", i 0, i r3, p r5, i r4)i.r0'
+        ${Else}
+            System::Call 'advapi32::RegDeleteValueW(p r1, w "$ValueName")i.r0'
+            ${If} $0 = ${ERROR_FILE_NOT_FOUND}
+                StrCpy $0 0
+            ${EndIf}
+        ${EndIf}
         System::Call 'advapi32::RegCloseKey(p r1)'
     ${EndIf}
     ${If} $0 <> 0

@@ -44,7 +44,7 @@ VIAddVersionKey ProductName "${PRODUCT}"
 VIAddVersionKey ProductVersion "${VERSION}"
 
 !ifdef SIGN
-    !uninstfinalize '${SIGN} "%1"' = 0
+    !uninstfinalize '"${SIGN}" "%1"' = 0
 !endif
 
 !include LogicLib.nsh

@@ -12,8 +12,8 @@ Function un.onInit
     StrCpy $INSTDIR $0
     Call un.ReadEntry
     Call un.UseInstalledSpelling
-    # Nothing of this program may keep a folder of the product in use.
-    SetOutPath $TEMP
+    # The current folder, as for the setup.
+    SetOutPath $WINDIR
 FunctionEnd
 
 Function un.OnCancel
@@ -81,8 +81,18 @@ Function un.IsRegistrationForeign
     Call un.SelectValue
     Call un.ReadText
     StrCpy $0 ""
-    ${If} $Value != ""
-    ${AndIf} $Value != $Module
+    ${If} $Value == ""
+    ${OrIf} $Value == $Module
+        Return
+    ${EndIf}
+    # Our file may be registered under another spelling of its path.
+    StrCpy $0 $Value
+    Call un.Identify
+    StrCpy $9 $1
+    StrCpy $0 $Module
+    Call un.Identify
+    StrCpy $0 ""
+    ${If} $1 != $9
         ${Log} "Stays registered, since it is not in the folder of this version: $Value"
         StrCpy $0 yes
     ${EndIf}
@@ -118,7 +128,10 @@ Function un.UnregisterModules
         ${ForEachValue64} ${VALUE_FIRST_HANDLER} ${VALUE_LAST_HANDLER} un.DeleteHandler
     ${EndIf}
     ${If} $Failure == ""
-        ${Log} "Deleted: the registration"
+        ${If} $IsForeign32 == ""
+        ${OrIf} $IsForeign64 == ""
+            ${Log} "Deleted: the registration"
+        ${EndIf}
     ${EndIf}
 FunctionEnd
 
@@ -138,14 +151,10 @@ Function un.DeleteEntry
         ${Log} "The list of programs has no entry of this folder"
         Return
     ${EndIf}
-    ${UseNativeView}
-    ClearErrors
-    DeleteRegKey HKLM "${UNINSTALL_KEY}"
-    ${If} ${Errors}
-        ${Fail} "The entry in the list of programs cannot be deleted: HKLM\${UNINSTALL_KEY}."
-        Return
+    ${ForEachValue} ${FIRST_ENTRY_VALUE} ${LAST_VALUE} un.DeleteValue
+    ${If} $Failure == ""
+        ${Log} "Deleted: the entry in the list of programs"
     ${EndIf}
-    ${Log} "Deleted: the entry in the list of programs"
 FunctionEnd
 
 Section Uninstall
