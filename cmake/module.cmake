@@ -1,10 +1,8 @@
 # The Windows build: the product as a library, the module, tests, the programs that stand in for the platform, benchmarks.
 enable_language(RC)
 
-set(CMAKE_CROSSCOMPILING_EMULATOR "${CMAKE_SOURCE_DIR}/scripts/wine-run;${CMAKE_BINARY_DIR}/wineprefix")
-if(CMAKE_SIZEOF_VOID_P EQUAL 8)
-    list(PREPEND CMAKE_CROSSCOMPILING_EMULATOR env WINEARCH=win64)
-endif()
+math(EXPR bits "8 * ${CMAKE_SIZEOF_VOID_P}")
+set(CMAKE_CROSSCOMPILING_EMULATOR env WINEARCH=win${bits} ${CMAKE_SOURCE_DIR}/scripts/wine-run ${CMAKE_BINARY_DIR}/wineprefix)
 
 if(NOT TAVI_DEPS)
     message(FATAL_ERROR "TAVI_DEPS is not set: build with scripts/build")

@@ -1,5 +1,5 @@
-// Makes every allocation of a 64-bit test program lie above 4 GB: a pointer that code cuts to 32 bits must not pass by
-// chance, and Wine places heaps below 4 GB while there is room.
+// Makes what a 64-bit test program allocates from the C heap or the kernel lie above 4 GB: a pointer that code cuts to
+// 32 bits must not pass by chance, and Wine places heaps below 4 GB while there is room.
 #ifdef _WIN64
 #include <cstdint>
 #include <cstdio>
