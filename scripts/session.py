@@ -68,7 +68,8 @@ class Program:
             output, errors = (files.enter_context(open(path, "wb")) for path in (self.output_file, self.errors_file))
             source = files.enter_context(open(script, "rb")) if script else subprocess.PIPE
             # A group of its own: scripts/wine-run may still be at work with other programs when this one is killed.
-            self.process = subprocess.Popen(command, stdin=source, stdout=output, stderr=errors, env=environment, start_new_session=True)
+            self.process = subprocess.Popen(command, stdin=source, stdout=output, stderr=errors, env=environment,
+                                            start_new_session=True)
 
     def output(self):
         """Returns the complete lines that the program has printed."""
@@ -127,7 +128,7 @@ class Program:
 
 
 class Session:
-    """The programs in one prefix, whose output goes to files in the folder `out`. All end with the session, as does Wine's server."""
+    """The programs in one prefix. They print to files in the folder `out` and end with the session, as does Wine's server."""
 
     def __init__(self, prefix, out, arch="i686"):
         """The architecture is that of the file manager and of the prefix: a 64-bit Windows runs programs of both word sizes."""
@@ -175,10 +176,11 @@ class Session:
                 code = program.wait(timeout)
             finally:
                 program.kill()
-            text, errors = (path.read_text(encoding="utf-8", errors="replace") for path in (program.output_file, program.errors_file))
-        if code is None or check and code != 0:
-            raise Failure(f"{' '.join(map(str, command))}: {f'still running after {timeout} s' if code is None else f'exit code {code}'}\n{text}{errors}")
-        return subprocess.CompletedProcess(command, code, text, errors)
+            text = program.output_file.read_text(encoding="utf-8", errors="replace")
+            if code is None or check and code != 0:
+                end = f"still running after {timeout} s" if code is None else f"exit code {code}"
+                raise Failure(f"{' '.join(map(str, command))}: {end}\n{text}{program.errors()}")
+            return subprocess.CompletedProcess(command, code, text, program.errors())
 
     def service_program(self):
         """Returns the service, a 32-bit program also on a 64-bit Windows, unless only 64-bit programs are built."""
