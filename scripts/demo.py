@@ -11,7 +11,7 @@ import shutil
 import subprocess
 import time
 
-from session import MODULE_CLASS, Failure, Session, build, build_of, root, run, wait_for
+from session import MODULE_CLASS, Failure, Session, build, build_of, make, root, run, wait_for
 
 # For the worst machine.
 LIMIT_S = 120
@@ -413,9 +413,6 @@ def main():
     parser.add_argument("--stay", action="store_true")
     options = parser.parse_args()
     word_size = {"i686": "x86", "x86_64": "x64"}[options.arch]
-
-    def make(arch, script, *words):
-        subprocess.run([root / "scripts" / script, *words], env=os.environ | {"TAVISHELL_ARCH": arch}, check=True)
 
     chapter("the build")
     make(options.arch, "build", "tavishell", "filemanager")

@@ -48,6 +48,11 @@ def build_of(arch):
     return build if arch == "i686" else build / arch
 
 
+def make(arch, script, *words):
+    """Runs a script of this folder for one architecture, or for both."""
+    subprocess.run([root / "scripts" / script, *words], env=os.environ | {"TAVISHELL_ARCH": arch}, check=True)
+
+
 def wait_for(seconds, what, predicate):
     """Calls the predicate until it returns a true value, and returns that."""
     end = time.monotonic() + seconds
@@ -153,12 +158,16 @@ class Session:
 
     def __exit__(self, *_):
         previous = {number: signal.signal(number, signal.SIG_IGN) for number in (signal.SIGINT, signal.SIGTERM)}
-        for program in self.programs:
-            program.kill()
-        self.stop_server()
+        self.end()
         self.lock.close()
         for number, handler in previous.items():
             signal.signal(number, handler)
+
+    def end(self):
+        for program in self.programs:
+            program.kill()
+        self.programs.clear()
+        self.stop_server()
 
     def stop_server(self):
         """Ends Wine's server and thereby every program of the prefix."""
