@@ -1,3 +1,4 @@
+# shellcheck shell=bash disable=SC2034
 # Shared by the scripts of this folder; sourced, never run.
 set -euo pipefail
 root=$(cd "$(dirname "${BASH_SOURCE[0]}")/.." && pwd)
@@ -27,22 +28,5 @@ wine_of() { [ "$1" = i686 ] && echo win32 || echo win64; }
 
 # once_more COMMAND...: runs a command that uses the network, twice if need be. A second failure is no hiccup of a mirror.
 once_more() { timeout 1200 "$@" || { say "failed, trying once more: $*" >&2; sleep 5; timeout 1200 "$@"; }; }
-
-# need_packages PACKAGE...: installs what is missing, unless TAVISHELL_INSTALL=0 declines that.
-need_packages() {
-    local missing=() package
-    for package in "$@"; do
-        dpkg-query -W -f='${db:Status-Status}\n' "$package" 2>/dev/null | grep -q '^installed$' || missing+=("$package")
-    done
-    [ ${#missing[@]} -eq 0 ] && return 0
-    [ "${TAVISHELL_INSTALL:-1}" != 0 ] || die "these system packages are missing, and TAVISHELL_INSTALL=0 declines to install them: ${missing[*]}"
-    say "installing system packages (TAVISHELL_INSTALL=0 declines this): ${missing[*]}" >&2
-    dpkg --print-foreign-architectures | grep -qx i386 || dpkg --add-architecture i386
-    # A mirror may refuse one index, such as i386's of the security archive, while all others are fine: the install decides.
-    once_more apt-get update -q >/dev/null 2>&1 || true
-    # One release for both architectures: multiarch packages must agree on their version.
-    DEBIAN_FRONTEND=noninteractive once_more apt-get install -q -y -t bookworm --no-install-recommends "${missing[@]}" \
-        >"$cache/apt.log" 2>&1 || { tail -20 "$cache/apt.log" >&2; die "these packages could not be installed: ${missing[*]}"; }
-}
 
 mkdir -p "$cache"
