@@ -8,6 +8,7 @@
 
 Prints a table of figures and their bounds; fails when a figure is out of bounds. --short runs every kind for less than a minute."""
 import argparse
+import collections
 import contextlib
 import itertools
 import operator
@@ -34,17 +35,6 @@ def positive(text):
     return int(text)
 
 
-def parse():
-    parser = argparse.ArgumentParser(usage=__doc__)
-    parser.add_argument("kinds", nargs="*", choices=[*KINDS, []])
-    length = parser.add_mutually_exclusive_group()
-    length.add_argument("--minutes", type=positive)
-    length.add_argument("--rounds", type=positive)
-    parser.add_argument("--short", action="store_true")
-    parser.add_argument("--seed", type=positive, default=random.randint(1, 99999))
-    return parser.parse_args()
-
-
 def samples(host):
     """Returns the minimum of three counts in a row each: a thread that starts, or a pipe that is opened, is no growth."""
     counts = [[int(number) for number in line[:4]] for line in COUNTS.findall(host.output())]
@@ -55,33 +45,34 @@ def counts(between="wait 0"):
     return ["counts", "wait 400", between, "counts", "wait 400", between, "counts"]
 
 
-# --- windows that a user opens and closes
+# --- windows that a user opens and closes: FILE is one with versions, MS and WAY are chosen at random
 
-def opening(window):
-    """Returns the commands that open a window of the module."""
-    select = f"select file{random.randint(1, 8)}.txt"
-    return {
-        "menu": lambda: [select, "menu", f"wait {random.randrange(700)}"],
-        "dialog": lambda: [select, "retry 60000 | invoke Restore Previous Version"],
-        "question": lambda: opening("dialog") + ["retry 20000 | click Restore Files | 1003"],
-        "progress": lambda: opening("question") + ["retry 20000 | click Tavi Remote Backup | 6",
-                                                   "wait-closed Restore Files | 30000"],
-        "page": lambda: [select, f"retry 60000 | page {MODULE_CLASS}"],
-        "asking-page": lambda: opening("page") + ["retry 20000 | click Properties | 1003"],
-    }[window]()
+DIALOG = "select FILE", "retry 60000 | invoke Restore Previous Version"
+QUESTION = *DIALOG, "retry 20000 | click Restore Files | 1003"
+PAGE = "select FILE", f"retry 60000 | page {MODULE_CLASS}"
+OPENING = {"menu": ("select FILE", "menu", "wait MS"),
+           "dialog": DIALOG,
+           "question": QUESTION,
+           "progress": (*QUESTION, "retry 20000 | click Tavi Remote Backup | 6", "wait-closed Restore Files | 60000"),
+           "page": PAGE,
+           "asking-page": (*PAGE, "retry 20000 | click Properties | 1003")}
+CLOSING = {"menu": (),
+           "dialog": ("retry 20000 | click Restore Files | 2",),
+           "question": ("retry 20000 | click Tavi Remote Backup | 2",),
+           # The service's report of the end may have closed it.
+           "progress": ("try retry 2500 | click Restoring... | WAY",),
+           "page": ("retry 20000 | click Properties | 2",),
+           "asking-page": ("retry 20000 | click Tavi Remote Backup | 2",)}
 
 
-def closing(window):
-    """Returns the commands that close it."""
-    return {
-        "menu": [],
-        "dialog": ["retry 20000 | click Restore Files | 2"],
-        "question": ["retry 20000 | click Tavi Remote Backup | 2"],
-        "asking-page": ["retry 20000 | click Tavi Remote Backup | 2"],
-        # The service's report of the end may have closed it.
-        "progress": [f"try retry 2500 | click Restoring... | {random.choice((2, 8))}"],
-        "page": ["retry 20000 | " + random.choice(("close-window Properties", "click Properties | 2"))],
-    }[window]
+def opening(*windows):
+    file, pause = f"file{random.randint(1, 8)}.txt", str(random.randrange(700))
+    return [command.replace("FILE", file).replace("MS", pause) for window in windows for command in OPENING[window]]
+
+
+def closing(*windows):
+    way = str(random.choice((2, 8)))
+    return [command.replace("WAY", way) for window in windows for command in CLOSING[window]]
 
 
 def first_time():
@@ -89,14 +80,13 @@ def first_time():
     # A command must not find a window that is about to close.
     settled = [f"wait-closed {title} | 60000" for title in ("Tavi Remote Backup", "Restore Files", "Properties")]
     commands = []
-    for window in ("dialog", "question", "page", "asking-page"):
-        commands += opening(window) + ["wait 1500"] + closing(window)
-        # Behind its question is the page.
-        commands += (closing("page") if window == "asking-page" else []) + settled
-    commands += opening("progress") + opening("dialog") + opening("question") + ["wait 1500"]
+    # Behind its question is the page.
+    for window, *behind in (("dialog",), ("question",), ("page",), ("asking-page", "page")):
+        commands += opening(window) + ["wait 1500"] + closing(window, *behind) + settled
     # The first click on a dialog may have reached that of the question, at its end.
-    commands += closing("question") + closing("dialog") + ["wait 1500", "try click Restore Files | 2"]
-    return commands + closing("progress") + settled + ["wait-closed Restoring... | 60000"]
+    commands += opening("progress", "dialog", "question") + ["wait 1500"] + closing("question", "dialog")
+    commands += ["wait 1500", "try click Restore Files | 2"] + closing("progress") + settled
+    return commands + ["wait-closed Restoring... | 60000"]
 
 
 class Run:
@@ -106,7 +96,7 @@ class Run:
         self.session, self.options = session, options
         self.folder = session.drive / "tavi-endure"
         self.state = self.folder / "service/data/tavistate.dat"
-        self.figures, self.kind, self.service_output = [], "", None
+        self.figures, self.kind = [], ""
 
     def length(self, full, short, per_minute):
         """Returns the number of rounds to run."""
@@ -255,15 +245,13 @@ class Run:
     def unload_round():
         windows = "menu", "menu", "dialog", "question", "progress", "page", "asking-page"
         one, two = random.choice(windows), random.choice(windows)
+        # `progress` waits until no dialog is open, so it comes first.
+        opened = [two, one] if two == "progress" else [one, two]
         if one == two or random.randrange(3) or "page" in one + two:
-            two = None
-        if two == "progress":
-            # It waits until no dialog is open, so it comes first.
-            one, two = two, one
-        commands = opening(one) + ([f"wait {random.randrange(100)}", *opening(two)] if two else [])
-        commands += [f"wait {random.randrange(500)}", "unload tavishell.dll"]
-        # The second window is in front.
-        commands += (closing(two) if two else []) + closing(one)
+            opened = [one]
+        commands = opening(opened[0]) + [f"wait {random.randrange(100)}"] + opening(*opened[1:])
+        # The last window is in front.
+        commands += [f"wait {random.randrange(500)}", "unload tavishell.dll"] + closing(*reversed(opened))
         return commands + random.choice(([], [f"wait {random.randrange(700)}"])) + [UNLOAD]
 
     @staticmethod
@@ -271,8 +259,7 @@ class Run:
         windows = [window for window in ("menu", "progress", "dialog", "page", "question") if random.randrange(3)]
         windows += [] if random.randrange(4) else ["asking-page"]
         code = random.choice((0, 7))
-        commands = [command for window in windows for command in opening(window)]
-        return commands + [f"wait {random.randrange(900)}", f"exit {code}" if code else "exit"], code
+        return opening(*windows) + [f"wait {random.randrange(900)}", f"exit {code}" if code else "exit"], code
 
     def run_unload(self):
         count = self.length(1000, 8, 30)
@@ -318,14 +305,11 @@ class Run:
         files, count = 30000, self.length(200, 6, 15)
         self.machine(files)
         journal = self.state.with_name(self.state.name + "-journal")
-        done = dict.fromkeys(("before", "middle", "hot", "after", "late", "unsound", "wrong"), 0)
+        done = collections.Counter()
 
-        def journal_bytes():
-            return journal.read_bytes() if journal.exists() else b""
-
-        def is_hot():
-            """A journal is hot once its header is not zero: the database itself has changed."""
-            return journal_bytes()[:1].strip(b"\0") != b""
+        def journal_start():
+            """Returns the first byte; one that is not zero says that the database itself has changed, that the journal is hot."""
+            return journal.read_bytes()[:1] if journal.exists() else b""
 
         def requests_written():
             return self.sql("SELECT count(*) FROM restores")[0][0]
@@ -338,7 +322,7 @@ class Run:
                             "retry 20000 | click Restore Files | 1003", "wait-window Tavi Remote Backup | 60000"):
                 host.order(command)
             # The module has opened the database by now.
-            done["late"] += is_hot()
+            done["late"] += journal_start() not in (b"", b"\0")
             done["unsound"] += self.sql("PRAGMA integrity_check") != [("ok",)]
             check = self.sql("""
                 SELECT (SELECT count(*) FROM restores), (SELECT count(*) FROM restores r
@@ -353,18 +337,18 @@ class Run:
                 self.sql("DELETE FROM restore_files")
                 self.sql("DELETE FROM restores")
                 requests = 0
-            start = time.monotonic()
+            sent = time.monotonic()
             host.send("click Tavi Remote Backup | 6")
             if number == 0:
                 wait_for(120, "the request", requests_written)
-                took = time.monotonic() - start
+                took = time.monotonic() - sent
             else:
                 # Round i waits for a random moment in the i-th part of 1.3 times the duration of the writing.
                 time.sleep((number - 1 + random.random()) * 1.3 * took / count)
             host.kill()
-            if journal_bytes():
+            if start := journal_start():
                 done["middle"] += 1
-                done["hot"] += is_hot()
+                done["hot"] += start != b"\0"
             elif requests_written() > requests:
                 done["after"] += 1
                 requests += 1
@@ -481,7 +465,14 @@ KINDS = [name.removeprefix("run_") for name in vars(Run) if name.startswith("run
 
 
 def main():
-    options = parse()
+    parser = argparse.ArgumentParser(usage=__doc__)
+    parser.add_argument("kinds", nargs="*", choices=[*KINDS, []])
+    length = parser.add_mutually_exclusive_group()
+    length.add_argument("--minutes", type=positive)
+    length.add_argument("--rounds", type=positive)
+    parser.add_argument("--short", action="store_true")
+    parser.add_argument("--seed", type=positive, default=random.randint(1, 99999))
+    options = parser.parse_args()
     make(ARCH, "build", "tavishell", "filemanager", "taviservice")
     folder = build_of(ARCH)
     with Session(folder / "endure-prefix", folder / "endure", ARCH) as session:
