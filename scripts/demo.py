@@ -400,6 +400,7 @@ class Demo:
         expect("nothing in the module's log", "", (self.data / "tavi.log").read_text(encoding="utf-8"))
 
     def stay(self):
+        self.session.start_service()
         if self.screen.own:
             print(f"The windows are on display {self.session.environment['DISPLAY']}, which has no monitor.")
         print("Close the file manager or press Ctrl-C here to end.")

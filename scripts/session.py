@@ -39,7 +39,7 @@ def run(main):
         sys.exit(main())
     except KeyboardInterrupt:
         sys.exit(130)
-    except Failure as failure:
+    except (Failure, subprocess.SubprocessError) as failure:
         sys.exit(f"error: {failure}")
 
 
