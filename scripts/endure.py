@@ -45,7 +45,7 @@ def counts(between="wait 0"):
     return ["counts", "wait 400", between, "counts", "wait 400", between, "counts"]
 
 
-# --- windows that a user opens and closes: FILE is one with versions, MS and WAY are chosen at random
+# --- windows that a user opens and closes: FILE, MS, BUTTON and PAGE are chosen at random
 
 DIALOG = "select FILE", "retry 60000 | invoke Restore Previous Version"
 QUESTION = *DIALOG, "retry 20000 | click Restore Files | 1003"
@@ -60,8 +60,8 @@ CLOSING = {"menu": (),
            "dialog": ("retry 20000 | click Restore Files | 2",),
            "question": ("retry 20000 | click Tavi Remote Backup | 2",),
            # The service's report of the end may have closed it.
-           "progress": ("try retry 2500 | click Restoring... | WAY",),
-           "page": ("retry 20000 | click Properties | 2",),
+           "progress": ("try retry 2500 | click Restoring... | BUTTON",),
+           "page": ("retry 20000 | PAGE",),
            "asking-page": ("retry 20000 | click Tavi Remote Backup | 2",)}
 
 
@@ -71,8 +71,8 @@ def opening(*windows):
 
 
 def closing(*windows):
-    way = str(random.choice((2, 8)))
-    return [command.replace("WAY", way) for window in windows for command in CLOSING[window]]
+    button, page = str(random.choice((2, 8))), random.choice(("click Properties | 2", "close-window Properties"))
+    return [command.replace("BUTTON", button).replace("PAGE", page) for window in windows for command in CLOSING[window]]
 
 
 def first_time():

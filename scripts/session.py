@@ -50,7 +50,7 @@ def build_of(arch):
 
 def make(arch, script, *words):
     """Runs a script of this folder for one architecture, or for both."""
-    subprocess.run([root / "scripts" / script, *words], env=os.environ | {"TAVISHELL_ARCH": arch}, check=True)
+    subprocess.run([str(root / "scripts" / script), *words], env=os.environ | {"TAVISHELL_ARCH": arch}, check=True)
 
 
 def wait_for(seconds, what, predicate):
