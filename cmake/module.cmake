@@ -14,7 +14,10 @@ include(cmake/hardening.cmake)
 add_library(tavi_platform_flags INTERFACE)
 target_compile_definitions(tavi_platform_flags INTERFACE UNICODE _UNICODE _WIN32_WINNT=0x0600 WINVER=0x0600 NOMINMAX
     WIN32_LEAN_AND_MEAN)
-target_compile_options(tavi_platform_flags INTERFACE -ffunction-sections -fdata-sections)
+# wxWidgets' log calls store __FILE__. The module's bytes must not depend on the folder of the build; ccache makes its path relative.
+file(RELATIVE_PATH to_root ${CMAKE_BINARY_DIR} ${CMAKE_SOURCE_DIR})
+target_compile_options(tavi_platform_flags INTERFACE -ffunction-sections -fdata-sections
+    -fmacro-prefix-map=${CMAKE_SOURCE_DIR}/= -fmacro-prefix-map=${to_root}=)
 target_link_options(tavi_platform_flags INTERFACE -static -Wl,--gc-sections -Wl,--no-insert-timestamp)
 
 add_library(tavi_platform INTERFACE)
