@@ -9,6 +9,9 @@ jobs=$(nproc)
 # Compiled objects outlive the build tree; an equal source is compiled once, in whatever folder.
 export CMAKE_C_COMPILER_LAUNCHER=ccache CMAKE_CXX_COMPILER_LAUNCHER=ccache
 export CCACHE_DIR="$cache/ccache" CCACHE_BASEDIR="$root" CCACHE_NOHASHDIR=1
+# Objects that use a precompiled header are stored with these two only. By the compiler's list of included files, a macro that changed
+# is seen, which it is not in preprocessed text; and nothing is preprocessed twice.
+export CCACHE_SLOPPINESS=pch_defines,time_macros CCACHE_DEPEND=1
 
 say() { printf '%s\n' "$*"; }
 die() { printf 'error: %s\n' "$*" >&2; exit 1; }
