@@ -78,7 +78,7 @@ void RestoreProgressWindow::getOrCreate()
         setMessageSink(deliverToWindow);
         window = std::make_shared<RestoreProgressWindow>();
         if (!KernelHandle(startModuleThread(runProgressWindow, window.get()))) {
-            wxLogError("Unable to start the progress window (%lu)", GetLastError());
+            wxLogError("Unable to start the progress window");
             window.reset();
             return;
         }

@@ -131,7 +131,7 @@ bool startVersionsDialog(Selection selection, ManifestRef manifest, HWND host)
 {
     std::unique_ptr<DialogStart> start(new DialogStart{{}, std::move(selection), std::move(manifest), host});
     if (!KernelHandle(startModuleThread(runDialog, start.get()))) {
-        wxLogError("Unable to start the versions dialog (%lu)", GetLastError());
+        wxLogError("Unable to start the versions dialog");
         return false;
     }
     static_cast<void>(start.release());
