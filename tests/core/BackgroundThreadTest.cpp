@@ -15,7 +15,7 @@ static const KernelHandle leave(CreateSemaphoreW(nullptr, 0, 100, nullptr));
 
 static bool waitFor(const KernelHandle& handle)
 {
-    return WaitForSingleObject(handle.get(), 10000) == WAIT_OBJECT_0;
+    return WaitForSingleObject(handle.get(), 60000) == WAIT_OBJECT_0;
 }
 
 static BackgroundThread subject("test", [](const BackgroundThread& self) {

@@ -89,7 +89,7 @@ TEST_F(Graylists, AreBuiltOneAtATimeAndPublishedBeforeTheHivesAreUnloaded)
         unloadHive(hive = temporaryHives().at(0));
         log.onNextLine([&] {
             reader = std::async(std::launch::async, getGraylist, false);
-            EXPECT_EQ(reader.wait_for(std::chrono::seconds(10)), std::future_status::ready);
+            EXPECT_EQ(reader.wait_for(std::chrono::minutes(1)), std::future_status::ready);
         });
     });
     const PathTree* const built = getGraylist(true);

@@ -51,11 +51,12 @@ TEST_F(ExportsTest, LeaveNothingOfAnObjectThatCannotBeCreated)
 
 TEST_F(ExportsTest, ServeAHostThatGoesOnAfterItMayUnload)
 {
+    const std::size_t threads = countThreads();
     const PipeServer servers[] = {{kStatus, PIPE_ACCESS_OUTBOUND, 2}, {kStatus, PIPE_ACCESS_OUTBOUND, 2}};
     LoadedModule module;
     ASSERT_TRUE(servers[0].waitClient());
     EXPECT_EQ(module.canUnload(), S_OK);
-    Sleep(700); // the listener has ended
+    EXPECT_TRUE(waitUntil([&] { return countThreads() == threads; })) << "a thread has not ended";
     module.object<IUnknown>(ShellExt::kClassId, IID_IUnknown);
     EXPECT_TRUE(servers[1].waitClient());
 }

@@ -21,8 +21,7 @@ TEST_F(LifecycleTest, AdmitsProgramsByTheBeginningOfTheirName)
         for (const wchar_t* path : paths)
             EXPECT_EQ(hostKindOf(path), kind) << path;
     }
-    EXPECT_EQ(LoadLibraryW(modulePath().c_str()), nullptr);
-    EXPECT_EQ(GetLastError(), DWORD{ERROR_DLL_INIT_FAILED});
+    EXPECT_TRUE(!LoadLibraryW(modulePath().c_str()) && GetLastError() == ERROR_DLL_INIT_FAILED);
 }
 
 TEST_F(LifecycleTest, GivesAToolTheClassesAndNothingElse)

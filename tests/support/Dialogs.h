@@ -15,10 +15,11 @@
 // The tests drive this process's dialogs from another thread, by the messages that a user's actions cause.
 namespace tavi::test {
 
+// Waits at most a minute, which ends no wait on the slowest machine.
 inline bool waitUntil(const std::function<bool()>& condition)
 {
     bool met = false;
-    for (const DWORD start = GetTickCount(); !(met = condition()) && GetTickCount() - start < 10000;)
+    for (const DWORD start = GetTickCount(); !(met = condition()) && GetTickCount() - start < 60000;)
         Sleep(5);
     return met;
 }

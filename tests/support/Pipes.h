@@ -23,16 +23,15 @@ class PipeServer {
     }
     bool waitClient() const
     {
-        return waitUntil([&] {
-            if (ConnectNamedPipe(pipe_.get(), nullptr), GetLastError() == ERROR_NO_DATA)
-                hangUp(); // a client that has left
-            return GetLastError() == ERROR_PIPE_CONNECTED;
-        });
+        return waitUntil(
+            [&] { return !ConnectNamedPipe(pipe_.get(), nullptr) && GetLastError() == ERROR_PIPE_CONNECTED; });
     }
+    // Returns once the client has read the bytes.
     void write(const std::string& bytes) const
     {
         DWORD written = 0;
-        EXPECT_TRUE(WriteFile(pipe_.get(), bytes.data(), static_cast<DWORD>(bytes.size()), &written, nullptr));
+        EXPECT_TRUE(WriteFile(pipe_.get(), bytes.data(), static_cast<DWORD>(bytes.size()), &written, nullptr) &&
+                    FlushFileBuffers(pipe_.get()));
     }
     void hangUp() const
     {

@@ -53,8 +53,9 @@ TEST_F(RestoreProgressWindowTest, ShowsItselfLateAndFollowsRestoresToTheLastEnd)
     EXPECT_TRUE(waitUntil([&] { return position() == 125; }));
     dispatch(event(kItem, 0, "C:\\d\\B.txt"));
     EXPECT_TRUE(waitUntil([] { return transferStatus().restoreSpeed() > 0; })) << "only the first item clears it";
-    transferStatus().restoreRateLong = 1000;
-    EXPECT_TRUE(waitUntil([&] { return controlText(dialog, TAVI_PROGRESS_REMAINING) == L"4 seconds"; }));
+    EXPECT_TRUE(waitUntil([&] { // the window's timer renews the rate
+        return transferStatus().restoreRateLong = 1000, controlText(dialog, TAVI_PROGRESS_REMAINING) == L"4 seconds";
+    }));
     dispatch(std::make_unique<SnapshotMessage>(7, 0, 0, 0, 0));
     EXPECT_TRUE(waitUntil([&] { return controlText(dialog, TAVI_PROGRESS_REMAINING) == L"Unknown"; }));
     dispatch(event(kEnded));
@@ -71,11 +72,14 @@ TEST_F(RestoreProgressWindowTest, ShowsItselfLateAndFollowsRestoresToTheLastEnd)
 TEST_F(RestoreProgressWindowTest, StaysRegisteredThoughItsDialogCannotBeCreated)
 {
     setModuleInstance(GetModuleHandleW(L"kernel32.dll"));
+    std::atomic<bool> hasLogged{false};
+    log.onNextLine([&] { hasLogged = true; });
     RestoreProgressWindow::getOrCreate();
-    EXPECT_TRUE(waitUntil([&] { return log.take().size() == 1; }));
+    EXPECT_TRUE(waitUntil([&] { return hasLogged.load(); }));
     dispatch(event(kItem, 0, "not shown"));
     EXPECT_EQ(moduleRefCount(), 2);
-    RestoreProgressWindow::current()->handleMessage(nullptr, WM_DESTROY, 0, 0);
+    // Posts WM_QUIT to its thread.
+    std::thread([] { RestoreProgressWindow::current()->handleMessage(nullptr, WM_DESTROY, 0, 0); }).join();
     EXPECT_FALSE(RestoreProgressWindow::current());
     EXPECT_EQ(moduleRefCount()--, 1) << "the thread's stays raised";
 }

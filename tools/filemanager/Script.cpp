@@ -106,7 +106,7 @@ int Script::finish()
 {
     SetEvent(stop_.get());
     if (WaitForSingleObject(thread_.get(), kInputMs) != WAIT_OBJECT_0)
-        ExitProcess(0);
+        ExitProcess(failed_ ? 1 : 0);
     return failed_ ? 1 : 0;
 }
 

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <atomic>
 #include <functional>
 #include <optional>
 #include <string>
@@ -47,9 +48,9 @@ class Script {
     tools::Commands commands_;
     tools::Handle stop_ = tools::createEvent();
     std::vector<ComPtr<IUnknown>> held_;
-    // Written and read on the script's thread; failed_ is read after that thread has ended, too.
+    // Only the script's thread uses it.
     bool ended_ = false;
-    bool failed_ = false;
+    std::atomic<bool> failed_{false};
     tools::Handle thread_;
 };
 

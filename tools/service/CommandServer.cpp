@@ -10,7 +10,7 @@ namespace {
 
 constexpr wchar_t kCommandPipe[] = L"\\\\.\\pipe\\tavibackup";
 constexpr int kInstances = 4;
-constexpr DWORD kFrameMs = 2000;
+constexpr DWORD kFrameMs = 10000;
 // More than any command has.
 constexpr DWORD kMaxFrameBytes = 1024;
 
