@@ -11,7 +11,7 @@ import shutil
 import subprocess
 import time
 
-from session import MODULE_CLASS, Failure, Session, build, build_of, make, root, run, wait_for
+from session import MODULE_CLASS, VERSION, Failure, Session, build, build_of, make, root, run, wait_for, windows_path
 
 # For the worst machine.
 LIMIT_S = 120
@@ -34,7 +34,6 @@ LAKE = "Lake Garda, July 2026"
 PHOTOS = [f"{LAKE}/IMG_2026071{photo}_093012_panorama.dng" for photo in range(1, 9)]
 FOLDER = r"C:\users\demo\Documents"
 UNINSTALL = r"HKLM\Software\Microsoft\Windows\CurrentVersion\Uninstall"
-VERSION = re.search(r"project\(tavishell VERSION ([0-9.]+)", (root / "CMakeLists.txt").read_text(encoding="utf-8"))[1]
 
 failures = []
 
@@ -171,8 +170,7 @@ class Demo:
     # --- installation and removal
 
     def msiexec(self, option):
-        package = "Z:" + str(self.package).replace("/", "\\")
-        return self.session.windows("msiexec", "/qn", option, package, check=False, timeout=600).returncode
+        return self.session.windows("msiexec", "/qn", option, windows_path(self.package), check=False, timeout=600).returncode
 
     def listed(self):
         """Returns the entry in the list of programs."""

@@ -20,6 +20,7 @@ import time
 
 root = pathlib.Path(__file__).resolve().parent.parent
 build = root / "build"
+VERSION = re.search(r"project\(tavishell VERSION ([0-9.]+)", (root / "CMakeLists.txt").read_text(encoding="utf-8"))[1]
 MODULE_CLASS = "{5E0C31A7-8D42-4B19-A6F3-2C7D90E1B845}"
 
 # Of this program and of those under Wine (scripts/wine-run sets the same).
@@ -51,6 +52,10 @@ def build_of(arch):
 def make(arch, script, *words):
     """Runs a script of this folder for one architecture, or for both."""
     subprocess.run([str(root / "scripts" / script), *words], env=os.environ | {"TAVISHELL_ARCH": arch}, check=True)
+
+
+def windows_path(path):
+    return "Z:" + str(path).replace("/", "\\")
 
 
 def wait_for(seconds, what, predicate):
