@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cstddef>
 #include <cstdint>
+#include <iterator>
 #include <memory>
 #include <type_traits>
 #include <vector>
@@ -17,6 +18,75 @@ class BlockArray {
     static constexpr std::size_t kBlock = std::size_t{1} << kLog;
 
   public:
+    // For the algorithms that sort.
+    class Iterator {
+      public:
+        using iterator_category = std::random_access_iterator_tag;
+        using value_type = Element;
+        using difference_type = std::ptrdiff_t;
+        using pointer = Element*;
+        using reference = Element&;
+
+        Iterator(BlockArray& array, std::uint32_t at) noexcept : array_(&array), at_(at) {}
+        Element& operator*() const noexcept
+        {
+            return (*array_)[at_];
+        }
+        Element* operator->() const noexcept
+        {
+            return &**this;
+        }
+        Iterator& operator++() noexcept
+        {
+            return *this += 1;
+        }
+        Iterator& operator--() noexcept
+        {
+            return *this += -1;
+        }
+        Iterator& operator+=(std::ptrdiff_t count) noexcept
+        {
+            at_ += static_cast<std::uint32_t>(count);
+            return *this;
+        }
+        friend Iterator operator+(Iterator from, std::ptrdiff_t count) noexcept
+        {
+            return from += count;
+        }
+        friend Iterator operator-(Iterator from, std::ptrdiff_t count) noexcept
+        {
+            return from += -count;
+        }
+        friend std::ptrdiff_t operator-(Iterator a, Iterator b) noexcept
+        {
+            return static_cast<std::ptrdiff_t>(a.at_) - static_cast<std::ptrdiff_t>(b.at_);
+        }
+        friend bool operator==(Iterator a, Iterator b) noexcept
+        {
+            return a.at_ == b.at_;
+        }
+        friend bool operator!=(Iterator a, Iterator b) noexcept
+        {
+            return a.at_ != b.at_;
+        }
+        friend bool operator<(Iterator a, Iterator b) noexcept
+        {
+            return a.at_ < b.at_;
+        }
+
+      private:
+        BlockArray* array_;
+        std::uint32_t at_;
+    };
+    Iterator begin() noexcept
+    {
+        return {*this, 0};
+    }
+    Iterator end() noexcept
+    {
+        return {*this, size_};
+    }
+
     std::uint32_t size() const noexcept
     {
         return size_;

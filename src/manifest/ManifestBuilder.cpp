@@ -1,9 +1,9 @@
 #include "manifest/ManifestBuilder.h"
 
+#include <algorithm>
 #include <array>
 #include <numeric>
 #include <utility>
-#include <vector>
 
 namespace tavi {
 namespace {
@@ -113,24 +113,25 @@ ManifestRef ManifestBuilder::finish(std::uint32_t textLength)
 }
 
 // Sorts the folders and moves each file into its folder's part of the array; the files keep the order of the text.
+// Leaves the end of a folder's part in the place of its first file.
 void ManifestBuilder::orderFolders()
 {
     const storage::ByteArena& texts = manifest_->texts_;
-    std::vector<std::uint32_t> order(folders_.size());
+    Numbers order, rank;
+    order.allocate(folders_.size());
+    rank.allocate(folders_.size());
     std::iota(order.begin(), order.end(), 0u);
     std::sort(order.begin(), order.end(), [&](std::uint32_t a, std::uint32_t b) {
         return texts.at(folders_[a].text) < texts.at(folders_[b].text);
     });
 
-    manifest_->folders_.allocate(folders_.size());
-    std::vector<std::uint32_t> rank(folders_.size());
-    std::vector<std::uint32_t> place(folders_.size());
+    auto& folders = manifest_->folders_;
+    folders.allocate(folders_.size());
     std::uint32_t firstFile = 0;
     for (std::uint32_t i = 0; i < order.size(); ++i) {
         const LoadedFolder& folder = folders_[order[i]];
-        manifest_->folders_[i] = {folder.text, firstFile};
+        folders[i] = {folder.text, firstFile};
         rank[order[i]] = i;
-        place[order[i]] = firstFile;
         firstFile += folder.files;
     }
     folders_ = {};
@@ -138,9 +139,8 @@ void ManifestBuilder::orderFolders()
     manifest_->files_.allocate(files_.size());
     for (std::uint32_t i = 0; i < files_.size(); ++i) {
         Manifest::FileRecord record = files_[i];
-        const std::uint32_t to = place[record.folder]++;
         record.folder = rank[record.folder];
-        manifest_->files_[to] = record;
+        manifest_->files_[folders[record.folder].firstFile++] = record;
     }
     files_ = {};
 }
@@ -148,35 +148,26 @@ void ManifestBuilder::orderFolders()
 // Sorts each folder's files by name and keeps the last of several files of one name.
 void ManifestBuilder::orderFiles()
 {
-    const storage::ByteArena& texts = manifest_->texts_;
+    using File = Manifest::FileRecord;
     auto& files = manifest_->files_;
-    auto& folders = manifest_->folders_;
-    std::vector<Manifest::FileRecord> scratch;
+    const auto name = [&](const File& file) { return manifest_->texts_.at(file.name); };
     std::uint32_t kept = 0;
-    for (std::uint32_t folder = 0; folder < folders.size(); ++folder) {
-        const std::uint32_t begin = folders[folder].firstFile;
-        const std::uint32_t end = folder + 1 < folders.size() ? folders[folder + 1].firstFile : files.size();
-        folders[folder].firstFile = kept;
-
-        bool ordered = true;
-        for (std::uint32_t file = begin + 1; ordered && file < end; ++file)
-            ordered = texts.at(files[file - 1].name) < texts.at(files[file].name);
-        if (ordered && kept == begin) {
-            kept = end;
-            continue;
+    auto first = files.begin();
+    for (std::uint32_t folder = 0; folder < manifest_->folders_.size(); ++folder) {
+        const std::uint32_t endFile = std::exchange(manifest_->folders_[folder].firstFile, kept);
+        const auto end = files.begin() + static_cast<std::ptrdiff_t>(endFile);
+        auto last = end;
+        if (std::adjacent_find(first, last, [&](const File& a, const File& b) { return name(a) >= name(b); }) != last) {
+            // Versions are numbered in the order of the text, so of several files of one name the last one comes first.
+            std::sort(first, last, [&](const File& a, const File& b) {
+                const int order = name(a).compare(name(b));
+                return order != 0 ? order < 0 : a.firstVersion > b.firstVersion;
+            });
+            last = std::unique(first, last, [&](const File& a, const File& b) { return name(a) == name(b); });
         }
-        scratch.clear();
-        for (std::uint32_t file = begin; file < end; ++file)
-            scratch.push_back(files[file]);
-        // Versions are numbered in the order of the text, so of two files of one name the later comes last.
-        std::sort(scratch.begin(), scratch.end(), [&](const Manifest::FileRecord& a, const Manifest::FileRecord& b) {
-            const int order = texts.at(a.name).compare(texts.at(b.name));
-            return order != 0 ? order < 0 : a.firstVersion < b.firstVersion;
-        });
-        for (std::size_t i = 0; i < scratch.size(); ++i) {
-            if (i + 1 == scratch.size() || texts.at(scratch[i].name) != texts.at(scratch[i + 1].name))
-                files[kept++] = scratch[i];
-        }
+        for (; first != last; ++first)
+            files[kept++] = *first;
+        first = end;
     }
     files.shrinkTo(kept);
 }

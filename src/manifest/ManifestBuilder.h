@@ -49,6 +49,8 @@ class ManifestBuilder {
         std::uint32_t files;
     };
 
+    using Numbers = BlockArray<std::uint32_t, 18>;
+
     std::uint32_t internFolder(std::string_view folder);
     void orderFolders();
     void orderFiles();

@@ -54,7 +54,7 @@ bool existed(const ManifestPatchList& patches, std::uint32_t time)
 std::string randomText(std::mt19937& random, bool isLarge, std::map<std::wstring, std::string>& model)
 {
     std::string text = "FILES";
-    for (std::size_t files = isLarge ? 20000 : 1 + random() % 300; files-- > 0;) {
+    for (std::size_t files = isLarge ? 40000 : 1 + random() % 300; files-- > 0;) {
         const std::size_t extra = isLarge && files == 10000 ? 1500000 : 0;
         const std::wstring path = L"C" + std::wstring(extra, L'd') + randomPath(random, isLarge ? 15 : 7);
         text += (random() % 20 == 0 && !model.empty() ? "\n\nFILES\n" : "\n") + toUtf8(path) + "\n";
