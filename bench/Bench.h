@@ -41,8 +41,18 @@ std::vector<double> measureIdle(const Arguments& arguments);
 std::vector<double> measureManifest(const Arguments& arguments);
 std::vector<double> measurePlanning(const Arguments& arguments);
 
-// Runs all works in turn, as often as `repetitions` says. Returns the median of each in seconds.
-std::vector<double> medianSeconds(int repetitions, const std::vector<std::function<void()>>& works);
+// Both functions run all works in turn, as often as `repetitions` says, so that a busy second of the machine affects
+// all.
+using Works = std::vector<std::function<void()>>;
+// Returns the median of each in seconds, waits included.
+std::vector<double> medianSeconds(int repetitions, const Works& works);
+// Returns the least processor time of each in seconds, which excludes waits and the time of other processes. Each turn
+// runs a work again until it has taken many steps of the clock.
+std::vector<double> leastProcessorSeconds(int repetitions, const Works& works);
+
+// Returns the user and kernel time of this process in seconds. Its clock may advance in steps of kClockStepSeconds.
+double processorSeconds();
+constexpr double kClockStepSeconds = 0.01;
 
 // The working set of this process in bytes.
 struct WorkingSet {

@@ -69,7 +69,7 @@ std::vector<double> Bench::inOwnProcess(const std::string& child, const Argument
     return numbers;
 }
 
-std::vector<double> medianSeconds(int repetitions, const std::vector<std::function<void()>>& works)
+std::vector<double> medianSeconds(int repetitions, const Works& works)
 {
     std::vector<std::vector<double>> times(works.size());
     for (int repetition = 0; repetition < repetitions; ++repetition) {
@@ -85,6 +85,34 @@ std::vector<double> medianSeconds(int repetitions, const std::vector<std::functi
         medians.push_back(each[each.size() / 2]);
     }
     return medians;
+}
+
+std::vector<double> leastProcessorSeconds(int repetitions, const Works& works)
+{
+    std::vector<double> least(works.size(), kNoBound);
+    for (int repetition = 0; repetition < repetitions; ++repetition) {
+        for (std::size_t i = 0; i < works.size(); ++i) {
+            const double start = processorSeconds();
+            double spent = 0;
+            int runs = 0;
+            for (; spent < 50 * kClockStepSeconds; ++runs) {
+                works[i]();
+                spent = processorSeconds() - start;
+            }
+            least[i] = std::min(least[i], spent / runs);
+        }
+    }
+    return least;
+}
+
+double processorSeconds()
+{
+    FILETIME created, ended, kernel, user;
+    GetProcessTimes(GetCurrentProcess(), &created, &ended, &kernel, &user);
+    const auto seconds = [](const FILETIME& time) {
+        return (time.dwHighDateTime * 4294967296.0 + time.dwLowDateTime) / 1e7;
+    };
+    return seconds(kernel) + seconds(user);
 }
 
 WorkingSet workingSet()

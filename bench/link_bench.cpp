@@ -92,18 +92,6 @@ bool bareRead(HANDLE pipe, DWORD pauseMs)
     return ReadFile(pipe, bytes, length, &count, nullptr);
 }
 
-// Returns the user and kernel time of this process in milliseconds. Its clock may advance in steps of 10 ms.
-double processorTime()
-{
-    FILETIME created, ended, kernel, user;
-    GetProcessTimes(GetCurrentProcess(), &created, &ended, &kernel, &user);
-    const auto milliseconds = [](const FILETIME& time) {
-        return (time.dwHighDateTime * 4294967296.0 + time.dwLowDateTime) / 1e4;
-    };
-    return milliseconds(kernel) + milliseconds(user);
-}
-constexpr double kClockStepMs = 10;
-
 // Returns a work that fills a pipe and reads all messages by one call of `readOne` each. Adds the processor time of the
 // calls to `spent`.
 template <class ReadOne>
@@ -111,11 +99,11 @@ std::function<void()> reading(unsigned messages, double& spent, ReadOne readOne)
 {
     return [stream = streamOf(messages), messages, &spent, readOne] {
         const auto [server, client] = filledPipe(stream);
-        const double start = processorTime();
+        const double start = processorSeconds();
         unsigned read = 0;
         while (read < messages && readOne(client.get()))
             ++read;
-        spent += processorTime() - start;
+        spent += processorSeconds() - start;
         if (read != messages)
             throw std::runtime_error("messages were lost: " + std::to_string(messages - read));
     };
@@ -229,6 +217,7 @@ constexpr struct {
 void reportIdle(Bench& bench, std::size_t first, std::size_t end)
 {
     const std::string seconds = bench.quick ? "5" : "60";
+    constexpr double kStepMs = kClockStepSeconds * 1e3;
     const double perMinute = (bench.quick ? 12.0 : 1.0) / kThreads;
     std::vector<std::future<double>> times;
     for (std::size_t loop = 2 * first; loop < 2 * end; ++loop)
@@ -241,7 +230,7 @@ void reportIdle(Bench& bench, std::size_t first, std::size_t end)
         bench.report(name + ", a minute", ours, kNoBound, "ms");
         bench.report(name + ", a minute of the required calls", required, kNoBound, "ms");
         // A ratio of fewer steps of the clock would be chance.
-        if (std::min(ours, required) >= 10 * kClockStepMs * perMinute)
+        if (std::min(ours, required) >= 10 * kStepMs * perMinute)
             bench.report(name + " / required calls", ours / required, 1.5, "x");
     }
 }
@@ -256,13 +245,13 @@ std::vector<double> measureIdle(const Arguments& arguments)
     for (unsigned i = 0; i < kThreads; ++i)
         threads.emplace_back(kPairs[loop / 2].loops[loop % 2]);
     Sleep(1000); // the start of the threads does not count
-    const double start = processorTime();
+    const double start = processorSeconds();
     Sleep(static_cast<DWORD>(std::stoul(arguments[1]) * 1000));
-    const double spent = processorTime() - start;
+    const double spentMs = (processorSeconds() - start) * 1e3;
     stopAll = true;
     for (std::thread& thread : threads)
         thread.join();
-    return {spent};
+    return {spentMs};
 }
 
 void runLink(Bench& bench)
