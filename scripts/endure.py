@@ -445,7 +445,8 @@ class Run:
             text, total_time = fuzz("of the fuzzing", seconds + 300, *more)
             inputs = re.search(r"^stat::number_of_executed_units: *(\d+)", text, re.M)
             speed = inputs and int(int(inputs[1]) / max(total_time - start_time, 0.01))
-            self.figure(f"{name}: inputs a second", speed, f">= {2000 if name == 'message' else 1}")
+            # With its real pause of 10 ms, the reader of messages would take less than 100.
+            self.figure(f"{name}: inputs a second", speed, f">= {500 if name == 'message' else 1}")
 
     def run(self, kind):
         print(f"== {kind} (seed {self.options.seed})")
