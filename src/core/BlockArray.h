@@ -21,11 +21,13 @@ class BlockArray {
     // For the algorithms that sort.
     class Iterator {
       public:
+        // NOLINTBEGIN(readability-identifier-naming): the standard library names these.
         using iterator_category = std::random_access_iterator_tag;
         using value_type = Element;
         using difference_type = std::ptrdiff_t;
         using pointer = Element*;
         using reference = Element&;
+        // NOLINTEND(readability-identifier-naming)
 
         Iterator(BlockArray& array, std::uint32_t at) noexcept : array_(&array), at_(at) {}
         Element& operator*() const noexcept
