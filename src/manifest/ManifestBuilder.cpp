@@ -137,8 +137,7 @@ void ManifestBuilder::orderFolders()
     folders_ = {};
 
     manifest_->files_.allocate(files_.size());
-    for (std::uint32_t i = 0; i < files_.size(); ++i) {
-        Manifest::FileRecord record = files_[i];
+    for (Manifest::FileRecord record : files_) {
         record.folder = rank[record.folder];
         manifest_->files_[folders[record.folder].firstFile++] = record;
     }
@@ -153,8 +152,8 @@ void ManifestBuilder::orderFiles()
     const auto name = [&](const File& file) { return manifest_->texts_.at(file.name); };
     std::uint32_t kept = 0;
     auto first = files.begin();
-    for (std::uint32_t folder = 0; folder < manifest_->folders_.size(); ++folder) {
-        const std::uint32_t endFile = std::exchange(manifest_->folders_[folder].firstFile, kept);
+    for (auto& folder : manifest_->folders_) {
+        const std::uint32_t endFile = std::exchange(folder.firstFile, kept);
         const auto end = files.begin() + static_cast<std::ptrdiff_t>(endFile);
         auto last = end;
         if (std::adjacent_find(first, last, [&](const File& a, const File& b) { return name(a) >= name(b); }) != last) {
