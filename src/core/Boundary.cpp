@@ -2,24 +2,22 @@
 
 #include <exception>
 
-#include <wx/log.h>
+#include "core/LogLine.h"
+#include "core/Utf8.h"
 
 namespace tavi {
 
 void logEscaped(const char* entry) noexcept
 {
-    // Lack of memory or a failing log must not break the boundary. wxWidgets' formatting calls are avoided: a
-    // destructor of theirs allocates, so they end the process if no memory is left.
+    // The conversion of the text may run out of memory, too.
     try {
-        wxString text = L"Unhandled exception in " + wxString::FromUTF8(entry);
         try {
             throw;
         } catch (const std::exception& error) {
-            text += L": " + wxString::FromUTF8(error.what());
+            logError(L"Unhandled exception in %hs: %ls", entry, fromUtf8(error.what()).wc_str());
         } catch (...) {
+            logError(L"Unhandled exception in %hs", entry);
         }
-        if (wxLog::IsEnabled())
-            wxLog::OnLog(wxLOG_Error, text, wxLogRecordInfo(nullptr, 0, nullptr, wxLOG_COMPONENT));
     } catch (...) {
     }
 }

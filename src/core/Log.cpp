@@ -9,6 +9,7 @@
 
 #include "core/CriticalSection.h"
 #include "core/InstallPaths.h"
+#include "core/LogLine.h"
 
 namespace tavi {
 namespace {
@@ -81,7 +82,7 @@ bool openLog(unsigned long level, const std::function<void(unsigned long)>& slee
             previousTarget = before;
         targetInstalled = true;
     } else {
-        wxLogError("Unable to open logfile %s", path);
+        logError(L"Unable to open logfile %ls", path.wc_str());
     }
     wxLog::SetLogLevel(level);
     wxLog::SetTimestamp("%d%b%Y %H:%M:%S");

@@ -2,8 +2,8 @@
 
 #include <functional>
 
-// The module's lines in the log file that it shares with the service. Any thread writes them with wxLogError and the
-// like; the whole line is in the file when the call returns.
+// The log file that the module shares with the service. Any thread writes lines to it (core/LogLine.h); the whole line is
+// in the file when the call returns.
 namespace tavi {
 
 // Waits up to 30 seconds for the service's data directory, then opens the log there; lines above `level` are dropped.

@@ -5,10 +5,9 @@
 
 #include <windows.h>
 #include <sddl.h>
-#include <wx/log.h>
 
-#include "core/Boundary.h"
 #include "core/Handles.h"
+#include "core/LogLine.h"
 #include "core/Paths.h"
 #include "core/Privileges.h"
 #include "core/Registry.h"
@@ -148,8 +147,7 @@ void unloadUserHives() noexcept
         return;
     for (const wxString& name : loadedHives) {
         if (const LONG code = RegUnLoadKeyW(HKEY_USERS, name.wc_str()); code != ERROR_SUCCESS)
-            guarded("hive unload",
-                    [&] { wxLogError("Unable to unload temp reg hive %s: %d", name, static_cast<int>(code)); });
+            logError(L"Unable to unload temp reg hive %ls: %ld", name.wc_str(), code);
     }
     loadedHives.clear();
     hiveOwners.clear();

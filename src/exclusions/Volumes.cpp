@@ -6,9 +6,8 @@
 #include <string_view>
 #include <vector>
 
-#include <wx/log.h>
-
 #include "core/Handles.h"
+#include "core/LogLine.h"
 #include "core/ScopeGuard.h"
 
 namespace tavi {
@@ -99,18 +98,18 @@ void VolumeTable::addVolume(const wxString& name)
 
     DWORD characters = 0;
     if (functions_.pathNames(name.wc_str(), nullptr, 0, &characters) || GetLastError() != ERROR_MORE_DATA) {
-        wxLogError("Failed to retrieve mount point names: %08x", static_cast<unsigned>(GetLastError()));
+        logError(L"Failed to retrieve mount point names: %08lx", GetLastError());
         return;
     }
     std::vector<wchar_t> paths;
     try {
         paths.resize(characters);
     } catch (const std::bad_alloc&) {
-        wxLogError("Failed to allocate memory for mount point names");
+        logError(L"Failed to allocate memory for mount point names");
         return;
     }
     if (!functions_.pathNames(name.wc_str(), paths.data(), static_cast<DWORD>(paths.size()), &characters)) {
-        wxLogError("Failed to retrieve mount point names: %08x", static_cast<unsigned>(GetLastError()));
+        logError(L"Failed to retrieve mount point names: %08lx", GetLastError());
         return;
     }
     const std::size_t end = std::min<std::size_t>(characters, paths.size());

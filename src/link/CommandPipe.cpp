@@ -1,9 +1,9 @@
 #include "link/CommandPipe.h"
 
 #include <windows.h>
-#include <wx/log.h>
 
 #include "core/Handles.h"
+#include "core/LogLine.h"
 #include "link/PipeIo.h"
 
 namespace tavi {
@@ -18,7 +18,7 @@ bool CommandPipe::sendCommand(std::unique_ptr<PipeMessage>& message)
     const FileHandle pipe(
         CreateFileW(kCommandPipe, GENERIC_WRITE, 0, nullptr, OPEN_EXISTING, FILE_ATTRIBUTE_NORMAL, nullptr));
     if (!pipe) {
-        wxLogError("Unable to open command pipe: %d", static_cast<int>(GetLastError()));
+        logError(L"Unable to open command pipe: %d", static_cast<int>(GetLastError()));
         return false;
     }
     const bool written = writeMessage(pipe.get(), message);

@@ -5,8 +5,7 @@
 #include <cstring>
 #include <new>
 
-#include <wx/log.h>
-
+#include "core/LogLine.h"
 #include "core/Utf8.h"
 
 namespace tavi {
@@ -17,6 +16,8 @@ constexpr std::string_view kFilesHeader = "FILES";
 constexpr std::string_view kHashMark = "_hash|";
 constexpr unsigned kSeparatorNewlines = 3;
 constexpr std::size_t kMaxFields = 8;
+// A line of the log has room for no more.
+constexpr std::size_t kMaxLoggedBytes = std::size_t{3} * 4095;
 // Every number of so many digits fits 32 bits.
 constexpr std::ptrdiff_t kMaxSizeDigits = 9;
 
@@ -239,10 +240,10 @@ void ManifestParser::addPatchLine(std::string_view line)
 {
     if (addPatch(line))
         return;
-    wxLogError("Invalid patch in manifest: %s", fromUtf8(line));
+    logError(L"Invalid patch in manifest: %ls", fromUtf8(line.substr(0, kMaxLoggedBytes)).wc_str());
     builder_.reset();
     hasPath_ = false;
-    wxLogError("Attempting to parse invalid manifest");
+    logError(L"Attempting to parse invalid manifest");
 }
 
 bool ManifestParser::addPatch(std::string_view line)

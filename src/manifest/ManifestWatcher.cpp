@@ -2,10 +2,9 @@
 
 #include <utility>
 
-#include <wx/log.h>
-
 #include "core/Boundary.h"
 #include "core/InstallPaths.h"
+#include "core/LogLine.h"
 #include "manifest/StoredManifest.h"
 #include "statedb/Database.h"
 
@@ -33,7 +32,7 @@ ManifestRef readStoredManifest()
                 return parseStoredManifest(blob, static_cast<std::size_t>(length));
         }
     } catch (const DbException& error) {
-        wxLogWarning("Failed to retrieve stored manifest (%d: %s)", error.code(), error.message());
+        logWarning(L"Failed to retrieve stored manifest (%d: %ls)", error.code(), error.message().wc_str());
     }
     return Manifest::parse(wxString());
 }

@@ -5,9 +5,9 @@
 #include <string_view>
 
 #include <windows.h>
-#include <wx/log.h>
 
 #include "core/InstallPaths.h"
+#include "core/LogLine.h"
 #include "core/Utf8.h"
 
 namespace tavi {
@@ -58,7 +58,7 @@ void RestoreRequestWriter::open()
         connection_->open(getDataFilePath(DataFile::stateDatabase));
         transaction_.emplace(*connection_);
     } catch (const DbException& error) {
-        wxLogError("Failed to open state db for restores: %s", error.message());
+        logError(L"Failed to open state db for restores: %ls", error.message().wc_str());
         disconnect();
     }
 }
@@ -95,7 +95,7 @@ bool RestoreRequestWriter::requestRestore(const RestorePlan& files, const wxStri
         transaction_.emplace(*connection_);
         return true;
     } catch (const DbException& error) {
-        wxLogError("Error requesting restore: %s", error.message());
+        logError(L"Error requesting restore: %ls", error.message().wc_str());
         beginAgain();
         return false;
     }
@@ -122,7 +122,7 @@ void RestoreRequestWriter::close()
     try {
         transaction_->commit();
     } catch (const DbException& error) {
-        wxLogError("Error committing restore information: %s", error.message());
+        logError(L"Error committing restore information: %ls", error.message().wc_str());
     }
     disconnect();
 }

@@ -2,9 +2,8 @@
 
 #include <new>
 
-#include <wx/log.h>
-
 #include "core/Boundary.h"
+#include "core/LogLine.h"
 #include "core/Module.h"
 #include "shell/ComObject.h"
 #include "shell/ShellExt.h"
@@ -56,7 +55,7 @@ class ClassFactory final : public ComObject<ClassFactory<Object>, IClassFactory>
             } catch (const std::bad_alloc&) {
                 return E_OUTOFMEMORY;
             } catch (const DbException& error) {
-                wxLogError("Failed to open folder-state db (%d: %s)", error.code(), error.message());
+                logError(L"Failed to open folder-state db (%d: %ls)", error.code(), error.message().wc_str());
                 return E_FAIL;
             }
         });

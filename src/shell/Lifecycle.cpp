@@ -4,11 +4,11 @@
 #include <cwchar>
 
 #include <shlobj.h>
-#include <wx/log.h>
 
 #include "core/BackgroundThread.h"
 #include "core/Handles.h"
 #include "core/Log.h"
+#include "core/LogLine.h"
 #include "core/Module.h"
 #include "link/StatusListener.h"
 #include "manifest/CurrentManifest.h"
@@ -75,7 +75,7 @@ HostKind hostKindOf(const wchar_t* executablePath) noexcept
 void attachToFileManager(HINSTANCE instance, const wchar_t* hostPath)
 {
     openLog(kLogLevel);
-    wxLogInfo("Attaching to %s", wxString(hostPath));
+    logInfo(L"Attaching to %ls", hostPath);
     setModuleInstance(instance);
     acquireShellAllocator();
     DisableThreadLibraryCalls(instance);

@@ -2,10 +2,9 @@
 
 #include <mutex>
 
-#include <wx/log.h>
-
 #include "core/CriticalSection.h"
 #include "core/InstallPaths.h"
+#include "core/LogLine.h"
 
 namespace tavi {
 namespace {
@@ -95,7 +94,7 @@ std::int32_t FileStateLookup::getFileState(const wxString& path)
             connection->open(getDataFilePath(DataFile::stateDatabase));
             connection_ = std::move(connection);
         } catch (const DbException& error) {
-            wxLogError("Failed to open file-state db (%d: %s)", error.code(), error.message());
+            logError(L"Failed to open file-state db (%d: %ls)", error.code(), error.message().wc_str());
             return state;
         }
     }
@@ -107,7 +106,7 @@ std::int32_t FileStateLookup::getFileState(const wxString& path)
         if (rows.nextRow())
             state = rows.fieldInt(0, 0);
     } catch (const DbException& error) {
-        wxLogError("Failed to retrieve file state (%d: %s)", error.code(), error.message());
+        logError(L"Failed to retrieve file state (%d: %ls)", error.code(), error.message().wc_str());
     }
     return state;
 }

@@ -4,10 +4,10 @@
 #include <memory>
 
 #include <wx/intl.h>
-#include <wx/log.h>
 
 #include "core/Boundary.h"
 #include "core/Handles.h"
+#include "core/LogLine.h"
 #include "core/Module.h"
 #include "core/Utf8.h"
 #include "ui/ActivationScope.h"
@@ -83,7 +83,7 @@ void addPropertyPage(const Selection& selection, ManifestRef manifest, LPFNADDPR
     const auto create = sheetFunction<decltype(&CreatePropertySheetPageW)>("CreatePropertySheetPageW");
     const HPROPSHEETPAGE handle = create ? create(&description) : nullptr;
     if (!handle) {
-        wxLogError("Unable to create the property page (%lu)", GetLastError());
+        logError(L"Unable to create the property page (%lu)", GetLastError());
         return;
     }
     // The page's callback frees it.

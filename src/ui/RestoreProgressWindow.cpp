@@ -6,12 +6,12 @@
 #include <commctrl.h>
 #include <objbase.h>
 #include <wx/intl.h>
-#include <wx/log.h>
 
 #include "core/Boundary.h"
 #include "core/CriticalSection.h"
 #include "core/DisplayFormat.h"
 #include "core/Handles.h"
+#include "core/LogLine.h"
 #include "core/ModuleThread.h"
 #include "link/CommandPipe.h"
 #include "link/StatusListener.h"
@@ -59,7 +59,7 @@ void runProgressWindow(void* argument)
                                            progressProcedure, reinterpret_cast<LPARAM>(window.get()));
     if (!dialog) {
         // The count stays raised: the window stays registered for its restores and needs the module's code.
-        wxLogError("Unable to create the progress window (%lu)", GetLastError());
+        logError(L"Unable to create the progress window (%lu)", GetLastError());
         return;
     }
     runDialogLoop(dialog, kShowAfterMs);
@@ -78,7 +78,7 @@ void RestoreProgressWindow::getOrCreate()
         setMessageSink(deliverToWindow);
         window = std::make_shared<RestoreProgressWindow>();
         if (!KernelHandle(startModuleThread(runProgressWindow, window.get()))) {
-            wxLogError("Unable to start the progress window");
+            logError(L"Unable to start the progress window");
             window.reset();
             return;
         }

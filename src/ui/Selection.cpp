@@ -4,9 +4,9 @@
 #include <string>
 
 #include <shlwapi.h>
-#include <wx/log.h>
 
 #include "core/Handles.h"
+#include "core/LogLine.h"
 #include "core/Utf8.h"
 #include "manifest/CurrentManifest.h"
 #include "statedb/Database.h"
@@ -191,7 +191,7 @@ Coverage summarizeStates(const PathSet& paths, FolderStateTable& states)
         }
     } catch (const DbException& error) {
         // The other items would fail, too, and each may have to wait for the database's timeout.
-        wxLogWarning("Failed to retrieve folder state (%d: %s)", error.code(), error.message());
+        logWarning(L"Failed to retrieve folder state (%d: %ls)", error.code(), error.message().wc_str());
         counter.add(false);
     }
     return counter.coverage();

@@ -10,12 +10,12 @@
 #include <prsht.h>
 #include <wx/datetime.h>
 #include <wx/intl.h>
-#include <wx/log.h>
 
 #include "core/Boundary.h"
 #include "core/DisplayFormat.h"
 #include "core/Handles.h"
 #include "core/LocalePattern.h"
+#include "core/LogLine.h"
 #include "core/Module.h"
 #include "core/ModuleThread.h"
 #include "core/ScopeGuard.h"
@@ -114,7 +114,7 @@ void runDialog(void* argument)
     const WindowHandle window(CreateDialogParamW(moduleInstance(), MAKEINTRESOURCEW(TAVI_DIALOG_VERSIONS), nullptr,
                                                  dialogProcedure, reinterpret_cast<LPARAM>(dialog.get())));
     if (!window) {
-        wxLogError("Unable to create the versions dialog (%lu)", GetLastError());
+        logError(L"Unable to create the versions dialog (%lu)", GetLastError());
         return;
     }
     placeWindow(window.get(), start->host);
@@ -131,7 +131,7 @@ bool startVersionsDialog(Selection selection, ManifestRef manifest, HWND host)
 {
     std::unique_ptr<DialogStart> start(new DialogStart{{}, std::move(selection), std::move(manifest), host});
     if (!KernelHandle(startModuleThread(runDialog, start.get()))) {
-        wxLogError("Unable to start the versions dialog");
+        logError(L"Unable to start the versions dialog");
         return false;
     }
     static_cast<void>(start.release());
