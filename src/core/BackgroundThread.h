@@ -10,8 +10,8 @@ namespace tavi {
 // a host that may unload the module may also use it again, and a second thread beside one that is still stopping would
 // compete with it for the same pipe and load the same data again.
 //
-// Lock-free: when a process ends, the kernel kills the other threads at any instruction before the detach uses this
-// object. Any thread may call every member. Objects must outlive the thread, so they are static.
+// Lock-free: attach and detach use it under the loader lock, where a wait for a thread that needs that lock would never
+// end. Any thread may call every member. Objects must outlive the thread, so they are static.
 class BackgroundThread {
   public:
     // Runs on the thread and returns soon after isStopping() has become true.

@@ -10,12 +10,15 @@
 
 namespace tavi {
 
-// An array in blocks of 2^kLog elements, which never move: it grows without copying and needs no large contiguous range
-// of the address space. Elements are trivially copyable and start uninitialized.
-template <class Element, unsigned kLog>
+// An array in blocks of 2^kBlockLog2 elements, which never move: it grows without copying and needs no large contiguous
+// range of the address space. Elements are trivially copyable and start uninitialized.
+//
+// Not std::deque, whose blocks have 512 bytes: a million records of 16 bytes would be 31,250 blocks of the heap instead
+// of 16, each with its overhead, and a module that unloads would free them one by one.
+template <class Element, unsigned kBlockLog2>
 class BlockArray {
     static_assert(std::is_trivially_copyable_v<Element>);
-    static constexpr std::size_t kBlock = std::size_t{1} << kLog;
+    static constexpr std::size_t kBlock = std::size_t{1} << kBlockLog2;
 
   public:
     // For the algorithms that sort.
@@ -95,15 +98,15 @@ class BlockArray {
     }
     const Element& operator[](std::uint32_t i) const noexcept
     {
-        return blocks_[i >> kLog][i & (kBlock - 1)];
+        return blocks_[i >> kBlockLog2][i & (kBlock - 1)];
     }
     Element& operator[](std::uint32_t i) noexcept
     {
-        return blocks_[i >> kLog][i & (kBlock - 1)];
+        return blocks_[i >> kBlockLog2][i & (kBlock - 1)];
     }
     void push(const Element& element)
     {
-        if ((size_ & (kBlock - 1)) == 0 && size_ >> kLog == blocks_.size())
+        if ((size_ & (kBlock - 1)) == 0 && size_ >> kBlockLog2 == blocks_.size())
             addBlock(kBlock);
         (*this)[size_] = element;
         ++size_;
@@ -118,7 +121,7 @@ class BlockArray {
     void fill(const Element& element)
     {
         for (std::uint32_t i = 0; i < size_; i += kBlock)
-            std::fill_n(blocks_[i >> kLog].get(), std::min<std::size_t>(kBlock, size_ - i), element);
+            std::fill_n(blocks_[i >> kBlockLog2].get(), std::min<std::size_t>(kBlock, size_ - i), element);
     }
     void shrinkTo(std::uint32_t size) noexcept
     {

@@ -17,7 +17,8 @@ struct Replacement {
     const wchar_t* conversion;
 };
 
-// In this order: the third row restores what the second one damages in the result of the first.
+// Replaced row by row, in the whole text. The single letter of a picture also matches in the conversion that an earlier
+// row has put in ("%H" becomes "%%H"); the row with two percent signs repairs that.
 const Replacement kTimePictures[] = {{L"HH", L"%H"}, {L"H", L"%H"},  {L"%%H", L"%H"}, {L"hh", L"%I"},
                                      {L"h", L"%I"},  {L"mm", L"%M"}, {L"m", L"%M"},   {L"ss", L"%S"},
                                      {L"s", L"%S"},  {L"tt", L"%p"}, {L"t", L"%p"}};
@@ -30,6 +31,26 @@ void replaceAll(wxString& text, const Replacement (&table)[kSize])
 {
     for (const Replacement& row : table)
         text.Replace(row.picture, row.conversion);
+}
+
+wxString dayText(unsigned long count)
+{
+    return wxString::Format(wxPLURAL("%lu day", "%lu days", count), count);
+}
+
+wxString hourText(unsigned long count)
+{
+    return wxString::Format(wxPLURAL("%lu hour", "%lu hours", count), count);
+}
+
+wxString minuteText(unsigned long count)
+{
+    return wxString::Format(wxPLURAL("%lu minute", "%lu minutes", count), count);
+}
+
+wxString secondText(unsigned long count)
+{
+    return wxString::Format(wxPLURAL("%lu second", "%lu seconds", count), count);
 }
 
 } // namespace
@@ -61,38 +82,21 @@ wxString formatRate(std::uint64_t amountPerSecond)
 wxString formatDuration(std::uint32_t seconds)
 {
     // Strictly greater, as users know it: 86400 seconds read "24 hours", not "1 day".
-    const auto split = [&](std::uint32_t unit) {
-        if (seconds <= unit)
-            return 0ul;
-        const std::uint32_t count = seconds / unit;
-        seconds %= unit;
-        return static_cast<unsigned long>(count);
+    const auto takeUnits = [&](std::uint32_t unit) {
+        const std::uint32_t count = seconds > unit ? seconds / unit : 0;
+        seconds -= count * unit;
+        return count;
     };
-    const unsigned long days = split(86400);
-    const unsigned long hours = split(3600);
-    const unsigned long minutes = split(60);
-    const unsigned long rest = seconds;
-
-    const auto phrase = [&](int unit) {
-        switch (unit) {
-        case 0:
-            return wxString::Format(wxPLURAL("%lu day", "%lu days", static_cast<unsigned>(days)), days);
-        case 1:
-            return wxString::Format(wxPLURAL("%lu hour", "%lu hours", static_cast<unsigned>(hours)), hours);
-        case 2:
-            return wxString::Format(wxPLURAL("%lu minute", "%lu minutes", static_cast<unsigned>(minutes)), minutes);
-        default:
-            return wxString::Format(wxPLURAL("%lu second", "%lu seconds", static_cast<unsigned>(rest)), rest);
-        }
-    };
-    const unsigned long counts[] = {days, hours, minutes, rest};
-    for (int unit = 0; unit < 3; ++unit) {
-        if (counts[unit] == 0)
-            continue;
-        const wxString largest = phrase(unit);
-        return counts[unit + 1] == 0 ? largest : largest + L", " + phrase(unit + 1);
-    }
-    return phrase(3);
+    const std::uint32_t days = takeUnits(86400);
+    const std::uint32_t hours = takeUnits(3600);
+    const std::uint32_t minutes = takeUnits(60);
+    if (days > 0)
+        return hours > 0 ? dayText(days) + L", " + hourText(hours) : dayText(days);
+    if (hours > 0)
+        return minutes > 0 ? hourText(hours) + L", " + minuteText(minutes) : hourText(hours);
+    if (minutes > 0)
+        return seconds > 0 ? minuteText(minutes) + L", " + secondText(seconds) : minuteText(minutes);
+    return secondText(seconds);
 }
 
 wxString withName(wxString text, const wxString& name)

@@ -2,7 +2,7 @@
 
 #include <wx/string.h>
 
-class wxRegKey;
+#include "core/Handles.h"
 
 // The paths of the backup service's files. Each call reads the registry; any thread.
 namespace tavi {
@@ -10,9 +10,10 @@ namespace tavi {
 wxString getInstallKeyName();
 wxString getSettingsKeyName();
 
-// The two keys. The service is a 32-bit program, so they are in the registry's 32-bit view, also for a 64-bit module.
-wxRegKey installKey();
-wxRegKey settingsKey();
+// Each opens one of the two keys; null if that fails. The service is a 32-bit program, so they are in the registry's
+// 32-bit view, also for a 64-bit module.
+RegistryKey openInstallKey(REGSAM access) noexcept;
+RegistryKey openSettingsKey(REGSAM access) noexcept;
 
 // The service's files, by the numbers that it uses for them.
 enum class ConfigFile { database = 0, key = 1 };
@@ -28,7 +29,7 @@ enum class DataFile {
 };
 
 // Returns the full path of a file, or its bare name with a backslash if the service's directory is not known: then
-// DataFile::directory gives an empty path. Empty for any other number.
+// DataFile::directory gives an empty path. Empty for any other number. Logs a directory that cannot be read.
 wxString getConfigFilePath(ConfigFile file);
 wxString getDataFilePath(DataFile file);
 

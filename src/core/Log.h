@@ -2,8 +2,8 @@
 
 #include <functional>
 
-// The log file that the module shares with the service. Any thread writes lines to it (core/LogLine.h); the whole line is
-// in the file when the call returns.
+// The log file that the module shares with the service. Any thread writes lines to it (core/LogLine.h); the whole line
+// is in the file when the call returns.
 namespace tavi {
 
 // Waits up to 30 seconds for the service's data directory, then opens the log there; lines above `level` are dropped.
@@ -14,15 +14,5 @@ bool openLog(unsigned long level, const std::function<void(unsigned long)>& slee
 
 // Closes the file before the module is unloaded. No thread may log afterwards.
 void closeLog() noexcept;
-
-// Switches wxWidgets' logging off, for the whole process, during its lifetime. After any overlap on several threads the
-// state before the first is back.
-class LogSilencer {
-  public:
-    LogSilencer();
-    ~LogSilencer();
-    LogSilencer(const LogSilencer&) = delete;
-    LogSilencer& operator=(const LogSilencer&) = delete;
-};
 
 } // namespace tavi

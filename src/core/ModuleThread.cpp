@@ -1,5 +1,6 @@
 #include "core/ModuleThread.h"
 
+#include <exception>
 #include <memory>
 
 #include <wx/private/threadinfo.h>
@@ -21,6 +22,9 @@ DWORD WINAPI runModuleThread(void* parameter)
 {
     ThreadStart start{};
     guarded("module thread", [&] {
+        // Allocates what the C++ runtime keeps for each thread: if memory has run out at the first exception, the lack
+        // of that would end the host.
+        static_cast<void>(std::current_exception());
         std::unique_ptr<ThreadStart> owned(static_cast<ThreadStart*>(parameter));
         start = *owned;
         owned.reset();

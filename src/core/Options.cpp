@@ -1,53 +1,54 @@
 #include "core/Options.h"
 
-#include <windows.h>
 #include <wx/datetime.h>
-#include <wx/msw/registry.h>
 
 #include "core/InstallPaths.h"
-#include "core/Log.h"
+#include "core/Registry.h"
 
 namespace tavi {
 namespace {
 
-template <class Value, class Read>
-std::optional<Value> readOption(const wchar_t* name, Read read)
+constexpr const wchar_t* kManifestTime = L"options.manifestmtime";
+constexpr const wchar_t* kGraylist = L"options.graylist";
+
+// Deletes a value that cannot be read: the service writes a new one when it finds none.
+void deleteOption(const wchar_t* name) noexcept
 {
-    const LogSilencer silence;
-    wxRegKey settings = settingsKey();
-    if (!settings.Exists())
-        return std::nullopt;
-    // A failed read may store a part of the value.
-    Value value{};
-    if (read(settings, value))
-        return value;
-    // The service writes a new value when it finds none.
-    settings.DeleteValue(name);
-    return std::nullopt;
+    if (const RegistryKey settings = openSettingsKey(KEY_SET_VALUE))
+        RegDeleteValueW(settings.get(), name);
 }
 
 } // namespace
 
 std::optional<std::int64_t> readManifestTime()
 {
-    constexpr const wchar_t* kName = L"options.manifestmtime";
-    const auto text =
-        readOption<wxString>(kName, [&](wxRegKey& key, wxString& value) { return key.QueryValue(kName, value); });
+    const RegistryKey settings = openSettingsKey(KEY_READ);
+    if (!settings)
+        return std::nullopt;
+    wxString text;
+    if (queryRegistryText(settings.get(), kManifestTime, text) != ERROR_SUCCESS) {
+        deleteOption(kManifestTime);
+        return std::nullopt;
+    }
     wxDateTime time;
     wxString::const_iterator end;
-    if (!text || !time.ParseDateTime(*text, &end) || !time.IsValid())
+    if (!time.ParseDateTime(text, &end) || !time.IsValid())
         return std::nullopt;
     return time.GetValue().GetValue();
 }
 
 std::optional<bool> readGraylistEnabled()
 {
-    constexpr const wchar_t* kName = L"options.graylist";
-    const auto number =
-        readOption<long>(kName, [&](wxRegKey& key, long& value) { return key.QueryValue(kName, &value); });
-    if (!number)
+    const RegistryKey settings = openSettingsKey(KEY_READ);
+    if (!settings)
         return std::nullopt;
-    return *number != 0;
+    DWORD number = 0;
+    DWORD bytes = sizeof(number);
+    if (RegGetValueW(settings.get(), nullptr, kGraylist, RRF_RT_REG_DWORD, nullptr, &number, &bytes) != ERROR_SUCCESS) {
+        deleteOption(kGraylist);
+        return std::nullopt;
+    }
+    return number != 0;
 }
 
 } // namespace tavi

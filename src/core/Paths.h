@@ -19,7 +19,4 @@ struct PathHash {
 // Full paths, compared exactly, letter case included.
 using PathSet = std::unordered_set<wxString, PathHash>;
 
-// Returns the long form of an existing path, with an upper-case drive letter; empty if it does not exist. Any thread.
-wxString longPath(const wxString& path);
-
 } // namespace tavi

@@ -10,6 +10,9 @@ namespace tavi {
 // One reference-counted object that any thread may take a reference to while another replaces it: a reader gets the old
 // or the new object whole, never waits, and never touches one that has been freed.
 //
+// Not a lock: a reader is often the file manager's own thread in a menu, which must not wait for a writer that has been
+// suspended, and detach runs when a thread may have been terminated inside a lock.
+//
 // A plain pointer cannot do that: the object may be destroyed between the load of the pointer and the AddRef. So the
 // word holds the pointer and the number of readers that are between those two steps. The thread that replaces the
 // object adds that number to the object's own count before it releases the word's reference; a reader that finds its

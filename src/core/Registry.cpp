@@ -7,23 +7,29 @@
 
 namespace tavi {
 
-std::optional<wxString> readRegistryText(HKEY root, const wxString& path, const wxString& name)
+LSTATUS queryRegistryText(HKEY key, const wchar_t* name, wxString& text)
 {
-    RegistryKey key;
-    if (RegOpenKeyExW(root, path.wc_str(), 0, kReadNative, key.out()) != ERROR_SUCCESS)
-        return std::nullopt;
     std::vector<wchar_t> buffer(MAX_PATH);
     for (;;) {
         DWORD bytes = static_cast<DWORD>(buffer.size()) * DWORD{sizeof(wchar_t)};
-        const LONG result =
-            RegGetValueW(key.get(), nullptr, name.wc_str(), RRF_RT_REG_SZ, nullptr, buffer.data(), &bytes);
-        if (result == ERROR_SUCCESS)
-            return wxString(buffer.data(), wcsnlen(buffer.data(), bytes / sizeof(wchar_t)));
-        if (result != ERROR_MORE_DATA)
-            return std::nullopt;
+        const LSTATUS status = RegGetValueW(key, nullptr, name, RRF_RT_REG_SZ, nullptr, buffer.data(), &bytes);
+        if (status == ERROR_SUCCESS)
+            text.assign(buffer.data(), wcsnlen(buffer.data(), bytes / sizeof(wchar_t)));
+        if (status != ERROR_MORE_DATA)
+            return status;
         // RegGetValue may report the size before references are expanded, which is too small.
         buffer.resize(buffer.size() * 2 + bytes / sizeof(wchar_t));
     }
+}
+
+std::optional<wxString> readRegistryText(HKEY root, const wxString& path, const wxString& name)
+{
+    RegistryKey key;
+    wxString text;
+    if (RegOpenKeyExW(root, path.wc_str(), 0, kReadNative, key.out()) != ERROR_SUCCESS ||
+        queryRegistryText(key.get(), name.wc_str(), text) != ERROR_SUCCESS)
+        return std::nullopt;
+    return text;
 }
 
 std::vector<wxString> readRegistryTexts(HKEY root, const wxString& path, const wxString& name)

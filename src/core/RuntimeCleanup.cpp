@@ -6,7 +6,7 @@
 
 #include "core/ThreadLocals.h"
 
-// A function of the C++ runtime that no header declares.
+// A function of the C++ runtime that no header declares: frees the memory that it reserves for exceptions.
 namespace __gnu_cxx { // NOLINT(bugprone-reserved-identifier)
 void __freeres();     // NOLINT(bugprone-reserved-identifier)
 } // namespace __gnu_cxx
@@ -31,7 +31,7 @@ struct LastRelease {
 
 void releaseThreadRuntime() noexcept
 {
-    // The data of the runtime include the exceptions in flight, which a handler further up will read.
+    // The thread's exceptions are part of that data. One that is still being handled would be freed too early.
     if (std::uncaught_exceptions() != 0 || std::current_exception())
         return;
     HMODULE module = nullptr;

@@ -10,6 +10,12 @@
 #include <malloc.h>
 
 #include "core/Boundary.h"
+#include "core/Handles.h"
+#include "core/InitializeOnce.h"
+
+#if __GNUC__ != 12 && !defined(__clang__)
+#error "Compare Variable and __emutls_get_address with libgcc's emutls.c of this compiler, then change the number."
+#endif
 
 namespace {
 
@@ -22,74 +28,61 @@ struct Variable {
     const void* initial;
 };
 
+// The C++ runtime has three variables, a test program one more.
+constexpr std::uintptr_t kMaxVariables = 16;
+
 // The variables of one thread, by number. The threads form a list: when the module is unmapped it frees the variables
 // of threads that still run.
 struct ThreadVariables {
     ThreadVariables* next;
     ThreadVariables** link;
-    std::uintptr_t count;
-    void* variables[1];
+    void* variables[kMaxVariables];
 };
+
+struct SlotTraits {
+    using Handle = DWORD;
+    static Handle none() noexcept
+    {
+        return TLS_OUT_OF_INDEXES;
+    }
+    static void free(Handle index) noexcept
+    {
+        TlsFree(index);
+    }
+};
+using Slot = tavi::UniqueHandle<SlotTraits>;
 
 // Unlike a critical section it needs no clean-up.
 SRWLOCK lock = SRWLOCK_INIT;
 ThreadVariables* allThreads = nullptr;
-std::atomic<std::uintptr_t> lastNumber{0};
+std::uintptr_t lastNumber = 0;
 std::atomic<DWORD> slot{TLS_OUT_OF_INDEXES};
-
-DWORD slotOfThreads() noexcept
-{
-    DWORD index = slot;
-    if (index != TLS_OUT_OF_INDEXES)
-        return index;
-    const DWORD created = TlsAlloc();
-    if (created == TLS_OUT_OF_INDEXES)
-        std::abort();
-    if (slot.compare_exchange_strong(index, created))
-        return created;
-    TlsFree(created);
-    return index;
-}
 
 std::uintptr_t numberOf(Variable& variable) noexcept
 {
-    std::uintptr_t number = variable.number;
-    if (number != 0)
-        return number;
-    const std::uintptr_t next = ++lastNumber;
-    return variable.number.compare_exchange_strong(number, next) ? next : number;
-}
-
-// The caller holds the lock.
-void removeFromList(const ThreadVariables& thread) noexcept
-{
-    *thread.link = thread.next;
-    if (thread.next)
-        thread.next->link = thread.link;
-}
-
-// Returns a copy with room for a few more variables than needed, or null. A thread needs this once or twice.
-ThreadVariables* grow(ThreadVariables* before, std::uintptr_t count) noexcept
-{
-    const std::size_t capacity = count + 4;
-    auto* const grown =
-        static_cast<ThreadVariables*>(std::calloc(1, sizeof(ThreadVariables) + capacity * sizeof(void*)));
-    if (!grown)
-        return nullptr;
-    grown->count = capacity;
-    AcquireSRWLockExclusive(&lock);
-    if (before) {
-        std::memcpy(grown->variables, before->variables, before->count * sizeof(void*));
-        removeFromList(*before);
+    if (variable.number == 0) {
+        AcquireSRWLockExclusive(&lock);
+        if (variable.number == 0)
+            variable.number = ++lastNumber;
+        ReleaseSRWLockExclusive(&lock);
     }
-    grown->next = allThreads;
-    grown->link = &allThreads;
+    return variable.number;
+}
+
+// Creates the record of the calling thread; null without memory.
+ThreadVariables* addThread() noexcept
+{
+    auto* const thread = static_cast<ThreadVariables*>(std::calloc(1, sizeof(ThreadVariables)));
+    if (!thread)
+        return nullptr;
+    AcquireSRWLockExclusive(&lock);
+    thread->next = allThreads;
+    thread->link = &allThreads;
     if (allThreads)
-        allThreads->link = &grown->next;
-    allThreads = grown;
+        allThreads->link = &thread->next;
+    allThreads = thread;
     ReleaseSRWLockExclusive(&lock);
-    std::free(before);
-    return grown;
+    return thread;
 }
 
 void* create(const Variable& variable) noexcept
@@ -104,25 +97,27 @@ void* create(const Variable& variable) noexcept
 
 void freeVariables(ThreadVariables* thread) noexcept
 {
-    for (std::uintptr_t i = 0; i < thread->count; ++i)
-        _aligned_free(thread->variables[i]);
+    for (void* const variable : thread->variables)
+        _aligned_free(variable);
     std::free(thread);
 }
 
+// Returns null if the variable cannot be created.
 void* variableOfThread(Variable& variable) noexcept
 {
-    const DWORD index = slotOfThreads();
-    const std::uintptr_t number = numberOf(variable);
+    const DWORD index = tavi::initializeOnce(slot, [] { return Slot(TlsAlloc()); });
     auto* thread = static_cast<ThreadVariables*>(TlsGetValue(index));
-    if (!thread || thread->count < number) {
-        thread = grow(thread, number);
-        // Like the compiler's own store: without these variables not even an exception can be thrown.
+    if (!thread) {
+        thread = addThread();
         if (!thread || !TlsSetValue(index, thread))
-            std::abort();
+            return nullptr;
     }
+    const std::uintptr_t number = numberOf(variable);
+    if (number > kMaxVariables)
+        return nullptr;
     void*& found = thread->variables[number - 1];
-    if (!found && !(found = create(variable)))
-        std::abort();
+    if (!found)
+        found = create(variable);
     return found;
 }
 
@@ -134,7 +129,9 @@ void releaseThread() noexcept
         return;
     TlsSetValue(index, nullptr);
     AcquireSRWLockExclusive(&lock);
-    removeFromList(*thread);
+    *thread->link = thread->next;
+    if (thread->next)
+        thread->next->link = thread->link;
     ReleaseSRWLockExclusive(&lock);
     freeVariables(thread);
 }
@@ -156,6 +153,9 @@ extern "C" void* __emutls_get_address(void* variable)  // NOLINT(bugprone-reserv
     // The caller may read the error of a system call it made before.
     const DWORD error = GetLastError();
     void* const found = variableOfThread(*static_cast<Variable*>(variable));
+    // Like the compiler's own store: without these variables not even an exception can be thrown.
+    if (!found)
+        std::abort();
     SetLastError(error);
     return found;
 }
@@ -174,8 +174,7 @@ void releaseAllThreadLocals() noexcept
         allThreads = thread->next;
         freeVariables(thread);
     }
-    if (const DWORD index = slot.exchange(TLS_OUT_OF_INDEXES); index != TLS_OUT_OF_INDEXES)
-        TlsFree(index);
+    const Slot released(slot.exchange(TLS_OUT_OF_INDEXES));
 }
 
 } // namespace tavi

@@ -8,7 +8,7 @@
 
 namespace tavi {
 
-const FolderListings::Folder& FolderListings::of(const wxString& path)
+const FolderListings::Folder& FolderListings::find(const wxString& path)
 {
     const auto [place, isNew] = folders_.try_emplace(path);
     if (isNew)

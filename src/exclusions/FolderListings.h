@@ -31,7 +31,7 @@ class FolderListings {
     FolderListings(CurrentTree excluded, CurrentTree userData) noexcept : excluded_(excluded), userData_(userData) {}
 
     // Returns an empty listing if the folder cannot be listed. The reference is valid as long as this object.
-    const Folder& of(const wxString& path);
+    const Folder& find(const wxString& path);
 
   private:
     void list(const wxString& path, Folder& folder) const;

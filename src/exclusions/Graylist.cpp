@@ -38,7 +38,7 @@ PathTreeRef buildAndPublish(PublishedTree& published)
     const auto listings = std::make_shared<FolderListings>([] { return graylist.current.acquire(); },
                                                            [] { return userData.current.acquire(); });
     const RefPtr<PathTree> tree = PathTree::create(false, [listings](const wxString& folder, bool foldersOnly) {
-        const FolderListings::Folder& listed = listings->of(folder);
+        const FolderListings::Folder& listed = listings->find(folder);
         return foldersOnly ? listed.folders : listed.entries;
     });
     volumeTable().refreshVolumes();
@@ -49,14 +49,14 @@ PathTreeRef buildAndPublish(PublishedTree& published)
     return tree;
 }
 
-struct Obtained {
+struct Current {
     PathTreeRef tree;
     // Another thread published the tree while this one waited.
     bool waited;
 };
 
 // Returns the current tree; builds one if there is none or if `refresh` is set.
-Obtained obtain(PublishedTree& published, bool refresh)
+Current currentOrNew(PublishedTree& published, bool refresh)
 {
     if (!refresh) {
         if (PathTreeRef current = published.current.acquire())
@@ -73,27 +73,27 @@ Obtained obtain(PublishedTree& published, bool refresh)
 
 FolderState stateOf(PublishedTree& published, const wxString& path)
 {
-    return obtain(published, false).tree->lookup(view(path));
+    return currentOrNew(published, false).tree->lookup(view(path));
 }
 
 } // namespace
 
 const PathTree* getGraylist(bool refresh)
 {
-    Obtained obtained = obtain(graylist, refresh);
-    // A caller that waited for another builder gets no reference: callers rely on that and do not release one then. The
-    // published reference keeps the tree until the next refresh.
-    return obtained.waited ? obtained.tree.get() : obtained.tree.release();
+    Current current = currentOrNew(graylist, refresh);
+    // A caller that waited for another builder gets no reference of its own; the published one keeps the tree until the
+    // next refresh. A caller counts on this rule: a reference given here too would never be released.
+    return current.waited ? current.tree.get() : current.tree.release();
 }
 
 void buildGraylist(bool refresh)
 {
-    obtain(graylist, refresh);
+    currentOrNew(graylist, refresh);
 }
 
 const PathTree* getUserDataTree(bool refresh)
 {
-    return obtain(userData, refresh).tree.get();
+    return currentOrNew(userData, refresh).tree.get();
 }
 
 bool isGrayed(const wxString& path)
@@ -115,9 +115,7 @@ bool isUserData(const wxString& path)
 
 void dropGraylist() noexcept
 {
-    // At process end the thread that held the lock may have been terminated: this does not wait for it. The pointer can
-    // be replaced without the lock.
-    const std::unique_lock guard(graylist.buildLock, std::try_to_lock);
+    const std::lock_guard guard(graylist.buildLock);
     graylist.current.replace({});
 }
 

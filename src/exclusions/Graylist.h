@@ -4,8 +4,9 @@
 
 #include "exclusions/PathTree.h"
 
-// The default exclusions: the places that a backup leaves out unless the user says otherwise. Any thread. A build is
-// slow and blocks only other builders, and readers while there is no list.
+// The default exclusions: the places that a backup leaves out unless the user says otherwise. For others (see
+// ARCHITECTURE.md): the module builds the list and never asks it. Any thread. A build is slow and blocks only other
+// builders, and readers while there is no list.
 namespace tavi {
 
 // Returns the current list; builds it if there is none or if `refresh` is set. The caller releases one reference,
@@ -24,7 +25,7 @@ bool isPartlyGrayed(const wxString& path);
 // Returns whether a user rule leaves the path out.
 bool isUserData(const wxString& path);
 
-// Releases the current list. Process detach only.
+// Releases the current list, after a build in progress. Process detach only.
 void dropGraylist() noexcept;
 
 } // namespace tavi

@@ -14,10 +14,17 @@ struct Summary {
     bool plain = false;  // beneath some child nothing is on
     bool marked = false; // beneath some child something is on
     bool mixed = false;  // beneath some child something, but not everything, is on
+
+    void add(FolderState state) noexcept
+    {
+        plain |= state <= FolderState::on || state == FolderState::allOff;
+        marked |= state >= FolderState::offSomeOn && state <= FolderState::allOn;
+        mixed |= state >= FolderState::offSomeOn && state <= FolderState::onMostOn;
+    }
 };
 
-// Returns the new state of a node if some entries on disk have no node of their own: those inherit the node's state.
-FolderState withOthers(FolderState own, Summary children) noexcept
+// Returns the new state of a folder some of whose entries have no node of their own: those inherit the folder's state.
+FolderState stateOfSparseFolder(FolderState own, Summary children) noexcept
 {
     switch (own) {
     case FolderState::off:
@@ -40,8 +47,8 @@ FolderState withOthers(FolderState own, Summary children) noexcept
     }
 }
 
-// Returns the new state of a node if every entry on disk has a node of its own.
-FolderState withoutOthers(FolderState own, Summary children) noexcept
+// Returns the new state of a folder each of whose entries has a node of its own.
+FolderState stateOfCoveredFolder(FolderState own, Summary children) noexcept
 {
     if (own > FolderState::allOff)
         return FolderState::off;
@@ -98,7 +105,7 @@ void PathTree::removeChildren(Node& node) noexcept
     }
 }
 
-PathTree::Node& PathTree::makeChild(Node& parent, const wxString& name, FolderState state)
+PathTree::Node& PathTree::makeChild(Node& parent, const wxString& name)
 {
     auto child = std::make_unique<Node>();
     child->parent = &parent;
@@ -107,55 +114,49 @@ PathTree::Node& PathTree::makeChild(Node& parent, const wxString& name, FolderSt
     if (!parent.fullPath.empty() && parent.fullPath.Last() != kSeparator)
         child->fullPath += kSeparator;
     child->fullPath += name;
-    child->state = state;
+    // So that what has no rule of its own beneath it still inherits the same.
+    child->state = parent.state;
     child->foldersOnly = parent.foldersOnly;
     return *(parent.children[name] = std::move(child));
 }
 
 void PathTree::insert(std::wstring_view path, FolderState state)
 {
-    std::vector<Node*> way = {&root_};
+    Node* node = &root_;
     for (bool last = false; !last;) {
-        Node& node = *way.back();
+        Node* const parent = node;
         const wxString name = text(takeComponent(path, last));
-        const auto found = node.children.find(name);
-        if (found != node.children.end()) {
-            if (last) {
-                found->second->state = state;
-                removeChildren(*found->second);
-            } else {
-                way.push_back(found->second.get());
-            }
-        } else if (node.state == FolderState::off && state == FolderState::off) {
+        const auto found = parent->children.find(name);
+        if (found != parent->children.end()) {
+            node = found->second.get();
+        } else if (parent->state == FolderState::off && state == FolderState::off) {
             // The rule would change nothing.
-            last = true;
+            break;
         } else {
-            // A new node above the last one gets its parent's state, so that its other entries still inherit the same.
-            Node& child = makeChild(node, name, last ? state : node.state);
-            if (!last)
-                way.push_back(&child);
+            node = &makeChild(*parent, name);
+        }
+        if (last) {
+            node->state = state;
+            removeChildren(*node);
+            node = parent;
         }
     }
-    for (auto node = way.rbegin(); node != way.rend(); ++node)
-        recompute(**node);
+    for (; node; node = node->parent)
+        recompute(*node);
 }
 
 void PathTree::recompute(Node& node) const
 {
-    Summary summary;
-    for (const auto& [name, child] : node.children) {
-        const FolderState state = child->state;
-        summary.plain |= state <= FolderState::on || state == FolderState::allOff;
-        summary.marked |= state >= FolderState::offSomeOn && state <= FolderState::allOn;
-        summary.mixed |= state >= FolderState::offSomeOn && state <= FolderState::onMostOn;
-    }
     if (node.entryCount == Node::kNotCounted)
         node.entryCount = node.fullPath.empty() ? 0 : counter_(node.fullPath, node.foldersOnly);
     // A folder that is missing or cannot be listed keeps the state of its rule; so does the root.
     if (node.entryCount == 0)
         return;
-    node.state =
-        node.children.size() == node.entryCount ? withoutOthers(node.state, summary) : withOthers(node.state, summary);
+    Summary children;
+    for (const auto& [name, child] : node.children)
+        children.add(child->state);
+    const bool isCovered = node.children.size() == node.entryCount;
+    node.state = isCovered ? stateOfCoveredFolder(node.state, children) : stateOfSparseFolder(node.state, children);
 }
 
 FolderState PathTree::lookup(std::wstring_view path) const

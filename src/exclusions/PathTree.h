@@ -53,7 +53,7 @@ class PathTree : public RefCounted<PathTree> {
     PathTree(bool foldersOnly, EntryCounter counter);
     ~PathTree();
     friend class RefCounted<PathTree>;
-    Node& makeChild(Node& parent, const wxString& name, FolderState state);
+    static Node& makeChild(Node& parent, const wxString& name);
     void recompute(Node& node) const;
     static void removeChildren(Node& node) noexcept;
 

@@ -81,7 +81,7 @@ ExclusionSources systemSources(FolderListings& listings)
     sources.specialFolder = specialFolder;
     sources.temporaryFolder = temporaryFolder;
     sources.windowsFolder = windowsFolder;
-    sources.dollarEntries = [&](const wxString& folder) { return listings.of(folder).dollarEntries; };
+    sources.dollarEntries = [&](const wxString& folder) { return listings.find(folder).dollarEntries; };
     sources.serviceDataFolder = [] { return getDataFilePath(DataFile::directory); };
     sources.userFolders = shellFolderPaths;
     sources.exists = isFolder;

@@ -8,9 +8,8 @@
 
 #include "core/Handles.h"
 #include "core/LogLine.h"
-#include "core/Paths.h"
-#include "core/Privileges.h"
 #include "core/Registry.h"
+#include "exclusions/Privileges.h"
 
 namespace tavi {
 namespace {
@@ -65,16 +64,13 @@ class HivePrivileges {
 };
 
 // Returns the names of all sub-keys. All are read first, since loading a hive changes the enumeration.
-std::vector<wxString> subKeys(HKEY root, const wchar_t* path)
+std::vector<wxString> subKeys(HKEY key)
 {
     std::vector<wxString> names;
-    RegistryKey key;
-    if (RegOpenKeyExW(root, path, 0, kReadNative, key.out()) != ERROR_SUCCESS)
-        return names;
     wchar_t name[256];
     for (DWORD index = 0;; ++index) {
         DWORD length = 256;
-        const LONG result = RegEnumKeyExW(key.get(), index, name, &length, nullptr, nullptr, nullptr, nullptr);
+        const LONG result = RegEnumKeyExW(key, index, name, &length, nullptr, nullptr, nullptr, nullptr);
         if (result == ERROR_SUCCESS)
             names.emplace_back(name, length);
         else if (result != ERROR_MORE_DATA)
@@ -106,7 +102,7 @@ void loadHive(const wxString& profile)
     const wxString file = *image + L"\\ntuser.dat";
     if (GetFileAttributesW(file.wc_str()) == INVALID_FILE_ATTRIBUTES)
         return;
-    // Without Format(), which ends the process if memory runs out.
+    // wxString::Format() would end the process if memory runs out.
     const wxString name(L"tavi" + std::to_wstring(hiveCounter));
     // Recorded before the load: if memory ran out after it, the hive would never be unloaded.
     loadedHives.push_back(name);
@@ -129,7 +125,10 @@ void loadUserHives()
         const HivePrivileges privileges;
         if (!privileges.held())
             return;
-        for (const wxString& profile : subKeys(HKEY_LOCAL_MACHINE, kProfileList))
+        RegistryKey profiles;
+        if (RegOpenKeyExW(HKEY_LOCAL_MACHINE, kProfileList, 0, kReadNative, profiles.out()) != ERROR_SUCCESS)
+            return;
+        for (const wxString& profile : subKeys(profiles.get()))
             loadHive(wxString(kProfileList) + L"\\" + profile);
     } catch (...) {
         unloadUserHives();
@@ -153,10 +152,24 @@ void unloadUserHives() noexcept
     hiveOwners.clear();
 }
 
+wxString longPath(const wxString& path)
+{
+    std::vector<wchar_t> buffer(path.length() + 1);
+    DWORD length = 0;
+    // Repeated after growing; a path that changes meanwhile may need more.
+    while ((length = GetLongPathNameW(path.wc_str(), buffer.data(), static_cast<DWORD>(buffer.size()))) >=
+           buffer.size())
+        buffer.resize(length + 1);
+    if (length >= 2 && buffer[1] == L':' && buffer[0] >= L'a' && buffer[0] <= L'z')
+        buffer[0] = static_cast<wchar_t>(buffer[0] - L'a' + L'A');
+    return wxString(buffer.data(), length);
+}
+
 std::vector<wxString> shellFolderPaths(const wxString& valueName)
 {
     std::vector<wxString> paths;
-    for (const wxString& user : subKeys(HKEY_USERS, nullptr)) {
+    // Not opened: that would return the predefined key itself, which a close would close for the whole host.
+    for (const wxString& user : subKeys(HKEY_USERS)) {
         const auto value = readRegistryText(HKEY_USERS, user + kShellFolders, valueName);
         const wxString path = value ? longPath(*value) : wxString();
         if (path.length() >= 3)

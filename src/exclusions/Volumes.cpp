@@ -26,10 +26,10 @@ VolumeTable theTable(VolumeFunctions::system());
 VolumeFunctions VolumeFunctions::system()
 {
     VolumeFunctions found;
-    if (const HMODULE kernel = GetModuleHandleW(L"ntdll.dll")) {
-        findFunction(kernel, "NtOpenSymbolicLinkObject", found.openLink);
-        findFunction(kernel, "NtQuerySymbolicLinkObject", found.queryLink);
-        findFunction(kernel, "NtClose", found.closeLink);
+    if (const HMODULE ntdll = GetModuleHandleW(L"ntdll.dll")) {
+        findFunction(ntdll, "NtOpenSymbolicLinkObject", found.openLink);
+        findFunction(ntdll, "NtQuerySymbolicLinkObject", found.queryLink);
+        findFunction(ntdll, "NtClose", found.closeLink);
     }
     if (!found.openLink || !found.queryLink || !found.closeLink)
         found.openLink = nullptr;

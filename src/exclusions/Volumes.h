@@ -39,7 +39,7 @@ class VolumeTable {
     void refreshVolumes();
     // Drive roots and folders, ending in a backslash.
     std::set<wxString> mountPoints() const;
-    // Returns the mount point that was last reported for a device, or an empty text.
+    // Returns the mount point that was last reported for a device, or an empty text. For others, like the list.
     wxString mountPointOf(const wxString& device) const;
 
   private:

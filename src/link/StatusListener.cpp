@@ -6,6 +6,7 @@
 
 #include "core/Boundary.h"
 #include "core/Handles.h"
+#include "core/InitializeOnce.h"
 #include "link/PipeIo.h"
 
 namespace tavi {
@@ -18,31 +19,14 @@ constexpr DWORD kHangUpMs = 10;
 
 std::atomic<MessageSink> messageSink{nullptr};
 
-// Creates the status on its first use. Not a local static: threads that meet in the guard of one make the C++ runtime
-// create two semaphores and an event, which would outlive the module. Here both create a status, and one of the two is
-// kept.
-class LazyStatus {
-  public:
-    ~LazyStatus()
+// Destroyed when the module is unmapped.
+struct SharedStatus {
+    std::atomic<TransferStatus*> status{nullptr};
+    ~SharedStatus()
     {
-        delete status_.load();
+        delete status.load();
     }
-    TransferStatus& get()
-    {
-        TransferStatus* status = status_.load();
-        if (!status) {
-            auto created =
-                std::make_unique<TransferStatus>(true, [] { return static_cast<std::uint32_t>(GetTickCount()); });
-            if (status_.compare_exchange_strong(status, created.get()))
-                status = created.release();
-        }
-        return *status;
-    }
-
-  private:
-    std::atomic<TransferStatus*> status_{nullptr};
-};
-LazyStatus lazyStatus;
+} sharedStatus;
 
 FileHandle openStatusPipe() noexcept
 {
@@ -68,7 +52,9 @@ void followConnection(HANDLE pipe, const StopCheck& stopCheck)
 
 TransferStatus& transferStatus()
 {
-    return lazyStatus.get();
+    return *initializeOnce(sharedStatus.status, [] {
+        return std::make_unique<TransferStatus>(true, [] { return static_cast<std::uint32_t>(GetTickCount()); });
+    });
 }
 
 void setMessageSink(MessageSink sink) noexcept

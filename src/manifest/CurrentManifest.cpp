@@ -9,7 +9,6 @@
 #include "core/Handles.h"
 #include "core/Options.h"
 #include "core/ScopeGuard.h"
-#include "exclusions/Graylist.h"
 #include "manifest/ManifestWatcher.h"
 
 namespace tavi {
@@ -29,12 +28,13 @@ class SharedReference {
 };
 
 WatcherState watcher;
+std::atomic<ExclusionBuilder> exclusionBuilder{nullptr};
 // The reference of the newest menu.
 SharedReference menuManifest;
 // The reference of the menu before. The watcher releases it: to destroy a large manifest takes longer than a menu may.
 SharedReference retiredManifest;
 
-// Created before the process entry runs. Serialises the start of the watcher.
+// Created before the process entry runs. Serializes the start of the watcher.
 const KernelHandle manifestMutex(CreateMutexW(nullptr, FALSE, nullptr));
 
 void watchManifest(const BackgroundThread& self)
@@ -48,13 +48,21 @@ void watchManifest(const BackgroundThread& self)
         retiredManifest.exchange({});
     };
     services.isStopping = [&] { return self.isStopping(); };
-    services.buildExclusions = [](bool isFirst) { buildGraylist(!isFirst); };
+    services.buildExclusions = [](bool isFirst) {
+        if (const ExclusionBuilder build = exclusionBuilder)
+            build(isFirst);
+    };
     runManifestWatcher(watcher, services);
 }
 
 BackgroundThread watcherThread("manifest watcher", watchManifest);
 
 } // namespace
+
+void setExclusionBuilder(ExclusionBuilder builder) noexcept
+{
+    exclusionBuilder = builder;
+}
 
 ManifestRef getCurrentManifest() noexcept
 {
@@ -104,7 +112,6 @@ void stopManifestWatcher() noexcept
     watcher.manifest.replace({});
     menuManifest.exchange({});
     retiredManifest.exchange({});
-    dropGraylist();
 }
 
 } // namespace tavi

@@ -5,6 +5,12 @@
 // The manifest in force and the watcher, the thread that loads it.
 namespace tavi {
 
+// Builds the default exclusions, of which this layer knows nothing, on the watcher's thread: when it starts, with
+// `isFirst` set, and then every 90 seconds.
+using ExclusionBuilder = void (*)(bool isFirst);
+// To be set before the watcher starts. Without a builder none are built.
+void setExclusionBuilder(ExclusionBuilder builder) noexcept;
+
 // Returns the manifest in force, or null before the first load; then it also starts the watcher. Never waits. Any
 // thread.
 ManifestRef getCurrentManifest() noexcept;
@@ -22,8 +28,8 @@ void resumeWatcher() noexcept;
 // Returns false before the watcher's first start and after its end.
 bool isWatcherActive() noexcept;
 
-// Asks the watcher to end, without waiting for it, and releases the manifest in force, the menu's and the list of
-// default exclusions. Process detach only.
+// Asks the watcher to end, without waiting for it, and releases the manifest in force and the menu's. Process detach
+// only.
 void stopManifestWatcher() noexcept;
 
 } // namespace tavi

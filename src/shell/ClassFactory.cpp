@@ -13,7 +13,8 @@
 namespace tavi {
 namespace {
 
-// Not an atomic change: COM asks for factories one at a time and releases each on the thread that asked for it.
+// Two steps, not an atomic one: a change that another thread makes between them is lost. Then the module stays loaded,
+// or is unloaded while an object lives. It takes two threads of the host that use factories at the same instant.
 void countPlainly(int change) noexcept
 {
     auto& count = moduleRefCount();
@@ -25,7 +26,7 @@ class ClassFactory final : public ComObject<ClassFactory<Object>, IClassFactory>
     using Base = ComObject<ClassFactory, IClassFactory>;
 
   public:
-    static constexpr typename Base::Answer kInterfaces[] = {
+    static constexpr typename Base::InterfaceEntry kInterfaces[] = {
         {&IID_IUnknown, Base::template tableOf<IClassFactory>},
         {&IID_IClassFactory, Base::template tableOf<IClassFactory>},
     };

@@ -13,7 +13,7 @@ namespace tavi {
 // object, in that order, then the count, which starts at 0. The count is plain: an object is used only by the thread
 // that created it.
 //
-// `Derived` declares `kInterfaces`, the answers of QueryInterface.
+// `Derived` declares `kInterfaces`, the interfaces that QueryInterface finds.
 template <class Derived, class... Interfaces>
 class ComObject : public Interfaces... {
   public:
@@ -26,10 +26,10 @@ class ComObject : public Interfaces... {
             if (!object)
                 return E_POINTER;
             *object = nullptr;
-            for (const Answer& answer : Derived::kInterfaces) {
-                if (!IsEqualIID(interfaceId, *answer.interfaceId))
+            for (const InterfaceEntry& entry : Derived::kInterfaces) {
+                if (!IsEqualIID(interfaceId, *entry.interfaceId))
                     continue;
-                *object = answer.table(static_cast<Derived*>(this));
+                *object = entry.table(static_cast<Derived*>(this));
                 AddRef();
                 return S_OK;
             }
@@ -59,8 +59,8 @@ class ComObject : public Interfaces... {
     }
 
   protected:
-    // An interface that the object answers to, and the table that it answers with.
-    struct Answer {
+    // An interface that QueryInterface finds, and its table.
+    struct InterfaceEntry {
         const IID* interfaceId;
         void* (*table)(Derived* object);
     };

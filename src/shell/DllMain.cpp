@@ -12,12 +12,13 @@ extern "C" BOOL WINAPI DllMain(HINSTANCE instance, DWORD reason, LPVOID reserved
 {
     using namespace tavi;
     return guarded("DllMain", BOOL{TRUE}, [&]() -> BOOL {
-        // The kernel keeps sending thread notifications, because the static C runtime has thread-local storage.
+        // The loader keeps sending thread notifications, because the static C runtime has thread-local storage.
         if (reason == DLL_THREAD_ATTACH || reason == DLL_THREAD_DETACH)
             return TRUE;
-        // The kernel cuts a longer path and leaves out the terminator.
+        // A longer path is cut and has no terminator.
         wchar_t host[MAX_PATH + 1];
-        GetModuleFileNameW(nullptr, host, MAX_PATH);
+        if (GetModuleFileNameW(nullptr, host, MAX_PATH) == 0)
+            return FALSE;
         host[MAX_PATH] = L'\0';
         const HostKind kind = hostKindOf(host);
         if (kind == HostKind::refused)
@@ -40,7 +41,8 @@ extern "C" BOOL WINAPI tavishellEntry(HINSTANCE instance, DWORD reason, LPVOID r
 // The linker's entry point. At the end of a process it bypasses the C runtime, which would destroy static objects that
 // killed threads were changing, and would wait for locks that those threads held.
 //
-// At attach the C runtime chooses the stack protector's cookie. A function that checked it would see it change.
+// At attach the C runtime runs the constructor that chooses the stack protector's guard (core/StackProtector.c). This
+// function is active then: if it had a guard, it would see it change.
 extern "C" __attribute__((no_stack_protector)) BOOL WINAPI tavishellEntry(HINSTANCE instance, DWORD reason,
                                                                           LPVOID reserved)
 {

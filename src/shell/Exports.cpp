@@ -42,7 +42,7 @@ STDAPI DllCanUnloadNow()
     });
 }
 
-// Both return the kernel's error code, not an HRESULT: registration tools show the code as it is.
+// Both return the system's error code, not an HRESULT: registration tools show the code as it is.
 STDAPI DllRegisterServer()
 {
     return guarded("DllRegisterServer", E_FAIL, [] { return static_cast<HRESULT>(registerServer()); });

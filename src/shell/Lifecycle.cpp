@@ -6,10 +6,12 @@
 #include <shlobj.h>
 
 #include "core/BackgroundThread.h"
+#include "core/Boundary.h"
 #include "core/Handles.h"
 #include "core/Log.h"
 #include "core/LogLine.h"
 #include "core/Module.h"
+#include "exclusions/Graylist.h"
 #include "link/StatusListener.h"
 #include "manifest/CurrentManifest.h"
 #include "statedb/Database.h"
@@ -18,6 +20,7 @@
 namespace tavi {
 namespace {
 
+// wxLOG_Message: keeps errors and warnings, drops the line of the attach.
 constexpr unsigned long kLogLevel = 3;
 constexpr DWORD kStatusThreadTimeoutMs = 500;
 
@@ -74,11 +77,13 @@ HostKind hostKindOf(const wchar_t* executablePath) noexcept
 
 void attachToFileManager(HINSTANCE instance, const wchar_t* hostPath)
 {
-    openLog(kLogLevel);
+    // Memory that runs out here costs the log only. No later step throws.
+    guarded("log", [] { openLog(kLogLevel); });
     logInfo(L"Attaching to %ls", hostPath);
     setModuleInstance(instance);
     acquireShellAllocator();
     DisableThreadLibraryCalls(instance);
+    setExclusionBuilder([](bool isFirst) { buildGraylist(!isFirst); });
     // Starts the watcher.
     getCurrentManifest();
     statusThread.start();
@@ -94,6 +99,7 @@ void detachFromFileManager(bool processEnds)
         return;
     freeMenuBitmaps();
     stopManifestWatcher();
+    dropGraylist();
     statusThread.requestStop();
     stopStatusThread();
     shutDownDatabaseLibrary();

@@ -14,7 +14,7 @@ enum class HostKind { refused, toolOnly, fileManager };
 HostKind hostKindOf(const wchar_t* executablePath) noexcept;
 
 void attachToFileManager(HINSTANCE instance, const wchar_t* hostPath);
-// With `processEnds` the kernel frees everything, and only work that takes no lock of the process is done.
+// With `processEnds` the system frees everything, and only work that takes no lock of the process is done.
 void detachFromFileManager(bool processEnds);
 
 // Returns the shell's allocator while the module is attached to a file manager, else null. Not owned by the caller.

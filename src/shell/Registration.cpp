@@ -15,7 +15,7 @@ namespace {
 const wchar_t kDisplayName[] = L"Tavi Remote Backup Shell Extension";
 const wchar_t kApprovedKey[] = L"Software\\Microsoft\\Windows\\CurrentVersion\\Shell Extensions\\Approved";
 constexpr REGSAM kReadWrite = KEY_READ | KEY_WRITE;
-// The kernel's limit for the name of a key, with its terminator.
+// Windows' limit for the name of a key, with its terminator.
 constexpr DWORD kKeyNameChars = 256;
 
 const wchar_t* const kHandlerKeys[] = {
@@ -28,7 +28,7 @@ const wchar_t* const kHandlerKeys[] = {
 
 // Deleted after the class key and, like it, below the CLSID key. There is none of them there, so the run ends with
 // ERROR_FILE_NOT_FOUND and the handler keys and the approved value stay: installers delete those themselves and expect
-// that code. The README lists what stays.
+// that code.
 const wchar_t* const kFormerKeys[] = {
     L"AllFileSystemObjects\\shellex\\PropertySheetHandlers\\Tavi",
     L"AllFileSystemObjects\\shellex\\ContextMenuHandlers\\Tavi",

@@ -3,7 +3,7 @@
 #include <windows.h>
 
 // The registry entries that make the file manager load the module. A failing step ends the run: nothing is rolled back
-// or logged. Each function returns 0 or the kernel's code of the step that failed.
+// or logged. Each function returns 0 or the system's code of the step that failed.
 namespace tavi {
 
 LSTATUS registerServer();

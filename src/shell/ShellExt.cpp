@@ -21,7 +21,7 @@ constexpr std::int32_t kOverlayState = 1;
 constexpr std::size_t kFirstPathChars = 264;
 constexpr std::size_t kPathStepChars = 4;
 
-// Returns 0 or the kernel's error code.
+// Returns 0 or the system's error code.
 DWORD readModulePath(wxString& path)
 {
     std::vector<wchar_t> buffer(kFirstPathChars);

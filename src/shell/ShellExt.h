@@ -13,13 +13,14 @@ namespace tavi {
 
 // The object that the file manager creates for a context menu. Used only by the thread that created it.
 //
-// The property-sheet and icon-overlay tables are part of the object's layout, but QueryInterface answers neither: a
-// host that found them would add a page and badges that no registration of the module asks for.
+// The property-sheet and icon-overlay tables are for others (see ARCHITECTURE.md), who take them by their places in the
+// object. QueryInterface finds neither: a host that found them would add a page and badges that no registration of the
+// module asks for.
 class ShellExt final
     : public ComObject<ShellExt, IShellPropSheetExt, IShellExtInit, IContextMenu, IShellIconOverlayIdentifier> {
   public:
     static constexpr CLSID kClassId = {0x5e0c31a7, 0x8d42, 0x4b19, {0xa6, 0xf3, 0x2c, 0x7d, 0x90, 0xe1, 0xb8, 0x45}};
-    static constexpr Answer kInterfaces[] = {
+    static constexpr InterfaceEntry kInterfaces[] = {
         {&IID_IUnknown, tableOf<IShellPropSheetExt>},
         {&IID_IShellExtInit, tableOf<IShellExtInit>},
         {&IID_IContextMenu, tableOf<IContextMenu>},

@@ -8,7 +8,8 @@
 
 namespace tavi {
 
-// A shell folder that parses every name to the empty item id list and refuses every other operation.
+// A shell folder that parses every name to the empty item id list and refuses every other operation. For others (see
+// ARCHITECTURE.md): no registration of this module names it.
 class RefusingFolder : public IShellFolder {
   public:
     STDMETHODIMP ParseDisplayName(HWND window, IBindCtx* context, LPWSTR name, ULONG* eaten, PIDLIST_RELATIVE* items,
@@ -33,7 +34,7 @@ class RefusingFolder : public IShellFolder {
 class StubFolder final : public ComObject<StubFolder, IPersistFolder, RefusingFolder> {
   public:
     static constexpr CLSID kClassId = {0x7d19e0b2, 0x5a63, 0x4f8e, {0x9c, 0x21, 0xb4, 0xe8, 0x7a, 0x0d, 0x3f, 0x56}};
-    static constexpr Answer kInterfaces[] = {
+    static constexpr InterfaceEntry kInterfaces[] = {
         {&IID_IUnknown, tableOf<IPersistFolder>},       {&IID_IPersist, tableOf<IPersistFolder>},
         {&IID_IPersistFolder, tableOf<IPersistFolder>}, {&IID_IPersistFolder2, tableOf<IPersistFolder>},
         {&IID_IShellFolder, tableOf<RefusingFolder>},
@@ -43,7 +44,7 @@ class StubFolder final : public ComObject<StubFolder, IPersistFolder, RefusingFo
     STDMETHODIMP Initialize(PCIDLIST_ABSOLUTE folder) override;
 
   private:
-    // Part of the object's layout; no operation reads it.
+    // Keeps the size of the object for those who know its layout; no operation reads it.
     [[maybe_unused]] std::int32_t unread_ = -1;
     ModuleLock lock_;
 };

@@ -3,6 +3,7 @@
 #include <atomic>
 
 #include "core/Handles.h"
+#include "core/InitializeOnce.h"
 #include "core/Module.h"
 #include "ui/resource.h"
 
@@ -17,50 +18,36 @@ struct ContextTraits : InvalidIsNone {
 };
 using ContextHandle = UniqueHandle<ContextTraits>;
 
-HANDLE createModuleContext() noexcept
+ContextHandle createModuleContext() noexcept
 {
-    // The kernel needs the path beside the handle. Without a context the host's controls are used.
+    // Windows needs the path beside the handle. Without a context the host's controls are used.
     wchar_t path[MAX_PATH];
     const DWORD length = GetModuleFileNameW(moduleInstance(), path, MAX_PATH);
     if (length == 0 || length >= MAX_PATH)
-        return INVALID_HANDLE_VALUE;
+        return {};
     ACTCTXW request{};
     request.cbSize = sizeof(request);
     request.dwFlags = ACTCTX_FLAG_HMODULE_VALID | ACTCTX_FLAG_RESOURCE_NAME_VALID;
     request.lpSource = path;
     request.lpResourceName = MAKEINTRESOURCEW(TAVI_MANIFEST);
     request.hModule = moduleInstance();
-    return CreateActCtxW(&request);
+    return ContextHandle(CreateActCtxW(&request));
 }
 
-// Created on first use, released when the module is unmapped. Not a local static: threads that meet in the guard of one
-// make the C++ runtime create two semaphores and an event, which would outlive the module. Here both create a context,
-// and one of the two is kept.
-class ModuleContext {
-  public:
+// Released when the module is unmapped.
+struct ModuleContext {
+    std::atomic<HANDLE> context{INVALID_HANDLE_VALUE};
     ~ModuleContext()
     {
-        const ContextHandle released(context_);
+        const ContextHandle released(context);
     }
-    HANDLE get() noexcept
-    {
-        HANDLE context = context_;
-        if (context != INVALID_HANDLE_VALUE)
-            return context;
-        ContextHandle created(createModuleContext());
-        return context_.compare_exchange_strong(context, created.get()) ? created.release() : context;
-    }
-
-  private:
-    std::atomic<HANDLE> context_{INVALID_HANDLE_VALUE};
-};
-ModuleContext moduleContext;
+} moduleContext;
 
 } // namespace
 
 ActivationScope::ActivationScope() noexcept
 {
-    const HANDLE context = moduleContext.get();
+    const HANDLE context = initializeOnce(moduleContext.context, createModuleContext);
     active_ = context != INVALID_HANDLE_VALUE && ActivateActCtx(context, &cookie_);
 }
 

@@ -5,54 +5,81 @@
 
 #include "core/Handles.h"
 
-using namespace tavi;
+namespace tavi {
+namespace {
 
-static std::atomic<int> bodies{0};
-static std::atomic<DWORD> thread{0};
-static std::atomic<bool> sawStop{false};
-static const KernelHandle entered(CreateSemaphoreW(nullptr, 0, 100, nullptr));
-static const KernelHandle leave(CreateSemaphoreW(nullptr, 0, 100, nullptr));
+std::atomic<int> bodies{0};
+std::atomic<DWORD> thread{0};
+std::atomic<bool> sawStop{false}, throws{false};
+const KernelHandle entered(CreateSemaphoreW(nullptr, 0, 100, nullptr));
+const KernelHandle leave(CreateSemaphoreW(nullptr, 0, 100, nullptr));
 
-static bool waitFor(const KernelHandle& handle)
+bool waitFor(const KernelHandle& handle)
 {
     return WaitForSingleObject(handle.get(), 60000) == WAIT_OBJECT_0;
 }
 
-static BackgroundThread subject("test", [](const BackgroundThread& self) {
+BackgroundThread subject("test", [](const BackgroundThread& self) {
     thread = GetCurrentThreadId();
-    const int body = ++bodies;
+    ++bodies;
     ReleaseSemaphore(entered.get(), 1, nullptr);
     waitFor(leave);
     sawStop = self.isStopping();
-    if (body == 3)
+    if (throws)
         throw 1;
 });
 
-TEST(BackgroundThread, RunsOnceAndItsStopCanBeWithdrawn)
+// Starts the thread, whose body waits.
+struct BackgroundThreads : testing::Test {
+    BackgroundThreads()
+    {
+        bodies = 0;
+        throws = false;
+        subject.start();
+        EXPECT_TRUE(waitFor(entered));
+    }
+    // Lets the body return and waits for the end of the thread.
+    static void expectEnd()
+    {
+        const KernelHandle ended(subject.releaseHandle());
+        ReleaseSemaphore(leave.get(), 1, nullptr);
+        EXPECT_TRUE(waitFor(ended));
+        EXPECT_FALSE(subject.isActive());
+    }
+};
+
+TEST_F(BackgroundThreads, RunOnceUntilTheyAreStopped)
 {
+    subject.start();
+    subject.requestStop();
+    expectEnd();
+    EXPECT_TRUE(sawStop);
+    EXPECT_EQ(bodies, 1);
     subject.requestStop(); // nothing to stop
-    subject.start();
-    subject.start();
-    ASSERT_TRUE(waitFor(entered));
+    EXPECT_FALSE(subject.isStopping());
+}
+
+TEST_F(BackgroundThreads, RunAgainOnTheSameThreadIfTheStopIsWithdrawn)
+{
     const DWORD first = thread;
     subject.requestStop();
     EXPECT_TRUE(subject.isStopping());
-    subject.start(); // before the body has looked at the stop: it runs again, because it returned
+    subject.start();
     EXPECT_FALSE(subject.isStopping());
     ReleaseSemaphore(leave.get(), 1, nullptr);
-    ASSERT_TRUE(waitFor(entered));
-    EXPECT_TRUE(!sawStop && thread == first) << "a second thread would compete with the first";
-
-    // Once the thread has ended, by request or by an exception, it can be started again.
-    const wxLogNull quiet;
-    for (int body = 2; body <= 4; ++body) {
-        if (body != 3)
-            subject.requestStop();
-        const KernelHandle ended(subject.releaseHandle());
-        ReleaseSemaphore(leave.get(), 1, nullptr);
-        EXPECT_TRUE(waitFor(ended) && !subject.isActive() && sawStop == (body != 3)) << body;
-        if (body < 4)
-            subject.start();
-        EXPECT_TRUE(body == 4 || waitFor(entered));
-    }
+    EXPECT_TRUE(waitFor(entered));
+    EXPECT_FALSE(sawStop);
+    EXPECT_EQ(thread, first) << "a second thread would compete with the first";
+    subject.requestStop();
+    expectEnd();
 }
+
+TEST_F(BackgroundThreads, EndAfterAnException)
+{
+    const wxLogNull quiet;
+    throws = true;
+    expectEnd();
+}
+
+} // namespace
+} // namespace tavi

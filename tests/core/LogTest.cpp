@@ -3,9 +3,14 @@
 #include <fstream>
 #include <regex>
 
+#include <io.h>
+#include <process.h>
+#include <winternl.h>
 #include <gtest/gtest.h>
+#include <wx/stdpaths.h>
 
 #include "core/Boundary.h"
+#include "core/LogLine.h"
 #include "tests/support/Allocations.h"
 #include "tests/support/LogCapture.h"
 #include "tests/support/Registry.h"
@@ -19,7 +24,20 @@ std::string contentOf(const std::wstring& path)
 {
     std::ifstream file(toUtf8(path));
     const std::string content(std::istreambuf_iterator<char>(file), {});
-    return std::regex_replace(content, std::regex("\\d\\d[A-Z][a-z]{2}\\d{4} \\d\\d:\\d\\d:\\d\\d: "), "@ ");
+    return std::regex_replace(content, std::regex("\\d\\d[A-Z][a-z]{2}20\\d\\d \\d\\d:\\d\\d:\\d\\d: "), "@ ");
+}
+
+// Returns the handle of the stream that has this file open.
+HANDLE handleOf(const std::wstring& path)
+{
+    for (int descriptor = 3; descriptor < 64; ++descriptor) {
+        const auto handle = reinterpret_cast<HANDLE>(_get_osfhandle(descriptor));
+        wchar_t name[MAX_PATH] = L"";
+        GetFinalPathNameByHandleW(handle, name, MAX_PATH, 0);
+        if (std::wstring(name).find(path.substr(path.rfind(L'\\', path.rfind(L'\\') - 1))) != std::wstring::npos)
+            return handle;
+    }
+    return nullptr;
 }
 
 struct Log : testing::Test {
@@ -34,14 +52,23 @@ struct Log : testing::Test {
 TEST_F(Log, LinesAreInTheFileAtOnce)
 {
     ASSERT_TRUE(openLog(3));
-    wxLogWarning("at once: %d", 7);
-    wxLogInfo("Attaching to %s", "nobody");
-    wxLogError("%s", wxString(L'x', 5000));
+    logWarning(L"at once: %d", 7);
+    logInfo(L"Attaching to %ls", L"nobody");
+    logError(L"%ls", std::wstring(5000, L'x').c_str());
     EXPECT_EQ(guarded("another", 4, []() -> int { throw 1; }), 4);
     EXPECT_EQ(contentOf(path), "@ Warning: at once: 7\n@ Error: " + std::string(4095, 'x') +
                                    "\n@ Error: Unhandled exception in another\n");
     closeLog();
     EXPECT_TRUE(DeleteFileW(path.c_str()));
+}
+
+TEST_F(Log, HasOneEncodingAndReplacesWhatItLacks)
+{
+    ASSERT_EQ(GetACP(), 1252u);
+    ASSERT_TRUE(openLog(3));
+    for (const wchar_t* const text : {L"\u00E9", L"\u20AC", L"\u00E9\u0416", L"a\xD800z"})
+        logWarning(L"%ls", text);
+    EXPECT_EQ(contentOf(path), "@ Warning: \xE9\n@ Warning: \x80\n@ Warning: \xE9?\n@ Warning: a?z\n");
 }
 
 TEST_F(Log, BoundaryHoldsIfMemoryRunsOut)
@@ -58,7 +85,6 @@ TEST_F(Log, KeepsThePreviousTargetIfTheFileCannotBeOpened)
 {
     service.install().SetValue(L"DataPath", wxString(L"C:\\no such folder"));
     test::LogCapture log;
-    std::pair<LogSilencer, LogSilencer>(); // those that overlap must not leave the log off
     EXPECT_TRUE(openLog(3));
     EXPECT_NE(log.takeText().find("Unable to open logfile C:\\no such folder\\tavi.log"), std::string::npos);
     wxLog::SetActiveTarget(nullptr);
@@ -78,6 +104,34 @@ TEST_F(Log, WaitsThirtySecondsForTheDataDirectory)
         EXPECT_EQ(openLog(wxLOG_Max, sleep), installedAfter == 30);
         EXPECT_EQ(sleeps, 30);
     }
+}
+
+TEST(LogOfTwoProcesses, HasTheLinesOfBothAndIsNotInherited)
+{
+    if (std::getenv("SECOND")) {
+        ASSERT_TRUE(openLog(3));
+        logWarning(L"theirs");
+        return closeLog();
+    }
+    const test::InstalledService service;
+    const std::wstring path = service.file(L"tavi.log");
+    std::ofstream(toUtf8(path)) << "former\n";
+    ASSERT_TRUE(openLog(3));
+    logWarning(L"ours");
+    _putenv("SECOND=1");
+    const wxString program = wxStandardPaths::Get().GetExecutablePath();
+    EXPECT_EQ(_wspawnl(_P_WAIT, program.wc_str(), L"test", L"--gtest_filter=LogOfTwoProcesses.*", nullptr), 0);
+    logWarning(L"last");
+    EXPECT_EQ(contentOf(path), "former\n@ Warning: ours\n@ Warning: theirs\n@ Warning: last\n");
+    // Windows appends at the same instant, too, if the handle has no other right to write. Wine does not.
+    const HANDLE log = handleOf(path);
+    PUBLIC_OBJECT_BASIC_INFORMATION object{};
+    EXPECT_EQ(NtQueryObject(log, ObjectBasicInformation, &object, sizeof(object), nullptr), 0);
+    EXPECT_EQ(object.GrantedAccess & (FILE_APPEND_DATA | FILE_WRITE_DATA), ACCESS_MASK{FILE_APPEND_DATA});
+    DWORD flags = HANDLE_FLAG_INHERIT;
+    EXPECT_TRUE(GetHandleInformation(log, &flags));
+    EXPECT_EQ(flags & HANDLE_FLAG_INHERIT, 0u) << "a program that the host starts would keep the file open";
+    closeLog();
 }
 
 } // namespace

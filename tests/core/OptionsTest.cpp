@@ -2,21 +2,53 @@
 
 #include <gtest/gtest.h>
 
+#include "core/Boundary.h"
+#include "tests/support/Allocations.h"
 #include "tests/support/LogCapture.h"
 #include "tests/support/Registry.h"
 
-TEST(Options, ValuesOfAnotherTypeAreDeletedInSilence)
+namespace tavi {
+namespace {
+
+struct Options : testing::Test {
+    Options()
+    {
+        settings.Create();
+    }
+    const test::InstalledService service;
+    wxRegKey settings = settingsKey();
+    test::LogCapture log;
+};
+
+TEST_F(Options, OfAnotherTypeAreDeletedInSilence)
 {
-    const tavi::test::InstalledService service;
-    wxRegKey settings = tavi::settingsKey();
-    settings.Create();
-    tavi::test::LogCapture log;
     settings.SetValue(L"options.graylist", 2L);
-    EXPECT_EQ(tavi::readGraylistEnabled(), true);
+    EXPECT_EQ(readGraylistEnabled(), true);
     settings.SetValue(L"options.graylist", wxString(L"1"));
     settings.SetValue(L"options.manifestmtime", 5L);
-    EXPECT_FALSE(tavi::readGraylistEnabled() || tavi::readManifestTime() || settings.HasValues());
+    EXPECT_FALSE(readGraylistEnabled());
+    EXPECT_FALSE(readManifestTime());
+    EXPECT_FALSE(settings.HasValues());
     settings.SetValue(L"options.manifestmtime", wxString(L"soon"));
-    EXPECT_TRUE(!tavi::readManifestTime() && settings.HasValues()) << "a text, though no time, stays";
+    EXPECT_FALSE(readManifestTime());
+    EXPECT_TRUE(settings.HasValues()) << "a text, though no time, stays";
     EXPECT_EQ(log.takeText(), "");
 }
+
+TEST_F(Options, AndPathsAreReadOrGivenUpWhereMemoryRunsOut)
+{
+    settings.SetValue(L"options.manifestmtime", wxString(L"1970-01-02 00:00:01"));
+    std::optional<std::int64_t> time;
+    wxString path;
+    for (int succeeding = 0; path.empty() && succeeding < 1000; ++succeeding) {
+        const test::FailingAllocations few(succeeding);
+        guarded("time", [&] { time = readManifestTime(); });
+        guarded("path", [&] { path = getDataFilePath(DataFile::log); });
+    }
+    EXPECT_EQ(time, 86401000);
+    EXPECT_EQ(path, service.file(L"tavi.log"));
+    EXPECT_TRUE(settings.HasValue(L"options.manifestmtime"));
+}
+
+} // namespace
+} // namespace tavi

@@ -44,6 +44,17 @@ TEST_F(UserProfiles, AreReachableFromTheOutermostLoadToItsUnload)
     EXPECT_EQ(names.size(), 4u) << "each load uses new names";
 }
 
+TEST(LongPath, HasAnUpperCaseDriveLetterAndIsEmptyIfThereIsNone)
+{
+    const TemporaryFolder folder;
+    wchar_t shortPath[MAX_PATH];
+    GetShortPathNameW(folder.path().c_str(), shortPath, MAX_PATH);
+    EXPECT_NE(shortPath, folder.path());
+    shortPath[0] = L'c';
+    EXPECT_EQ(longPath(shortPath), L"C" + folder.path().substr(1));
+    EXPECT_EQ(longPath(folder.path() + L"\\missing"), L"");
+}
+
 TEST_F(UserProfiles, LeaveNoHiveLoadedWhereMemoryRunsOut)
 {
     for (int succeeding = 0; temporaryHives().empty() && succeeding < 1000; ++succeeding) {

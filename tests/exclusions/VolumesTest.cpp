@@ -10,6 +10,8 @@
 namespace tavi {
 namespace {
 
+using namespace std::string_literals;
+
 // Wine reports the type of every drive as unknown and has no mounted folders. These functions return what Windows does.
 // The paths of each volume, and the error of reading them: ERROR_MORE_DATA (234) fails the second call.
 std::vector<std::pair<std::wstring, DWORD>> volumes;
@@ -29,7 +31,11 @@ HANDLE WINAPI findFirst(LPWSTR name, DWORD size)
 }
 UINT WINAPI driveType(LPCWSTR name)
 {
-    return std::wcscmp(name, L"\\\\?\\Volume{2}\\") == 0 ? DRIVE_REMOVABLE : DRIVE_FIXED;
+    return std::wcscmp(name, L"\\\\?\\Volume{3}\\") == 0 ? DRIVE_REMOVABLE : DRIVE_FIXED;
+}
+DWORD WINAPI queryDevice(LPCWSTR, LPWSTR device, DWORD size)
+{
+    return static_cast<DWORD>(std::swprintf(device, size, L"\\Device\\%u", static_cast<unsigned>(current)));
 }
 BOOL WINAPI pathNames(LPCWSTR, LPWSTR paths, DWORD size, PDWORD length)
 {
@@ -40,11 +46,51 @@ BOOL WINAPI pathNames(LPCWSTR, LPWSTR paths, DWORD size, PDWORD length)
     return size > 0 && error == 0;
 }
 
+// A namespace in which device 0 links to a target, device 1 is no link, and the link of device 2 cannot be read.
+int openLinks = 0;
+NTSTATUS NTAPI openLink(HANDLE* link, ACCESS_MASK access, OBJECT_ATTRIBUTES* attributes)
+{
+    EXPECT_EQ(access, ACCESS_MASK{GENERIC_READ});
+    EXPECT_EQ(attributes->Length, sizeof(OBJECT_ATTRIBUTES));
+    EXPECT_EQ(attributes->Attributes, 0x40u);
+    const std::wstring name(attributes->ObjectName->Buffer, attributes->ObjectName->Length / sizeof(wchar_t));
+    if (name == L"\\Device\\1")
+        return static_cast<NTSTATUS>(0xC0000024);
+    *link = name == L"\\Device\\0" ? &openLinks : nullptr;
+    ++openLinks;
+    return 0;
+}
+NTSTATUS NTAPI queryLink(HANDLE link, UNICODE_STRING* target, ULONG* bytes)
+{
+    const std::wstring text = L"\\Device\\Target";
+    *bytes = static_cast<ULONG>(text.size() * sizeof(wchar_t));
+    if (target->MaximumLength < *bytes)
+        return static_cast<NTSTATUS>(0xC0000023);
+    target->Length = static_cast<USHORT>(*bytes);
+    text.copy(target->Buffer, text.size());
+    return link ? 0 : static_cast<NTSTATUS>(0xC0000022);
+}
+NTSTATUS NTAPI closeLink(HANDLE)
+{
+    return --openLinks;
+}
+
+TEST(Volumes, HaveTheDeviceToWhichTheirNameLinks)
+{
+    volumes = {{L"C:\\\0"s, 0}, {L"D:\\\0"s, 0}, {L"E:\\\0"s, 0}};
+    VolumeTable table(
+        {findFirst, findNext, FindVolumeClose, queryDevice, driveType, pathNames, openLink, queryLink, closeLink});
+    table.refreshVolumes();
+    EXPECT_EQ(table.mountPointOf(L"\\Device\\Target"), L"C:\\");
+    EXPECT_EQ(table.mountPointOf(L"\\Device\\1"), L"D:\\");
+    EXPECT_EQ(table.mountPointOf(L"\\Device\\2"), L"E:\\");
+    EXPECT_EQ(openLinks, 0) << "not closed";
+}
+
 TEST(Volumes, AreTheMountPointsOfFixedVolumesWhosePathsCanBeRead)
 {
-    using namespace std::string_literals;
     test::LogCapture log;
-    volumes = {{L"\0"s, 0}, {L"F:\\\0"s, 5}, {L"E:\\\0"s, 0}, {L"G:\\\0"s, 234}, {L"C:\\\0C:\\mount\\\0"s, 0}};
+    volumes = {{L"\0"s, 0}, {L"F:\\\0"s, 5}, {L"G:\\\0"s, 234}, {L"E:\\\0"s, 0}, {L"C:\\\0C:\\mount\\\0"s, 0}};
     // Without the native functions, which a system may lack.
     VolumeTable table({findFirst, findNext, FindVolumeClose, QueryDosDeviceW, driveType, pathNames});
     table.refreshVolumes();
@@ -54,7 +100,8 @@ TEST(Volumes, AreTheMountPointsOfFixedVolumesWhosePathsCanBeRead)
                               "1: Error: Failed to retrieve mount point names: 000000ea");
     volumes.clear();
     table.refreshVolumes();
-    EXPECT_TRUE(table.mountPoints().empty() && VolumeFunctions::system().openLink);
+    EXPECT_TRUE(table.mountPoints().empty());
+    EXPECT_TRUE(VolumeFunctions::system().openLink);
 }
 
 } // namespace

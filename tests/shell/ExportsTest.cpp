@@ -1,6 +1,5 @@
 #include <fstream>
 
-#include "shell/Registration.h"
 #include "tests/support/Counts.h"
 #include "tests/support/LoadedModule.h"
 #include "tests/support/Pipes.h"
@@ -33,6 +32,18 @@ TEST_F(ExportsTest, OfferTheModulesClassesAndTheirInterfacesOnly)
         EXPECT_EQ(module.canUnload(), S_FALSE);
     }
     EXPECT_EQ(module.canUnload(), S_OK) << "a refused object or a lock counts";
+}
+
+TEST_F(ExportsTest, KeepTheModuleLoadedAndItsThreadsRunningForAnObject)
+{
+    LoadedModule module;
+    for (const CLSID& classId : {ShellExt::kClassId, StubFolder::kClassId}) {
+        const auto object = module.object<IUnknown>(classId, IID_IUnknown);
+        const std::size_t threads = countThreads();
+        EXPECT_EQ(module.canUnload(), S_FALSE);
+        Sleep(700); // a thread that was asked to stop has ended
+        EXPECT_EQ(countThreads(), threads);
+    }
 }
 
 TEST_F(ExportsTest, LeaveNothingOfAnObjectThatCannotBeCreated)
@@ -86,10 +97,11 @@ TEST_F(ExportsTest, LeaveNothingBehindInTwentyRoundsOfLoadAndUnload)
 
 TEST_F(ExportsTest, LetComUnloadTheModuleAtTheEndOfAPage)
 {
+    decltype(&DllRegisterServer) enter = nullptr, remove = nullptr;
     {
         const LoadedModule module;
-        setModuleInstance(module.module);
-        registerServer();
+        findFunction(module.module, "DllRegisterServer", enter);
+        enter();
     }
     EXPECT_EQ(CoGetClassObject(ShellExt::kClassId, CLSCTX_INPROC_SERVER, nullptr, IID_IClassFactory,
                                RefPtr<IClassFactory>().outVoid()),
@@ -102,6 +114,9 @@ TEST_F(ExportsTest, LetComUnloadTheModuleAtTheEndOfAPage)
     EXPECT_TRUE(GetModuleHandleW(L"tavishell.dll"));
     DestroyPropertySheetPage(page);
     EXPECT_TRUE(waitUntil([] { return !GetModuleHandleW(L"tavishell.dll"); }));
+    const LoadedModule module;
+    findFunction(module.module, "DllUnregisterServer", remove);
+    EXPECT_EQ(remove(), HRESULT{ERROR_FILE_NOT_FOUND}) << "the code of the system as it is";
 }
 
 } // namespace

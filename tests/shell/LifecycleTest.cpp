@@ -2,6 +2,7 @@
 
 #include <process.h>
 
+#include "tests/support/Allocations.h"
 #include "tests/support/Counts.h"
 #include "tests/support/LoadedModule.h"
 
@@ -22,6 +23,19 @@ TEST_F(LifecycleTest, AdmitsProgramsByTheBeginningOfTheirName)
             EXPECT_EQ(hostKindOf(path), kind) << path;
     }
     EXPECT_TRUE(!LoadLibraryW(modulePath().c_str()) && GetLastError() == ERROR_DLL_INIT_FAILED);
+}
+
+TEST_F(LifecycleTest, AttachesWithoutALogIfMemoryRunsOut)
+{
+    const HINSTANCE program = GetModuleHandleW(nullptr);
+    {
+        const FailingAllocations all(0);
+        attachToFileManager(program, L"C:\\explorer.exe");
+    }
+    EXPECT_EQ(moduleInstance(), program);
+    EXPECT_TRUE(shellAllocator());
+    detachFromFileManager(false);
+    EXPECT_FALSE(shellAllocator());
 }
 
 TEST_F(LifecycleTest, GivesAToolTheClassesAndNothingElse)

@@ -16,6 +16,19 @@ const wxString kOwnKey = L"HKEY_CURRENT_USER\\Software\\TaviTest", kClasses = L"
                kMenus = L"\\shellex\\ContextMenuHandlers\\Tavi",
                kApproved = L"\\Software\\Microsoft\\Windows\\CurrentVersion\\Shell Extensions\\Approved\\";
 
+// Takes the place of the shell's function in this program.
+int announcements = 0;
+void WINAPI countAnnouncement(LONG event, UINT flags, const void*, const void*)
+{
+    announcements += event == SHCNE_ASSOCCHANGED && flags == SHCNF_IDLIST;
+}
+#ifdef _WIN64
+extern decltype(&SHChangeNotify) imported asm("__imp_SHChangeNotify");
+#else
+extern decltype(&SHChangeNotify) imported asm("__imp__SHChangeNotify@16");
+#endif
+decltype(&SHChangeNotify) imported = countAnnouncement;
+
 using Values = std::map<wxString, wxString>;
 
 // While it lives, an empty key is this process's HKEY_CLASSES_ROOT and HKEY_LOCAL_MACHINE.
@@ -62,11 +75,13 @@ TEST_F(RegistrationTest, WritesTheClassAndItsHandlersAndDeletesTheClassOnly)
     expected[kClasses + kId + L"\\InProcServer32\\ThreadingModel"] = L"Apartment";
     EXPECT_EQ(registerServer(), ERROR_FILE_NOT_FOUND) << "without the approved list";
     EXPECT_EQ(stored(), expected);
+    EXPECT_EQ(announcements, 0);
     wxRegKey(kOwnKey + kApproved).Create();
     Values left = handlers;
     left[kApproved + kId] = expected[kApproved + kId] = kShown;
     EXPECT_EQ(registerServer(), 0);
     EXPECT_EQ(stored(), expected);
+    EXPECT_EQ(announcements, 1);
     EXPECT_EQ(unregisterServer(), ERROR_FILE_NOT_FOUND) << "scripts delete the handlers and the approved value";
     EXPECT_EQ(stored(), left);
     // With every former key below the classes the run gets to the approved value.
@@ -75,7 +90,9 @@ TEST_F(RegistrationTest, WritesTheClassAndItsHandlersAndDeletesTheClassOnly)
         wxRegKey(kOwnKey + kClasses + key).Create();
     for (const auto& [path, id] : handlers)
         wxRegKey(kOwnKey + L"\\CLSID" + path + L"a\\b").Create();
+    EXPECT_EQ(announcements, 1);
     EXPECT_EQ(unregisterServer(), 0);
+    EXPECT_EQ(announcements, 2);
     EXPECT_EQ(stored(), handlers);
 }
 

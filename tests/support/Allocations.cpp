@@ -1,23 +1,30 @@
 #include "tests/support/Allocations.h"
 
-#include <cstdlib>
-#include <new>
+using namespace tavi::test;
 
-// The operators of the whole test program: every allocation may fail on demand.
-void* operator new(std::size_t size)
+// The linker redirects the calls of the whole program here, also those of operator new and of the libraries.
+extern "C" {
+void* __real_malloc(std::size_t size);
+void* __wrap_malloc(std::size_t size)
 {
-    using namespace tavi::test;
-    if (void* const block = FailingAllocations::fails(Heap::cpp) ? nullptr : std::malloc(size))
-        return block;
-    throw std::bad_alloc();
+    return FailingAllocations::fails(Heap::c) ? nullptr : __real_malloc(size);
 }
-void operator delete(void* block) noexcept
+void __real_free(void* block);
+void __wrap_free(void* block)
 {
     const void* freed = block;
-    tavi::test::FailingAllocations::watched.compare_exchange_strong(freed, nullptr);
-    std::free(block);
+    FailingAllocations::watched.compare_exchange_strong(freed, nullptr);
+    __real_free(block);
 }
-void operator delete(void* block, std::size_t) noexcept
+// An exception gets its memory. The C++ runtime has a reserve for it, but behind a lock that it allocates, too.
+void* __real___cxa_allocate_exception(std::size_t size) noexcept;
+void* __wrap___cxa_allocate_exception(std::size_t size) noexcept
 {
-    operator delete(block);
+    DWORD own = GetCurrentThreadId();
+    const bool pauses = FailingAllocations::thread.compare_exchange_strong(own, 0);
+    void* const block = __real___cxa_allocate_exception(size);
+    if (pauses)
+        FailingAllocations::thread = own;
+    return block;
+}
 }

@@ -7,32 +7,32 @@
 
 namespace tavi::test {
 
-enum class Heap { cpp, sqlite };
+enum class Heap { c, sqlite };
 
-// During its lifetime `failing` allocations of its thread from one heap fail, after `succeeding` ones that succeed.
-// Allocations.cpp replaces the operators new and delete.
+// During its lifetime `failing` allocations of its thread from one heap fail, after `succeeding` ones that succeed. The
+// C heap serves operator new, too.
 class FailingAllocations {
   public:
-    explicit FailingAllocations(int succeeding, Heap heap = Heap::cpp, int failing = 1 << 30)
+    explicit FailingAllocations(int succeeding, Heap heap = Heap::c, int failing = 1 << 30)
     {
         heap_ = heap;
         left_ = succeeding;
         failing_ = failing;
-        thread_ = GetCurrentThreadId();
+        thread = GetCurrentThreadId();
     }
     ~FailingAllocations()
     {
-        thread_ = 0;
+        thread = 0;
     }
     static bool fails(Heap heap)
     {
-        return thread_ == GetCurrentThreadId() && heap_ == heap && left_-- <= 0 && failing_-- > 0;
+        return thread == GetCurrentThreadId() && heap_ == heap && left_-- <= 0 && failing_-- > 0;
     }
-    // Operator delete sets it to null when it frees this block.
+    // The heap sets it to null when this block is freed.
     static inline std::atomic<const void*> watched{nullptr};
+    static inline std::atomic<DWORD> thread{0};
 
   private:
-    static inline std::atomic<DWORD> thread_{0};
     static inline Heap heap_{};
     static inline int left_ = 0, failing_ = 0;
     static inline sqlite3_mem_methods real_;

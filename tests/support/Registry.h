@@ -12,9 +12,23 @@
 
 #include "core/Handles.h"
 #include "core/InstallPaths.h"
-#include "core/Privileges.h"
 #include "core/Utf8.h"
+#include "exclusions/Privileges.h"
 #include "statedb/Database.h"
+
+namespace tavi {
+
+// The two keys, in the view that the module reads.
+inline wxRegKey installKey()
+{
+    return {getInstallKeyName(), wxRegKey::WOW64ViewMode_32};
+}
+inline wxRegKey settingsKey()
+{
+    return {getSettingsKeyName(), wxRegKey::WOW64ViewMode_32};
+}
+
+} // namespace tavi
 
 namespace tavi::test {
 

@@ -1,4 +1,4 @@
-#include "core/Privileges.h"
+#include "exclusions/Privileges.h"
 
 #include <memory>
 #include <new>

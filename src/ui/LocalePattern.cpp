@@ -1,4 +1,4 @@
-#include "core/LocalePattern.h"
+#include "ui/LocalePattern.h"
 
 #include <vector>
 
