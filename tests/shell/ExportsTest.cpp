@@ -97,7 +97,8 @@ TEST_F(ExportsTest, LeaveNothingBehindInTwentyRoundsOfLoadAndUnload)
 
 TEST_F(ExportsTest, LetComUnloadTheModuleAtTheEndOfAPage)
 {
-    decltype(&DllRegisterServer) enter = nullptr, remove = nullptr;
+    HRESULT(WINAPI * enter)() = nullptr;
+    HRESULT(WINAPI * remove)() = nullptr;
     {
         const LoadedModule module;
         findFunction(module.module, "DllRegisterServer", enter);

@@ -2,9 +2,23 @@
 
 #include <map>
 
+#include <shlobj.h>
 #include <wx/stdpaths.h>
 
 #include "tests/support/Dialogs.h"
+
+// Takes the place of the import from the shell.
+static int announcements = 0;
+static void WINAPI countAnnouncement(LONG event, UINT flags, const void*, const void*)
+{
+    announcements += event == SHCNE_ASSOCCHANGED && flags == SHCNF_IDLIST;
+}
+#ifdef _WIN64
+extern decltype(&SHChangeNotify) importedNotify asm("__imp_SHChangeNotify");
+#else
+extern decltype(&SHChangeNotify) importedNotify asm("__imp__SHChangeNotify@16");
+#endif
+decltype(&SHChangeNotify) importedNotify = countAnnouncement;
 
 namespace tavi {
 namespace {
@@ -15,19 +29,6 @@ const wxString kOwnKey = L"HKEY_CURRENT_USER\\Software\\TaviTest", kClasses = L"
                kId = L"{5e0c31a7-8d42-4b19-a6f3-2c7d90e1b845}", kShown = L"Tavi Remote Backup Shell Extension",
                kMenus = L"\\shellex\\ContextMenuHandlers\\Tavi",
                kApproved = L"\\Software\\Microsoft\\Windows\\CurrentVersion\\Shell Extensions\\Approved\\";
-
-// Takes the place of the shell's function in this program.
-int announcements = 0;
-void WINAPI countAnnouncement(LONG event, UINT flags, const void*, const void*)
-{
-    announcements += event == SHCNE_ASSOCCHANGED && flags == SHCNF_IDLIST;
-}
-#ifdef _WIN64
-extern decltype(&SHChangeNotify) imported asm("__imp_SHChangeNotify");
-#else
-extern decltype(&SHChangeNotify) imported asm("__imp__SHChangeNotify@16");
-#endif
-decltype(&SHChangeNotify) imported = countAnnouncement;
 
 using Values = std::map<wxString, wxString>;
 
