@@ -19,25 +19,14 @@ using namespace tavi;
 
 namespace {
 
-// Returns the content with "@" for the times. The log is still open: each line is in the file at once.
+// Returns the content with "@" for the times and "|" for the ends of lines. The log is still open: each line is in the
+// file at once.
 std::string contentOf(const std::wstring& path)
 {
-    std::ifstream file(toUtf8(path));
+    std::ifstream file(toUtf8(path), std::ios::binary);
     const std::string content(std::istreambuf_iterator<char>(file), {});
-    return std::regex_replace(content, std::regex("\\d\\d[A-Z][a-z]{2}20\\d\\d \\d\\d:\\d\\d:\\d\\d: "), "@ ");
-}
-
-// Returns the handle of the stream that has this file open.
-HANDLE handleOf(const std::wstring& path)
-{
-    for (int descriptor = 3; descriptor < 64; ++descriptor) {
-        const auto handle = reinterpret_cast<HANDLE>(_get_osfhandle(descriptor));
-        wchar_t name[MAX_PATH] = L"";
-        GetFinalPathNameByHandleW(handle, name, MAX_PATH, 0);
-        if (std::wstring(name).find(path.substr(path.rfind(L'\\', path.rfind(L'\\') - 1))) != std::wstring::npos)
-            return handle;
-    }
-    return nullptr;
+    return std::regex_replace(std::regex_replace(content, std::regex("\r\n"), "|"),
+                              std::regex("\\d\\d[A-Z][a-z]{2}20\\d\\d \\d\\d:\\d\\d:\\d\\d: "), "@ ");
 }
 
 struct Log : testing::Test {
@@ -56,8 +45,8 @@ TEST_F(Log, LinesAreInTheFileAtOnce)
     logInfo(L"Attaching to %ls", L"nobody");
     logError(L"%ls", std::wstring(5000, L'x').c_str());
     EXPECT_EQ(guarded("another", 4, []() -> int { throw 1; }), 4);
-    EXPECT_EQ(contentOf(path), "@ Warning: at once: 7\n@ Error: " + std::string(4095, 'x') +
-                                   "\n@ Error: Unhandled exception in another\n");
+    EXPECT_EQ(contentOf(path),
+              "@ Warning: at once: 7|@ Error: " + std::string(4095, 'x') + "|@ Error: Unhandled exception in another|");
     closeLog();
     EXPECT_TRUE(DeleteFileW(path.c_str()));
 }
@@ -68,7 +57,7 @@ TEST_F(Log, HasOneEncodingAndReplacesWhatItLacks)
     ASSERT_TRUE(openLog(3));
     for (const wchar_t* const text : {L"\u00E9", L"\u20AC", L"\u00E9\u0416", L"a\xD800z"})
         logWarning(L"%ls", text);
-    EXPECT_EQ(contentOf(path), "@ Warning: \xE9\n@ Warning: \x80\n@ Warning: \xE9?\n@ Warning: a?z\n");
+    EXPECT_EQ(contentOf(path), "@ Warning: \xE9|@ Warning: \x80|@ Warning: \xE9?|@ Warning: a?z|");
 }
 
 TEST_F(Log, BoundaryHoldsIfMemoryRunsOut)
@@ -78,7 +67,7 @@ TEST_F(Log, BoundaryHoldsIfMemoryRunsOut)
         const test::FailingAllocations few(succeeding);
         guarded("need", [] { throw std::runtime_error("is known"); });
     }
-    EXPECT_TRUE(wxString(contentOf(path)).EndsWith("@ Error: Unhandled exception in need: is known\n"));
+    EXPECT_TRUE(wxString(contentOf(path)).EndsWith("@ Error: Unhandled exception in need: is known|"));
 }
 
 TEST_F(Log, KeepsThePreviousTargetIfTheFileCannotBeOpened)
@@ -122,9 +111,14 @@ TEST(LogOfTwoProcesses, HasTheLinesOfBothAndIsNotInherited)
     const wxString program = wxStandardPaths::Get().GetExecutablePath();
     EXPECT_EQ(_wspawnl(_P_WAIT, program.wc_str(), L"test", L"--gtest_filter=LogOfTwoProcesses.*", nullptr), 0);
     logWarning(L"last");
-    EXPECT_EQ(contentOf(path), "former\n@ Warning: ours\n@ Warning: theirs\n@ Warning: last\n");
+    EXPECT_EQ(contentOf(path), "former|@ Warning: ours|@ Warning: theirs|@ Warning: last|");
     // Windows appends at the same instant, too, if the handle has no other right to write. Wine does not.
-    const HANDLE log = handleOf(path);
+    HANDLE log = nullptr;
+    wchar_t name[MAX_PATH] = L"";
+    for (int descriptor = 3; !std::wcsstr(name, L"\\tavi.log") && descriptor < 64; ++descriptor) {
+        log = reinterpret_cast<HANDLE>(_get_osfhandle(descriptor));
+        GetFinalPathNameByHandleW(log, name, MAX_PATH, 0);
+    }
     PUBLIC_OBJECT_BASIC_INFORMATION object{};
     EXPECT_EQ(NtQueryObject(log, ObjectBasicInformation, &object, sizeof(object), nullptr), 0);
     EXPECT_EQ(object.GrantedAccess & (FILE_APPEND_DATA | FILE_WRITE_DATA), ACCESS_MASK{FILE_APPEND_DATA});

@@ -20,11 +20,6 @@ void __wrap_free(void* block)
 void* __real___cxa_allocate_exception(std::size_t size) noexcept;
 void* __wrap___cxa_allocate_exception(std::size_t size) noexcept
 {
-    DWORD own = GetCurrentThreadId();
-    const bool pauses = FailingAllocations::thread.compare_exchange_strong(own, 0);
-    void* const block = __real___cxa_allocate_exception(size);
-    if (pauses)
-        FailingAllocations::thread = own;
-    return block;
+    return FailingAllocations::exempt([=] { return __real___cxa_allocate_exception(size); });
 }
 }

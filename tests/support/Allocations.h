@@ -18,21 +18,32 @@ class FailingAllocations {
         heap_ = heap;
         left_ = succeeding;
         failing_ = failing;
-        thread = GetCurrentThreadId();
+        thread_ = GetCurrentThreadId();
     }
     ~FailingAllocations()
     {
-        thread = 0;
+        thread_ = 0;
     }
     static bool fails(Heap heap)
     {
-        return thread == GetCurrentThreadId() && heap_ == heap && left_-- <= 0 && failing_-- > 0;
+        return thread_ == GetCurrentThreadId() && heap_ == heap && left_-- <= 0 && failing_-- > 0;
+    }
+    // Calls a function whose allocations do not fail.
+    template <class Call>
+    static void* exempt(Call call)
+    {
+        DWORD own = GetCurrentThreadId();
+        const bool pauses = thread_.compare_exchange_strong(own, 0);
+        void* const block = call();
+        if (pauses)
+            thread_ = own;
+        return block;
     }
     // The heap sets it to null when this block is freed.
     static inline std::atomic<const void*> watched{nullptr};
-    static inline std::atomic<DWORD> thread{0};
 
   private:
+    static inline std::atomic<DWORD> thread_{0};
     static inline Heap heap_{};
     static inline int left_ = 0, failing_ = 0;
     static inline sqlite3_mem_methods real_;
@@ -40,9 +51,11 @@ class FailingAllocations {
     static inline const bool installed_ = [] {
         sqlite3_config(SQLITE_CONFIG_GETMALLOC, &real_);
         sqlite3_mem_methods methods = real_;
-        methods.xMalloc = [](int size) { return fails(Heap::sqlite) ? nullptr : real_.xMalloc(size); };
+        methods.xMalloc = [](int size) {
+            return fails(Heap::sqlite) ? nullptr : exempt([&] { return real_.xMalloc(size); });
+        };
         methods.xRealloc = [](void* block, int size) {
-            return fails(Heap::sqlite) ? nullptr : real_.xRealloc(block, size);
+            return fails(Heap::sqlite) ? nullptr : exempt([&] { return real_.xRealloc(block, size); });
         };
         sqlite3_config(SQLITE_CONFIG_MALLOC, &methods);
         return sqlite3_config(SQLITE_CONFIG_LOOKASIDE, 0, 0) == SQLITE_OK;

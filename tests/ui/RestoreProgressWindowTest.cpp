@@ -117,7 +117,7 @@ TEST_F(RestoreProgressWindowTest, ClosesByEveryButtonThoughItCannotCancel)
 {
     log.onNextLine([] { throw std::bad_alloc(); }); // the line that Cancel finds no service
     const std::tuple<UINT, WPARAM, std::size_t> cases[] = {
-        {WM_COMMAND, TAVI_PROGRESS_CANCEL, 2}, {WM_COMMAND, TAVI_PROGRESS_CLOSE, 0}, {WM_CLOSE, 0, 0}};
+        {WM_COMMAND, TAVI_PROGRESS_CANCEL, 1}, {WM_COMMAND, TAVI_PROGRESS_CLOSE, 0}, {WM_CLOSE, 0, 0}};
     for (const auto& [message, command, lines] : cases) {
         const HWND dialog = open();
         dispatch(event(kStarted));
