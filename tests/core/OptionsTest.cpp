@@ -11,12 +11,9 @@ namespace tavi {
 namespace {
 
 struct Options : testing::Test {
-    Options()
-    {
-        settings.Create();
-    }
     const test::InstalledService service;
     wxRegKey settings = settingsKey();
+    const bool isCreated = settings.Create();
     test::LogCapture log;
 };
 

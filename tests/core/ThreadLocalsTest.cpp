@@ -21,7 +21,8 @@ TEST(ThreadLocals, BelongToTheirThreadAndAreFreedWithIt)
     for (int i = 0; i < 100; ++i) {
         std::thread([] {
             SetLastError(ERROR_BUSY);
-            EXPECT_TRUE(++counted == 8 && GetLastError() == ERROR_BUSY);
+            EXPECT_EQ(++counted, 8);
+            EXPECT_EQ(GetLastError(), DWORD{ERROR_BUSY});
             EXPECT_EQ(reinterpret_cast<std::uintptr_t>(&counted) % 64, 0u);
         }).join();
         before = i == 0 ? busyBlocks() : before; // the runtime allocates some blocks once

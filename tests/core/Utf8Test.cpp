@@ -20,7 +20,9 @@ TEST(Utf8, DecodesTheFirstSequence)
     };
     for (const auto& [what, text, form, length, point] : cases) {
         const Utf8Sequence found = decodeUtf8(text);
-        EXPECT_TRUE(found.form == form && found.length == length && found.point == point) << what;
+        EXPECT_EQ(found.form, form) << what;
+        EXPECT_EQ(found.length, length) << what;
+        EXPECT_TRUE(found.point == point) << what;
     }
 }
 
@@ -28,8 +30,10 @@ TEST(Utf8, ConvertsAndMeasuresTexts)
 {
     const std::wstring wide = L"a\u00E9\u20AC\U0001F600" + std::wstring(1, wchar_t{0xD800});
     const std::string bytes = "a\xC3\xA9\xE2\x82\xAC\xF0\x9F\x98\x80\xED\xA0\x80";
-    EXPECT_TRUE(toUtf8(wide) == bytes && fromUtf8(bytes) == wide);
+    EXPECT_EQ(toUtf8(wide), bytes);
+    EXPECT_EQ(fromUtf8(bytes), wide);
     EXPECT_EQ(fromUtf8("a\xFF\xC3"), L"a\uFFFD\uFFFD");
     EXPECT_EQ(countUtf16Units(bytes), 6u);
-    EXPECT_TRUE(utf8PrefixLength(bytes, 3) == 6 && utf8PrefixLength(bytes, 100) == bytes.size());
+    EXPECT_EQ(utf8PrefixLength(bytes, 3), 6u);
+    EXPECT_EQ(utf8PrefixLength(bytes, 100), bytes.size());
 }

@@ -21,10 +21,14 @@ TEST_F(ShellExtTest, HasTheOverlayTableBehindTheOthers)
     DWORD flags = 88;
     wchar_t file[MAX_PATH];
     EXPECT_EQ(overlay->GetOverlayInfo(file, 10, &index, &flags), HRESULT(0x8007007A));
-    EXPECT_TRUE(overlay->GetOverlayInfo(file, -1, &index, &flags) == E_INVALIDARG && index == 77 && flags == 88);
+    EXPECT_EQ(overlay->GetOverlayInfo(file, -1, &index, &flags), E_INVALIDARG);
+    EXPECT_EQ(std::pair(index, flags), std::pair(77, DWORD{88}));
     EXPECT_EQ(overlay->GetOverlayInfo(file, MAX_PATH, &index, &flags), S_OK);
-    EXPECT_TRUE(file == modulePath() && index == 3 && flags == 3 && DestroyIcon(ExtractIconW(nullptr, file, 3)));
-    EXPECT_TRUE(overlay->GetPriority(&priority) == S_OK && priority == 99);
+    EXPECT_EQ(std::pair(index, flags), std::pair(3, DWORD{3}));
+    EXPECT_EQ(file, modulePath());
+    EXPECT_TRUE(DestroyIcon(ExtractIconW(nullptr, file, 3)));
+    EXPECT_EQ(overlay->GetPriority(&priority), S_OK);
+    EXPECT_EQ(priority, 99);
 }
 
 TEST_F(ShellExtTest, OffersWhatItsLastInitializeWasGiven)
