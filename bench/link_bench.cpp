@@ -37,7 +37,7 @@ Bytes streamOf(unsigned messages)
         const auto frame = MessageBuffer::create();
         EventMessage(type, 0, type == EventType::restoreTotal ? 1u << 30 : 65536, 0,
                      type == EventType::restoreItem ? path : none)
-            .serialise(*frame);
+            .serialize(*frame);
         stream.insert(stream.end(), frame->data(), frame->data() + frame->length());
     }
     return stream;

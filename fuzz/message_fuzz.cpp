@@ -44,7 +44,7 @@ std::uint32_t clock()
 
 } // namespace
 
-// Applies every message to a status. A message that is serialised, read and serialised again must have the same bytes.
+// Applies every message to a status. A message that is serialized, read and serialized again must have the same bytes.
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t length)
 {
     static TransferStatus status(false, clock);
@@ -57,11 +57,11 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t len
         (void)status.restoreSpeed();
         (void)status.restoreText.get();
         const auto once = MessageBuffer::create(), again = MessageBuffer::create(), payload = MessageBuffer::create();
-        message->clone()->serialise(*once);
+        message->clone()->serialize(*once);
         payload->ensure(once->length());
         payload->setLength(once->length() - kFrameHeaderSize);
         std::memcpy(payload->data(), once->data() + kFrameHeaderSize, payload->length());
-        createMessage(static_cast<std::uint32_t>(message->type()), *payload)->serialise(*again);
+        createMessage(static_cast<std::uint32_t>(message->type()), *payload)->serialize(*again);
         if (once->length() != again->length() || std::memcmp(once->data(), again->data(), once->length()) != 0)
             std::abort();
     }

@@ -13,7 +13,7 @@ constexpr const wchar_t* kCommandPipe = L"\\\\.\\pipe\\tavibackup";
 
 } // namespace
 
-bool CommandPipe::sendCommand(std::unique_ptr<PipeMessage>& message)
+bool sendCommand(std::unique_ptr<PipeMessage>& message)
 {
     const FileHandle pipe(
         CreateFileW(kCommandPipe, GENERIC_WRITE, 0, nullptr, OPEN_EXISTING, FILE_ATTRIBUTE_NORMAL, nullptr));
@@ -26,7 +26,7 @@ bool CommandPipe::sendCommand(std::unique_ptr<PipeMessage>& message)
     return written;
 }
 
-std::unique_ptr<PipeMessage> CommandPipe::cancelRestore()
+std::unique_ptr<PipeMessage> cancelRestoreCommand()
 {
     return std::make_unique<EventMessage>(EventType::restoreEnded);
 }

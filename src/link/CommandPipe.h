@@ -6,16 +6,12 @@
 
 namespace tavi {
 
-// The pipe for commands to the service: one message per connection and no reply. Never waits for a busy or absent
-// service. Any thread.
-class CommandPipe {
-  public:
-    // Returns true if the message was written. Destroys the message, unless the pipe cannot be opened: this is logged,
-    // and the caller keeps the message.
-    static bool sendCommand(std::unique_ptr<PipeMessage>& message);
+// Sends one message to the service over the command pipe, which has no reply. Returns true if it was written. Destroys
+// the message, unless the pipe cannot be opened: this is logged, and the caller keeps the message. Does not wait for a
+// busy or absent service, but for one that does not read. Any thread.
+bool sendCommand(std::unique_ptr<PipeMessage>& message);
 
-    // Returns the command that ends the running restore.
-    static std::unique_ptr<PipeMessage> cancelRestore();
-};
+// Returns the command that ends the running restore.
+std::unique_ptr<PipeMessage> cancelRestoreCommand();
 
 } // namespace tavi

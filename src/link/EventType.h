@@ -24,10 +24,10 @@ enum class EventType : std::uint32_t {
     textB = 13,            // the second status text of the backup
     textBEnded = 14,       // the second text no longer applies
     ignored15 = 15,        // changes nothing
-    doneA = 16,            // A is done further by the value
-    doneB = 17,            // B is done further by the value, which is a sample of the rate if the flag is set
-    moreA = 18,            // the total of A is larger by the value
-    moreB = 19,            // the total of B is larger by the value
+    doneA = 16,            // adds the value to the done amount of A
+    doneB = 17,            // adds the value to the done amount of B, and to its rate if the flag is set
+    moreA = 18,            // adds the value to the total of A
+    moreB = 19,            // adds the value to the total of B
     snapshot = 20,         // the state and the amounts as they are now (SnapshotMessage)
     item = 21,             // a number, a flag and a text (ItemMessage), which the module does not use
     textTriple = 22,       // three texts (TextTripleMessage), which the module does not use
@@ -46,8 +46,8 @@ enum class EventType : std::uint32_t {
     restoreTotal = 53,     // the value is the number of bytes to restore
     restoreItem = 54,      // the text names the item being restored
     restoreItemEnded = 55, // that text no longer applies
-    restoreDone = 56,      // so many more bytes are restored
-    restoreMore = 57,      // the number of bytes to restore is larger by the value
+    restoreDone = 56,      // adds the value to the bytes restored
+    restoreMore = 57,      // adds the value to the bytes to restore
 };
 
 // Returns whether a frame of this type is a message. Any other frame makes the reader close the connection.

@@ -53,7 +53,7 @@ bool writeMessage(HANDLE pipe, std::unique_ptr<PipeMessage>& message)
     if (!message || !isUsable(pipe))
         return false;
     const auto buffer = MessageBuffer::create();
-    message->serialise(*buffer);
+    message->serialize(*buffer);
     DWORD written = 0;
     if (!buffer->data() || !WriteFile(pipe, buffer->data(), buffer->length(), &written, nullptr))
         return false;

@@ -97,21 +97,21 @@ MessageKind kindOf(EventType type) noexcept
     }
 }
 
-std::uint32_t smallestPayload(MessageKind kind) noexcept
+std::uint32_t minPayloadBytes(MessageKind kind) noexcept
 {
     switch (kind) {
     case MessageKind::snapshot:
-        return SnapshotMessage::kSmallestPayload;
+        return SnapshotMessage::kMinPayloadBytes;
     case MessageKind::item:
-        return ItemMessage::kSmallestPayload;
+        return ItemMessage::kMinPayloadBytes;
     case MessageKind::textTriple:
-        return TextTripleMessage::kSmallestPayload;
+        return TextTripleMessage::kMinPayloadBytes;
     case MessageKind::counter:
-        return CounterMessage::kSmallestPayload;
+        return CounterMessage::kMinPayloadBytes;
     case MessageKind::event:
         break;
     }
-    return EventMessage::kSmallestPayload;
+    return EventMessage::kMinPayloadBytes;
 }
 
 std::string bytesOf(const MessageText& text)
@@ -129,10 +129,10 @@ EventMessage::EventMessage(EventType type, std::uint32_t newCode, std::uint64_t 
 {
 }
 
-void EventMessage::serialise(MessageBuffer& buffer) const
+void EventMessage::serialize(MessageBuffer& buffer) const
 {
     const std::string bytes = bytesOf(text);
-    FrameWriter frame(buffer, type(), kSmallestPayload, {bytes});
+    FrameWriter frame(buffer, type(), kMinPayloadBytes, {bytes});
     frame.u32(code);
     frame.u64(value);
     frame.u32(flag);
@@ -152,9 +152,9 @@ SnapshotMessage::SnapshotMessage(std::uint32_t newState, std::uint64_t newCounte
 {
 }
 
-void SnapshotMessage::serialise(MessageBuffer& buffer) const
+void SnapshotMessage::serialize(MessageBuffer& buffer) const
 {
-    FrameWriter frame(buffer, type(), kSmallestPayload);
+    FrameWriter frame(buffer, type(), kMinPayloadBytes);
     frame.u32(state);
     for (const std::uint64_t counter : {counter0, counter1, counter2, counter3})
         frame.u64(counter);
@@ -170,10 +170,10 @@ ItemMessage::ItemMessage(std::uint64_t newValue, bool newFlag, MessageText newTe
 {
 }
 
-void ItemMessage::serialise(MessageBuffer& buffer) const
+void ItemMessage::serialize(MessageBuffer& buffer) const
 {
     const std::string bytes = bytesOf(text);
-    FrameWriter frame(buffer, type(), kSmallestPayload, {bytes});
+    FrameWriter frame(buffer, type(), kMinPayloadBytes, {bytes});
     frame.u64(value);
     frame.u32(flag ? 1 : 0);
     frame.count(bytes);
@@ -191,10 +191,10 @@ TextTripleMessage::TextTripleMessage(MessageText newText1, MessageText newText2,
 {
 }
 
-void TextTripleMessage::serialise(MessageBuffer& buffer) const
+void TextTripleMessage::serialize(MessageBuffer& buffer) const
 {
     const std::string texts[] = {bytesOf(text1), bytesOf(text2), bytesOf(text3)};
-    FrameWriter frame(buffer, type(), kSmallestPayload, {texts[0], texts[1], texts[2]});
+    FrameWriter frame(buffer, type(), kMinPayloadBytes, {texts[0], texts[1], texts[2]});
     for (const std::string& text : texts)
         frame.count(text);
     for (const std::string& text : texts)
@@ -213,9 +213,9 @@ CounterMessage::CounterMessage(std::uint32_t newCode, std::uint64_t newValue1, s
 {
 }
 
-void CounterMessage::serialise(MessageBuffer& buffer) const
+void CounterMessage::serialize(MessageBuffer& buffer) const
 {
-    FrameWriter frame(buffer, type(), kSmallestPayload);
+    FrameWriter frame(buffer, type(), kMinPayloadBytes);
     frame.u32(code);
     frame.u64(value1);
     frame.u64(value2);
@@ -233,7 +233,7 @@ std::unique_ptr<PipeMessage> createMessage(std::uint32_t number, const MessageBu
         return nullptr;
     const auto type = static_cast<EventType>(number);
     const MessageKind kind = kindOf(type);
-    if (buffer.length() < smallestPayload(kind))
+    if (buffer.length() < minPayloadBytes(kind))
         return nullptr;
     PayloadReader payload(buffer);
     switch (kind) {

@@ -25,7 +25,7 @@ class PipeMessage {
     PipeMessage& operator=(const PipeMessage&) = delete;
 
     // Writes header and payload. The buffer's length becomes the size of the frame, or 0 if the buffer could not grow.
-    virtual void serialise(MessageBuffer& buffer) const = 0;
+    virtual void serialize(MessageBuffer& buffer) const = 0;
     virtual std::unique_ptr<PipeMessage> clone() const = 0;
     virtual ~PipeMessage() = default;
 
@@ -48,12 +48,12 @@ class PipeMessage {
 
 class EventMessage final : public PipeMessage {
   public:
-    static constexpr std::uint32_t kSmallestPayload = 20;
+    static constexpr std::uint32_t kMinPayloadBytes = 20;
 
     // With 0 in every number and an empty text.
     explicit EventMessage(EventType type);
     EventMessage(EventType type, std::uint32_t code, std::uint64_t value, std::uint32_t flag, MessageText text);
-    void serialise(MessageBuffer& buffer) const override;
+    void serialize(MessageBuffer& buffer) const override;
     std::unique_ptr<PipeMessage> clone() const override;
 
     const std::uint32_t code;
@@ -64,11 +64,11 @@ class EventMessage final : public PipeMessage {
 
 class SnapshotMessage final : public PipeMessage {
   public:
-    static constexpr std::uint32_t kSmallestPayload = 36;
+    static constexpr std::uint32_t kMinPayloadBytes = 36;
 
     SnapshotMessage(std::uint32_t state, std::uint64_t counter0, std::uint64_t counter1, std::uint64_t counter2,
                     std::uint64_t counter3);
-    void serialise(MessageBuffer& buffer) const override;
+    void serialize(MessageBuffer& buffer) const override;
     std::unique_ptr<PipeMessage> clone() const override;
 
     const std::uint32_t state;
@@ -80,10 +80,10 @@ class SnapshotMessage final : public PipeMessage {
 
 class ItemMessage final : public PipeMessage {
   public:
-    static constexpr std::uint32_t kSmallestPayload = 16;
+    static constexpr std::uint32_t kMinPayloadBytes = 16;
 
     ItemMessage(std::uint64_t value, bool flag, MessageText text);
-    void serialise(MessageBuffer& buffer) const override;
+    void serialize(MessageBuffer& buffer) const override;
     std::unique_ptr<PipeMessage> clone() const override;
 
     const std::uint64_t value;
@@ -93,10 +93,10 @@ class ItemMessage final : public PipeMessage {
 
 class TextTripleMessage final : public PipeMessage {
   public:
-    static constexpr std::uint32_t kSmallestPayload = 12;
+    static constexpr std::uint32_t kMinPayloadBytes = 12;
 
     TextTripleMessage(MessageText text1, MessageText text2, MessageText text3);
-    void serialise(MessageBuffer& buffer) const override;
+    void serialize(MessageBuffer& buffer) const override;
     std::unique_ptr<PipeMessage> clone() const override;
 
     const MessageText text1;
@@ -106,10 +106,10 @@ class TextTripleMessage final : public PipeMessage {
 
 class CounterMessage final : public PipeMessage {
   public:
-    static constexpr std::uint32_t kSmallestPayload = 24;
+    static constexpr std::uint32_t kMinPayloadBytes = 24;
 
     CounterMessage(std::uint32_t code, std::uint64_t value1, std::uint64_t value2, std::uint32_t flag);
-    void serialise(MessageBuffer& buffer) const override;
+    void serialize(MessageBuffer& buffer) const override;
     std::unique_ptr<PipeMessage> clone() const override;
 
     const std::uint32_t code;

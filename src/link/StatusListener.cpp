@@ -66,7 +66,7 @@ void dispatch(std::unique_ptr<PipeMessage> message)
 {
     transferStatus().apply(*message);
     if (const MessageSink sink = messageSink)
-        sink(std::move(message));
+        sink(*message);
 }
 
 void listenToStatus(const StopCheck& stopCheck)

@@ -12,11 +12,11 @@ namespace tavi {
 TransferStatus& transferStatus();
 
 // Receives each message after the status has applied it, on the listener's thread, and must not wait.
-using MessageSink = void (*)(std::unique_ptr<PipeMessage> message);
-// With null, messages are destroyed instead.
+using MessageSink = void (*)(const PipeMessage& message);
+// Null for none.
 void setMessageSink(MessageSink sink) noexcept;
 
-// Applies a message to the status and passes it to the sink.
+// Applies a message to the status, shows it to the sink and destroys it.
 void dispatch(std::unique_ptr<PipeMessage> message);
 
 // Runs the listener: connects to the service's status pipe again and again and dispatches its messages, until the check

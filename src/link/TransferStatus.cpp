@@ -3,15 +3,20 @@
 #include <algorithm>
 #include <cmath>
 #include <limits>
+#include <string_view>
+
+#include "core/Utf8.h"
 
 namespace tavi {
 namespace {
 
-constexpr std::int32_t kSmallRing = 1024;
-constexpr std::int32_t kLargeRing = 65536;
-constexpr std::uint32_t kTickMilliseconds = 250;
-constexpr std::int32_t kShortSpan = 5000;
-constexpr std::int32_t kLongSpan = 60000;
+constexpr std::uint32_t kSmallRing = 1024;
+constexpr std::uint32_t kLargeRing = 65536;
+constexpr std::uint32_t kTickMs = 250;
+constexpr std::int32_t kShortSpanMs = 5000;
+constexpr std::int32_t kLongSpanMs = 60000;
+// The longest path of Windows: a status text names a file or a folder, but its length is the peer's.
+constexpr std::size_t kMaxTextLength = 32767;
 // From bytes per millisecond to bits per second.
 constexpr double kBitsPerSecond = 8000;
 
@@ -56,7 +61,10 @@ Integer truncated(double value) noexcept
 
 void PublishedText::set(const wxString& text)
 {
-    text_.replace(RefPtr<Shared>(new Shared(text)));
+    std::wstring_view kept = view(text).substr(0, kMaxTextLength);
+    if (kept.length() < text.length() && isHighSurrogate(static_cast<char32_t>(kept.back())))
+        kept.remove_suffix(1);
+    text_.replace(RefPtr<Shared>(new Shared(wxString(kept.data(), kept.length()))));
 }
 
 wxString PublishedText::get() const
@@ -272,11 +280,11 @@ void TransferStatus::timerTick() noexcept
 {
     for (RateRing* const ring : {&ringA, &ringB, &restoreRing})
         ring->addSample(0);
-    const std::uint32_t milliseconds = ++ticks_ * kTickMilliseconds;
+    const std::uint32_t milliseconds = ++ticks_ * kTickMs;
     if (milliseconds % 1000 == 0)
-        renewRate(restoreRateShort, kShortSpan);
+        renewRate(restoreRateShort, kShortSpanMs);
     if (milliseconds % 10000 == 0)
-        renewRate(restoreRateLong, kLongSpan);
+        renewRate(restoreRateLong, kLongSpanMs);
 }
 
 std::optional<std::uint32_t> TransferStatus::remainingSeconds() const noexcept

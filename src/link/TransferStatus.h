@@ -3,6 +3,7 @@
 #include <atomic>
 #include <cstdint>
 #include <optional>
+#include <utility>
 
 #include <wx/string.h>
 
@@ -12,7 +13,8 @@
 
 namespace tavi {
 
-// A text that one thread replaces. Any thread reads the old or the new one, whole, without waiting.
+// A text that one thread replaces. Any thread reads the old or the new one, whole, without waiting. A text longer than
+// any path is cut, so that a peer cannot make the window copy and lay out more.
 class PublishedText {
   public:
     void set(const wxString& text);
@@ -24,7 +26,7 @@ class PublishedText {
 
   private:
     struct Shared : RefCounted<Shared> {
-        explicit Shared(const wxString& newText) : text(newText) {}
+        explicit Shared(wxString newText) : text(std::move(newText)) {}
         const wxString text;
     };
 

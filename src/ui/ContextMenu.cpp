@@ -13,13 +13,10 @@
 #include "ui/ActivationScope.h"
 #include "ui/MenuBitmap.h"
 #include "ui/resource.h"
-#include "ui/VersionsDialog.h"
+#include "ui/VersionsWindow.h"
 
 namespace tavi {
 namespace {
-
-// Offsets from the first id that the host gives to the menu.
-enum CommandOffset : UINT { kRestore, kBackup, kDontBackup };
 
 struct Wording {
     const char* oneFile;
@@ -32,22 +29,40 @@ struct Wording {
     {
         const wxString& name = selection.displayName;
         if (name.empty())
-            return wxGetTranslation(selection.isFolder ? severalFolders : severalFiles);
-        return withName(wxGetTranslation(selection.isFolder ? oneFolder : oneFile), name);
+            return wxGetTranslation(selection.hasFolder ? severalFolders : severalFiles);
+        return withName(wxGetTranslation(selection.hasFolder ? oneFolder : oneFile), name);
     }
 };
 
+bool hasVersions(const Selection& selection)
+{
+    return selection.restoreMode != Coverage::none;
+}
+
+void restore(const Selection& selection, HWND host)
+{
+    // Without a manifest there is nothing to choose from. The window gets a copy of the selection: the host may invoke
+    // the command again.
+    if (ManifestRef manifest = getCurrentManifest())
+        openVersionsWindow(selection, std::move(manifest), host);
+}
+
 struct Command {
     const wchar_t* verb;
-    bool onMenu;
+    // Returns whether the menu shows the command. Null for a command that is never shown.
+    bool (*isShown)(const Selection&);
+    // Null for a command that does nothing.
+    void (*invoke)(const Selection&, HWND host);
     Wording label;
     Wording help;
 };
 
-// In the order of the command offsets.
+// The index of a command is its offset from the first id that the host gives to the menu. The two backup commands do
+// nothing and are on no menu, but a host may ask for their verbs and help texts. Message catalogues have their labels.
 const Command kCommands[] = {
     {L"TaviRestore",
-     true,
+     hasVersions,
+     restore,
      {wxTRANSLATE("Restore Previous Version"), wxTRANSLATE("Restore Files in Folder"),
       wxTRANSLATE("Restore Previous Versions"), wxTRANSLATE("Restore Files")},
      {wxTRANSLATE("Restore an older version of %s from the Tavi servers."),
@@ -55,7 +70,8 @@ const Command kCommands[] = {
       wxTRANSLATE("Restore older versions of the selected files."),
       wxTRANSLATE("Restore older versions of the selected files.")}},
     {L"TaviBackup",
-     false,
+     nullptr,
+     nullptr,
      {wxTRANSLATE("&Backup %s"), wxTRANSLATE("&Backup %s"), wxTRANSLATE("&Backup Selected Items"),
       wxTRANSLATE("&Backup Selected Items")},
      {wxTRANSLATE("Marks %s to be backed up with Tavi Remote Backup."),
@@ -63,7 +79,8 @@ const Command kCommands[] = {
       wxTRANSLATE("Marks the selected items to be backed up with Tavi Remote Backup."),
       wxTRANSLATE("Marks the selected items to be backed up with Tavi Remote Backup.")}},
     {L"TaviDontBackup",
-     false,
+     nullptr,
+     nullptr,
      {wxTRANSLATE("&Don't Backup %s"), wxTRANSLATE("&Don't Backup %s"), wxTRANSLATE("&Don't Backup Selected Items"),
       wxTRANSLATE("&Don't Backup Selected Items")},
      {wxTRANSLATE("Removes %s from the Tavi Remote Backup configuration."),
@@ -82,7 +99,7 @@ std::string toAnsi(const std::wstring& text)
     return ansi;
 }
 
-void insertRestoreItem(HMENU menu, UINT position, UINT id, const wxString& label)
+void insertCommand(HMENU menu, UINT position, UINT id, const wxString& label)
 {
     if (!InsertMenuW(menu, position, MF_BYPOSITION | MF_STRING, id, label.wc_str()))
         return;
@@ -101,16 +118,18 @@ UINT insertMenuItems(HMENU menu, UINT indexMenu, UINT idCmdFirst, UINT flags, co
         return 0;
 
     const ActivationScope activation;
+    // A selection without versions gets the separator alone.
     InsertMenuW(menu, indexMenu, MF_BYPOSITION | MF_SEPARATOR, 0, nullptr);
-    UINT used = 0;
-    for (const Command& command : kCommands) {
-        const wxString label = command.label.text(selection);
-        if (!command.onMenu || selection.restoreMode == Coverage::none)
+    UINT position = indexMenu;
+    UINT usedIds = 0;
+    for (UINT offset = 0; offset < std::size(kCommands); ++offset) {
+        const Command& command = kCommands[offset];
+        if (!command.isShown || !command.isShown(selection))
             continue;
-        insertRestoreItem(menu, indexMenu + 1, idCmdFirst, label);
-        ++used;
+        insertCommand(menu, ++position, idCmdFirst + offset, command.label.text(selection));
+        usedIds = offset + 1;
     }
-    return used;
+    return usedIds;
 }
 
 HRESULT commandString(UINT_PTR offset, UINT type, LPSTR buffer, UINT size, const Selection& selection)
@@ -141,20 +160,12 @@ HRESULT invokeCommand(const CMINVOKECOMMANDINFO& info, const Selection& selectio
 {
     if (!IS_INTRESOURCE(info.lpVerb))
         return E_INVALIDARG;
-    switch (reinterpret_cast<UINT_PTR>(info.lpVerb)) {
-    case kRestore: {
-        ManifestRef manifest = getCurrentManifest();
-        // A copy of the selection: the host may invoke the command again.
-        if (manifest)
-            startVersionsDialog(Selection(selection), std::move(manifest), info.hwnd);
-        return S_OK;
-    }
-    case kBackup:
-    case kDontBackup:
-        return S_OK;
-    default:
+    const auto offset = reinterpret_cast<UINT_PTR>(info.lpVerb);
+    if (offset >= std::size(kCommands))
         return E_INVALIDARG;
-    }
+    if (const auto invoke = kCommands[offset].invoke)
+        invoke(selection, info.hwnd);
+    return S_OK;
 }
 
 } // namespace tavi

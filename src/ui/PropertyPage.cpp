@@ -1,8 +1,11 @@
 #include "ui/PropertyPage.h"
 
 #include <algorithm>
+#include <atomic>
 #include <memory>
+#include <utility>
 
+#include <objbase.h>
 #include <wx/intl.h>
 
 #include "core/Boundary.h"
@@ -17,24 +20,44 @@
 namespace tavi {
 namespace {
 
-// Owned by the page description until the sheet releases the page, shown or not. The dialog counts as an object of the
-// module and may outlive the page in the message loop of a box.
+// Counts as an object of the module.
 struct Page {
-    Page(const Selection& selection, ManifestRef manifest)
-        : dialog(std::make_shared<VersionsDialog>(selection, std::move(manifest), false)), title(_("Tavi"))
+    Page(const Selection& selection, ManifestRef manifest) : dialog(selection, std::move(manifest)), title(_("Tavi")) {}
+    ~Page()
     {
+        // The lock, the first member, is released after this call, so that COM does not unmap this code.
+        CoFreeUnusedLibraries();
     }
-    std::shared_ptr<VersionsDialog> dialog;
+    const ModuleLock lock;
+    VersionsDialog dialog;
     const wxString title;
 };
+// The page description owns a reference until the sheet releases the page, shown or not. Each frame of the page's
+// procedure has another: the sheet may be destroyed in the message loop of a box that the frame has opened.
+using PageReference = std::shared_ptr<Page>;
 
 INT_PTR CALLBACK pageProcedure(HWND window, UINT message, WPARAM wParam, LPARAM lParam)
 {
     return guarded("property page", INT_PTR{0}, [&]() -> INT_PTR {
         if (message == WM_INITDIALOG)
             SetWindowLongPtrW(window, GWLP_USERDATA, reinterpret_cast<const PROPSHEETPAGEW*>(lParam)->lParam);
-        const auto* const page = reinterpret_cast<const Page*>(GetWindowLongPtrW(window, GWLP_USERDATA));
-        return page ? page->dialog->handleMessage(window, message, wParam, lParam) : 0;
+        const auto* const owned = reinterpret_cast<const PageReference*>(GetWindowLongPtrW(window, GWLP_USERDATA));
+        if (!owned)
+            return 0;
+        const PageReference page = *owned;
+        switch (message) {
+        case WM_COMMAND:
+            // Only Cancel closes the sheet, which belongs to the host.
+            if (page->dialog.runCommand(LOWORD(wParam)) && LOWORD(wParam) == IDCANCEL)
+                PostMessageW(GetParent(window), PSM_PRESSBUTTON, PSBTN_CANCEL, 0);
+            return TRUE;
+        case WM_CLOSE:
+            // The dialog manager would make it Cancel.
+            return TRUE;
+        default:
+            page->dialog.handleMessage(window, message, lParam);
+            return FALSE;
+        }
     });
 }
 
@@ -42,18 +65,30 @@ UINT CALLBACK pageCallback(HWND, UINT message, PROPSHEETPAGEW* description)
 {
     return guarded("property page release", UINT{1}, [&] {
         if (message == PSPCB_RELEASE)
-            delete reinterpret_cast<const Page*>(std::exchange(description->lParam, 0));
+            delete reinterpret_cast<const PageReference*>(std::exchange(description->lParam, 0));
         return UINT{1};
     });
 }
 
-// Finds a function of the common controls that the module's manifest names; inside an activation scope. The library is
-// never freed, since a page may outlive the object that added it.
+// Returns the common controls that the module's manifest names; called inside an activation scope. Loaded once and
+// kept, since a page may outlive the object that added it.
+HMODULE sheetControls() noexcept
+{
+    static std::atomic<HMODULE> controls{nullptr};
+    if (!controls) {
+        const HMODULE loaded = LoadLibraryW(L"comctl32.dll");
+        HMODULE none = nullptr;
+        if (loaded && !controls.compare_exchange_strong(none, loaded))
+            FreeLibrary(loaded);
+    }
+    return controls;
+}
+
 template <class Function>
 Function sheetFunction(const char* name) noexcept
 {
     Function function = nullptr;
-    if (const HMODULE controls = LoadLibraryW(L"comctl32.dll"))
+    if (const HMODULE controls = sheetControls())
         findFunction(controls, name, function);
     return function;
 }
@@ -68,13 +103,13 @@ void addPropertyPage(const Selection& selection, ManifestRef manifest, LPFNADDPR
     if (!isOffered)
         return;
     const ActivationScope activation;
-    auto page = std::make_unique<Page>(selection, std::move(manifest));
+    auto page = std::make_unique<PageReference>(std::make_shared<Page>(selection, std::move(manifest)));
     PROPSHEETPAGEW description{};
     description.dwSize = sizeof(description);
     description.dwFlags = PSP_USETITLE | PSP_USEREFPARENT | PSP_USECALLBACK;
     description.hInstance = moduleInstance();
     description.pszTemplate = MAKEINTRESOURCEW(TAVI_DIALOG_VERSIONS);
-    description.pszTitle = page->title.wc_str();
+    description.pszTitle = (*page)->title.wc_str();
     description.pfnDlgProc = pageProcedure;
     description.lParam = reinterpret_cast<LPARAM>(page.get());
     description.pfnCallback = pageCallback;

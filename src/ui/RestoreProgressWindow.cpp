@@ -1,5 +1,6 @@
 #include "ui/RestoreProgressWindow.h"
 
+#include <algorithm>
 #include <mutex>
 #include <utility>
 
@@ -22,24 +23,20 @@
 namespace tavi {
 namespace {
 
-// Notifies the dialog of pending messages. lParam is one of them.
-constexpr UINT kMessagesPending = WM_USER + 1;
+// Notifies the dialog of new messages from the service. lParam is the window's object.
+constexpr UINT kMessagesArrived = WM_USER + 1;
 constexpr UINT_PTR kTimer = 1;
 constexpr UINT kTimerMs = 250;
 // A restore that ends sooner must not flash a window.
 constexpr DWORD kShowAfterMs = 500;
 
-// The registered window.
-struct Registry {
-    CriticalSection lock;
-    std::shared_ptr<RestoreProgressWindow> window;
-};
-Registry theRegistry;
+CriticalSection windowLock;
+std::shared_ptr<RestoreProgressWindow> currentWindow;
 
-void deliverToWindow(std::unique_ptr<PipeMessage> message)
+void deliverToWindow(const PipeMessage& message)
 {
     if (const auto window = RestoreProgressWindow::current())
-        window->deliver(std::move(message));
+        window->deliver(message);
 }
 
 INT_PTR CALLBACK progressProcedure(HWND dialog, UINT message, WPARAM wParam, LPARAM lParam)
@@ -50,13 +47,16 @@ INT_PTR CALLBACK progressProcedure(HWND dialog, UINT message, WPARAM wParam, LPA
     });
 }
 
+// The argument is the thread's own reference to the window, on the heap.
+using WindowReference = std::shared_ptr<RestoreProgressWindow>;
+
 void runProgressWindow(void* argument)
 {
-    const auto window = static_cast<RestoreProgressWindow*>(argument)->shared_from_this();
+    const std::unique_ptr<const WindowReference> window(static_cast<const WindowReference*>(argument));
     ++moduleRefCount();
     const ActivationScope activation;
     const HWND dialog = CreateDialogParamW(moduleInstance(), MAKEINTRESOURCEW(TAVI_DIALOG_PROGRESS), nullptr,
-                                           progressProcedure, reinterpret_cast<LPARAM>(window.get()));
+                                           progressProcedure, reinterpret_cast<LPARAM>(window->get()));
     if (!dialog) {
         // The count stays raised: the window stays registered for its restores and needs the module's code.
         logError(L"Unable to create the progress window (%lu)", GetLastError());
@@ -71,45 +71,40 @@ void runProgressWindow(void* argument)
 
 void RestoreProgressWindow::getOrCreate()
 {
-    const std::lock_guard guard(theRegistry.lock);
-    auto& window = theRegistry.window;
-    if (!window) {
+    const std::lock_guard guard(windowLock);
+    if (!currentWindow) {
         transferStatus();
         setMessageSink(deliverToWindow);
-        window = std::make_shared<RestoreProgressWindow>();
-        if (!KernelHandle(startModuleThread(runProgressWindow, window.get()))) {
+        const auto window = std::make_shared<RestoreProgressWindow>();
+        auto reference = std::make_unique<WindowReference>(window);
+        if (!KernelHandle(startModuleThread(runProgressWindow, reference.get()))) {
             logError(L"Unable to start the progress window");
-            window.reset();
             return;
         }
+        static_cast<void>(reference.release());
+        currentWindow = window;
     }
-    ++window->restores_;
+    ++currentWindow->restores_;
 }
 
 std::shared_ptr<RestoreProgressWindow> RestoreProgressWindow::current()
 {
-    const std::lock_guard guard(theRegistry.lock);
-    return theRegistry.window;
+    const std::lock_guard guard(windowLock);
+    return currentWindow;
 }
 
-bool RestoreProgressWindow::isCurrent() const
+bool RestoreProgressWindow::dropRestores(std::int32_t count)
 {
-    const std::lock_guard guard(theRegistry.lock);
+    restores_ -= std::min(count, restores_);
+    if (restores_ == 0 && currentWindow.get() == this)
+        currentWindow.reset();
     return restores_ > 0;
-}
-
-void RestoreProgressWindow::dropRestore()
-{
-    const std::lock_guard guard(theRegistry.lock);
-    if (--restores_ == 0)
-        theRegistry.window.reset();
 }
 
 void RestoreProgressWindow::dropAllRestores()
 {
-    const std::lock_guard guard(theRegistry.lock);
-    if (std::exchange(restores_, 0) > 0)
-        theRegistry.window.reset();
+    const std::lock_guard guard(windowLock);
+    dropRestores(restores_);
 }
 
 INT_PTR RestoreProgressWindow::handleMessage(HWND window, UINT message, WPARAM wParam, LPARAM lParam)
@@ -123,22 +118,17 @@ INT_PTR RestoreProgressWindow::handleMessage(HWND window, UINT message, WPARAM w
         if (wParam != kTimer)
             return FALSE;
         transferStatus().timerTick();
-        refresh();
+        handleArrivals(window, true);
         return TRUE;
-    case kMessagesPending:
+    case kMessagesArrived:
         // The dialog manager uses this number, too: DM_SETDEFID.
-        if (!acceptNotification(reinterpret_cast<const PipeMessage*>(lParam)))
+        if (lParam != reinterpret_cast<LPARAM>(this))
             return FALSE;
-        handlePending(window);
+        handleArrivals(window, false);
         return TRUE;
     case WM_COMMAND:
-        // The window closes even if no service receives the cancellation.
-        if (LOWORD(wParam) == TAVI_PROGRESS_CANCEL) {
-            guarded("restore cancellation", [] {
-                auto command = CommandPipe::cancelRestore();
-                CommandPipe::sendCommand(command);
-            });
-        }
+        if (LOWORD(wParam) == TAVI_PROGRESS_CANCEL)
+            cancel(window);
         // With Close the service goes on with the restore.
         if (LOWORD(wParam) == TAVI_PROGRESS_CANCEL || LOWORD(wParam) == TAVI_PROGRESS_CLOSE)
             DestroyWindow(window);
@@ -172,78 +162,68 @@ void RestoreProgressWindow::initialize(HWND window)
     placeWindow(window, nullptr);
 }
 
-void RestoreProgressWindow::deliver(std::unique_ptr<PipeMessage> message)
+void RestoreProgressWindow::cancel(HWND window)
+{
+    // A service that connects but does not read blocks this thread: the user must not see that window any more, and the
+    // next restore needs one of its own.
+    ShowWindow(window, SW_HIDE);
+    dropAllRestores();
+    // The window closes even if no service receives the command.
+    guarded("restore cancellation", [] {
+        auto command = cancelRestoreCommand();
+        sendCommand(command);
+    });
+}
+
+void RestoreProgressWindow::deliver(const PipeMessage& message)
 {
     const HWND dialog = dialog_;
     if (!dialog)
         return;
-    const PipeMessage* notification = nullptr;
+    const auto isEvent = [&](EventType type) { return message.kind() == MessageKind::event && message.type() == type; };
+    const bool isEnd = isEvent(EventType::restoreEnded);
+    const bool isStartOrEnd = isEnd || isEvent(EventType::restoreStarted);
+    bool isFirstItem = false;
+    bool mustNotify = false;
     {
-        const std::lock_guard guard(pendingLock_);
-        notification = pending_.put(std::move(message));
-    }
-    if (notification && !SendNotifyMessageW(dialog, kMessagesPending, 0, reinterpret_cast<LPARAM>(notification))) {
-        const std::lock_guard guard(pendingLock_);
-        pending_.clear();
-    }
-}
-
-bool RestoreProgressWindow::acceptNotification(const PipeMessage* notification)
-{
-    const std::lock_guard guard(pendingLock_);
-    return pending_.accept(notification);
-}
-
-std::unique_ptr<PipeMessage> RestoreProgressWindow::takePending()
-{
-    const std::lock_guard guard(pendingLock_);
-    return pending_.take();
-}
-
-void RestoreProgressWindow::handlePending(HWND window)
-{
-    while (isCurrent()) {
-        const auto message = takePending();
-        if (!message) {
-            // The transfer status has had all of these messages already, so one refresh is enough.
-            refresh();
-            return;
+        const std::lock_guard guard(windowLock);
+        ends_ += isEnd ? 1 : 0;
+        if (isStartOrEnd)
+            awaitsFirstItem_ = true;
+        else if (isEvent(EventType::restoreItem))
+            isFirstItem = std::exchange(awaitsFirstItem_, false);
+        if (isStartOrEnd || message.kind() == MessageKind::snapshot) {
+            linesAreOutdated_ = true;
+            mustNotify = !std::exchange(isNotified_, true);
         }
-        if (message->kind() == MessageKind::event)
-            handleEvent(message->type());
-        else if (message->kind() == MessageKind::snapshot)
-            beginAnew();
     }
-    // The last restore has ended. Messages that are still pending are destroyed with this object.
-    DestroyWindow(window);
+    // The speed must not include the time of the search for the first item.
+    if (isFirstItem)
+        transferStatus().restoreRing.clearRing();
+    // If the notification is lost, the timer makes up for it.
+    if (mustNotify)
+        SendNotifyMessageW(dialog, kMessagesArrived, 0, reinterpret_cast<LPARAM>(this));
 }
 
-void RestoreProgressWindow::handleEvent(EventType type)
+void RestoreProgressWindow::handleArrivals(HWND window, bool mustRefresh)
 {
-    switch (type) {
-    case EventType::restoreEnded:
-        dropRestore();
-        [[fallthrough]];
-    case EventType::restoreStarted:
-        beginAnew();
-        awaitingFirstItem_ = true;
-        break;
-    case EventType::restoreItem:
-        // The speed must not include the time of the search for the first item.
-        if (std::exchange(awaitingFirstItem_, false))
-            transferStatus().restoreRing.clearRing();
-        break;
-    default:
-        break;
+    bool isHeld = false;
+    {
+        const std::lock_guard guard(windowLock);
+        isHeld = dropRestores(std::exchange(ends_, 0));
+        isNotified_ = false;
+        if (std::exchange(linesAreOutdated_, false)) {
+            // The bar itself keeps its position until the next refresh with another one.
+            position_ = 0;
+            remainingLine_.clear();
+            statusLine_.clear();
+            mustRefresh = true;
+        }
     }
-}
-
-void RestoreProgressWindow::beginAnew()
-{
-    // The bar itself keeps its position until the next refresh with another one.
-    position_ = 0;
-    remainingLine_.clear();
-    statusLine_.clear();
+    if (!isHeld)
+        DestroyWindow(window);
+    else if (mustRefresh)
+        refresh();
 }
 
 void RestoreProgressWindow::showText(int control, wxString& shown, const wxString& text)

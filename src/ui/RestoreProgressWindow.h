@@ -8,9 +8,8 @@
 #include <windows.h>
 #include <wx/string.h>
 
-#include "core/CriticalSection.h"
 #include "core/Module.h"
-#include "link/PendingMessages.h"
+#include "link/PipeMessage.h"
 
 namespace tavi {
 
@@ -19,7 +18,7 @@ namespace tavi {
 //
 // Each queued restore holds the window until the service reports its end. The window closes with the last of them, or
 // at once when the user closes it. Shared pointers keep the memory only.
-class RestoreProgressWindow : public std::enable_shared_from_this<RestoreProgressWindow> {
+class RestoreProgressWindow {
   public:
     // Adds a restore to the window, which is created if there is none. Any thread.
     static void getOrCreate();
@@ -35,38 +34,40 @@ class RestoreProgressWindow : public std::enable_shared_from_this<RestoreProgres
     {
         return dialog_;
     }
-    // Adds a pending message and notifies the dialog, without waiting. Destroys the message if there is no dialog. Any
-    // thread.
-    void deliver(std::unique_ptr<PipeMessage> message);
+    // Records the effect of a message and notifies the dialog, without waiting. Ignores the message if there is no
+    // dialog. Any thread.
+    void deliver(const PipeMessage& message);
 
     // Handles a message of the dialog and returns the dialog procedure's result. The dialog's thread.
     INT_PTR handleMessage(HWND window, UINT message, WPARAM wParam, LPARAM lParam);
 
   private:
-    bool isCurrent() const;
-    void dropRestore();
-    void dropAllRestores();
     void initialize(HWND window);
-    bool acceptNotification(const PipeMessage* notification);
-    std::unique_ptr<PipeMessage> takePending();
-    void handlePending(HWND window);
-    void handleEvent(EventType type);
-    void beginAnew();
+    void cancel(HWND window);
+    void handleArrivals(HWND window, bool mustRefresh);
+    // Drops at most all restores. Returns whether one still holds the window. For callers that have the lock.
+    bool dropRestores(std::int32_t count);
+    void dropAllRestores();
     void refresh();
     void showText(int control, wxString& shown, const wxString& text);
 
-    // Guarded by the lock of the registered window; 0 once this is not the registered one.
-    std::int32_t restores_ = 0;
     std::atomic<HWND> dialog_{nullptr};
     HWND progressBar_ = nullptr;
     wxString statusLine_;
     wxString remainingLine_;
     wxString speedLine_;
     std::int32_t position_ = 0;
-    bool awaitingFirstItem_ = false;
-    CriticalSection pendingLock_;
-    PendingMessages pending_;
     std::optional<ModuleLock> lock_{std::in_place};
+
+    // The lock of the current window guards the rest.
+    // The restores that hold this window; 0 unless it is the current one.
+    std::int32_t restores_ = 0;
+    // The messages since the dialog last looked: the ends of restores, and whether one makes every line outdated.
+    std::int32_t ends_ = 0;
+    bool linesAreOutdated_ = false;
+    // Whether the dialog has been notified since then: once is enough, and keeps its message queue short.
+    bool isNotified_ = false;
+    bool awaitsFirstItem_ = false;
 };
 
 } // namespace tavi

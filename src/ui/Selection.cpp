@@ -15,8 +15,8 @@
 namespace tavi {
 namespace {
 
-// Counts items with a property and items without it.
-class CoverageCounter {
+// Records whether there are items with a property and items without it.
+class CoverageRecord {
   public:
     void add(bool hasProperty) noexcept
     {
@@ -178,49 +178,49 @@ PathSet collectPaths(LPCITEMIDLIST folder, IDataObject* data, DriveTypeQuery dri
 
 Coverage summarizeStates(const PathSet& paths, FolderStateTable& states)
 {
-    CoverageCounter counter;
+    CoverageRecord record;
     if (paths.empty())
-        return counter.coverage();
+        return record.coverage();
     try {
         const FolderStateTable::ReadScope reading(states);
         for (const wxString& path : paths) {
             const FolderState state = states.getFolderState(path);
-            counter.add(state == FolderState::offAllOn || state == FolderState::allOn);
-            if (counter.isMixed())
+            record.add(state == FolderState::offAllOn || state == FolderState::allOn);
+            if (record.isMixed())
                 break;
         }
     } catch (const DbException& error) {
         // The other items would fail, too, and each may have to wait for the database's timeout.
         logWarning(L"Failed to retrieve folder state (%d: %ls)", error.code(), error.message().wc_str());
-        counter.add(false);
+        record.add(false);
     }
-    return counter.coverage();
+    return record.coverage();
 }
 
 void summarizeVersions(Selection& selection, const Manifest* manifest)
 {
-    CoverageCounter counter;
-    selection.isFolder = false;
+    CoverageRecord record;
+    selection.hasFolder = false;
     if (manifest) {
         std::wstring folder;
         for (const wxString& path : selection.paths) {
-            if (counter.isMixed() && selection.isFolder)
+            if (record.isMixed() && selection.hasFolder)
                 break;
             const bool directory = isDirectory(path);
-            selection.isFolder |= directory;
-            if (counter.isMixed())
+            selection.hasFolder |= directory;
+            if (record.isMixed())
                 continue;
             if (directory) {
                 folder = view(path);
                 if (folder.back() != L'\\')
                     folder.push_back(L'\\');
-                counter.add(manifest->hasBackedUpUnder(folder, kAnyTime));
+                record.add(manifest->hasBackedUpUnder(folder, kAnyTime));
             } else {
-                counter.add(manifest->isBackedUp(view(path), kAnyTime));
+                record.add(manifest->isBackedUp(view(path), kAnyTime));
             }
         }
     }
-    selection.restoreMode = counter.coverage();
+    selection.restoreMode = record.coverage();
     selection.displayName = selection.paths.size() == 1 ? selection.paths.begin()->AfterLast(L'\\') : wxString();
 }
 

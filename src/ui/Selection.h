@@ -19,12 +19,12 @@ enum class Coverage : std::int32_t { some = -1, none = 0, all = 1 };
 // The items that the host selected, and what the menu and the dialogs need to know of them.
 struct Selection {
     PathSet paths;
-    // The items below which everything is backed up. Recorded only: the menu does not depend on it.
+    // The items below which everything is backed up. Nothing in the module reads it.
     Coverage stateSummary = Coverage::none;
     // The items with versions in the manifest.
     Coverage restoreMode = Coverage::none;
     // Whether a folder is among the items.
-    bool isFolder = false;
+    bool hasFolder = false;
     // The name of a single item; empty for several items and for a drive.
     wxString displayName;
 };
@@ -37,7 +37,7 @@ void captureSelection(LPCITEMIDLIST folder, IDataObject* data, FolderStateTable&
 using DriveTypeQuery = UINT(WINAPI*)(LPCWSTR root);
 PathSet collectPaths(LPCITEMIDLIST folder, IDataObject* data, DriveTypeQuery driveType);
 Coverage summarizeStates(const PathSet& paths, FolderStateTable& states);
-// Sets restoreMode, isFolder and displayName from the paths. The manifest may be null.
+// Sets restoreMode, hasFolder and displayName from the paths. The manifest may be null.
 void summarizeVersions(Selection& selection, const Manifest* manifest);
 
 } // namespace tavi

@@ -6,17 +6,12 @@
 #include <vector>
 
 #include <commctrl.h>
-#include <ole2.h>
-#include <prsht.h>
 #include <wx/datetime.h>
 #include <wx/intl.h>
 
 #include "core/Boundary.h"
 #include "core/DisplayFormat.h"
 #include "core/Handles.h"
-#include "core/LogLine.h"
-#include "core/Module.h"
-#include "core/ModuleThread.h"
 #include "core/ScopeGuard.h"
 #include "core/Utf8.h"
 #include "restore/RestoreRequest.h"
@@ -25,29 +20,12 @@
 #include "ui/LocalePattern.h"
 #include "ui/resource.h"
 #include "ui/RestoreProgressWindow.h"
-#include "ui/WindowFrame.h"
 
 namespace tavi {
 namespace {
 
 // The reserved manifest path whose versions are the backup runs.
 constexpr const wchar_t* kBackupRuns = L"simple.map";
-
-// The shell's folder browser needs OLE on its thread.
-class OleScope {
-  public:
-    OleScope() noexcept : initialized_(SUCCEEDED(OleInitialize(nullptr))) {}
-    ~OleScope()
-    {
-        if (initialized_)
-            OleUninitialize();
-    }
-    OleScope(const OleScope&) = delete;
-    OleScope& operator=(const OleScope&) = delete;
-
-  private:
-    bool initialized_;
-};
 
 struct VersionRow {
     ManifestPatch patch;
@@ -88,101 +66,26 @@ wxString shortenMiddle(const wxString& name, std::size_t kept)
     return wxString(text.data(), head) + L"\u2026" + wxString(text.data() + tail, text.length() - tail);
 }
 
-INT_PTR CALLBACK dialogProcedure(HWND window, UINT message, WPARAM wParam, LPARAM lParam)
-{
-    return guarded("versions dialog", INT_PTR{FALSE}, [&]() -> INT_PTR {
-        auto* const dialog = dialogObject<VersionsDialog>(window, message, lParam);
-        return dialog ? dialog->handleMessage(window, message, wParam, lParam) : FALSE;
-    });
-}
-
-// The argument of a dialog's thread. Counts as an object of the module until the thread's last step.
-struct DialogStart {
-    ModuleLock lock;
-    Selection selection;
-    ManifestRef manifest;
-    HWND host;
-};
-
-void runDialog(void* argument)
-{
-    const std::unique_ptr<DialogStart> start(static_cast<DialogStart*>(argument));
-    const OleScope ole;
-    const ActivationScope activation;
-    const auto dialog = std::make_shared<VersionsDialog>(std::move(start->selection), std::move(start->manifest), true);
-    // No owner: the kernel would join the input queues of this thread and the owner's.
-    const WindowHandle window(CreateDialogParamW(moduleInstance(), MAKEINTRESOURCEW(TAVI_DIALOG_VERSIONS), nullptr,
-                                                 dialogProcedure, reinterpret_cast<LPARAM>(dialog.get())));
-    if (!window) {
-        logError(L"Unable to create the versions dialog (%lu)", GetLastError());
-        return;
-    }
-    placeWindow(window.get(), start->host);
-    // In this order: a window that gets the focus before the foreground keeps the caption of an inactive window.
-    ShowWindow(window.get(), SW_SHOWNA);
-    SetForegroundWindow(window.get());
-    SetFocus(GetDlgItem(window.get(), TAVI_VERSIONS_LIST));
-    runDialogLoop(window.get());
-}
-
 } // namespace
 
-bool startVersionsDialog(Selection selection, ManifestRef manifest, HWND host)
+VersionsDialog::VersionsDialog(Selection selection, ManifestRef manifest)
+    : paths_(std::move(selection.paths)), coverage_(selection.restoreMode), manifest_(std::move(manifest))
 {
-    std::unique_ptr<DialogStart> start(new DialogStart{{}, std::move(selection), std::move(manifest), host});
-    if (!KernelHandle(startModuleThread(runDialog, start.get()))) {
-        logError(L"Unable to start the versions dialog");
-        return false;
-    }
-    static_cast<void>(start.release());
-    return true;
-}
-
-VersionsDialog::VersionsDialog(Selection selection, ManifestRef manifest, bool ownThread)
-    : paths_(std::move(selection.paths)), coverage_(selection.restoreMode), manifest_(std::move(manifest)),
-      ownThread_(ownThread)
-{
-    if (paths_.size() == 1 && !selection.isFolder)
+    if (paths_.size() == 1 && !selection.hasFolder)
         singleFile_ = *paths_.begin();
 }
 
-VersionsDialog::~VersionsDialog()
+void VersionsDialog::handleMessage(HWND window, UINT message, LPARAM lParam)
 {
-    // The module lock, the first member, is released after this call, so that COM does not unmap this code.
-    if (!ownThread_)
-        CoFreeUnusedLibraries();
-}
-
-INT_PTR VersionsDialog::handleMessage(HWND window, UINT message, WPARAM wParam, LPARAM lParam)
-{
-    const auto keep = shared_from_this();
     const ActivationScope activation;
-    switch (message) {
-    case WM_INITDIALOG:
+    if (message == WM_INITDIALOG) {
         window_ = window;
         initialize();
-        return FALSE;
-    case WM_NOTIFY: {
+    } else if (message == WM_NOTIFY) {
         const auto& change = *reinterpret_cast<const NMLISTVIEW*>(lParam);
         if (change.hdr.idFrom == TAVI_VERSIONS_LIST && change.hdr.code == LVN_ITEMCHANGED &&
             (change.uChanged & LVIF_STATE))
             enableActions((change.uNewState & LVIS_SELECTED) != 0);
-        return FALSE;
-    }
-    case WM_COMMAND:
-        runCommand(LOWORD(wParam));
-        return TRUE;
-    case WM_CLOSE:
-        // The property sheet destroys the window of its page.
-        if (ownThread_)
-            DestroyWindow(window);
-        return TRUE;
-    case WM_DESTROY:
-        if (ownThread_)
-            PostQuitMessage(0);
-        return TRUE;
-    default:
-        return FALSE;
     }
 }
 
@@ -194,8 +97,6 @@ HWND VersionsDialog::list() const
 void VersionsDialog::initialize()
 {
     setTexts();
-    if (ownThread_)
-        setWindowIcons(window_);
     SendMessageW(list(), LVM_SETEXTENDEDLISTVIEWSTYLE, 0, LVS_EX_FULLROWSELECT | LVS_EX_DOUBLEBUFFER);
     addColumns();
     addRows();
@@ -204,8 +105,6 @@ void VersionsDialog::initialize()
 
 void VersionsDialog::setTexts()
 {
-    if (ownThread_)
-        SetWindowTextW(window_, _("Restore Files").wc_str());
     const std::pair<int, wxString> texts[] = {
         {TAVI_VERSIONS_LABEL, isSingleFile() ? _("File &Versions:") : _("Available &Versions:")},
         {TAVI_VERSIONS_VIEW, _("&View")},
@@ -329,29 +228,23 @@ void VersionsDialog::enableActions(bool enabled) const
     EnableWindow(GetDlgItem(window_, TAVI_VERSIONS_COPY_TO), enabled);
 }
 
-void VersionsDialog::runCommand(UINT id)
+bool VersionsDialog::runCommand(UINT id)
 {
     const bool closes = id == IDCANCEL || id == TAVI_VERSIONS_RESTORE || id == TAVI_VERSIONS_COPY_TO;
-    // The user cannot give a second command while a box of the first is open; another program can.
-    if (!closes || busy_)
-        return;
-    {
-        busy_ = true;
-        const ScopeGuard done([&] { busy_ = false; });
-        guarded("versions dialog command", [&] {
-            if (id == TAVI_VERSIONS_RESTORE)
-                restoreInPlace();
-            else if (id == TAVI_VERSIONS_COPY_TO)
-                isSingleFile() ? copyFile() : copyToFolder();
-        });
-    }
-    // The window closes whatever the answer was. It may be destroyed already, while the box was open.
-    if (!IsWindow(window_))
-        return;
-    if (ownThread_)
-        DestroyWindow(window_);
-    else if (id == IDCANCEL)
-        PostMessageW(GetParent(window_), PSM_PRESSBUTTON, PSBTN_CANCEL, 0);
+    // A box disables the dialog, but a message from another program still arrives and must not open a second box.
+    if (!closes || isBusy_)
+        return false;
+    isBusy_ = true;
+    const ScopeGuard done([&] { isBusy_ = false; });
+    const ActivationScope activation;
+    guarded("versions dialog command", [&] {
+        if (id == TAVI_VERSIONS_RESTORE)
+            restoreInPlace();
+        else if (id == TAVI_VERSIONS_COPY_TO)
+            isSingleFile() ? copyFile() : copyToFolder();
+    });
+    // The window may be destroyed while the box is open.
+    return IsWindow(window_);
 }
 
 std::optional<bool> VersionsDialog::askOverwrite(const wxString& question, UINT icon) const
@@ -419,17 +312,14 @@ void VersionsDialog::request(const wxString& sourcePrefix, const wxString& desti
     if (!time)
         return;
     RestoreRequest request;
-    // A window of our own closes after the request; a page stays and may ask again.
-    if (ownThread_)
-        request.selectedPaths = std::move(paths_);
-    else
-        request.selectedPaths = paths_;
+    request.selectedPaths = paths_;
     request.cutoffTime = *time;
     request.sourcePrefix = sourcePrefix;
     request.destinationFolder = destination;
     request.overwrite = overwrite;
     SetCursor(LoadCursorW(nullptr, IDC_WAIT));
     performRestore(request, *manifest_);
+    // Also if the request failed, which is only logged: the user sees a window that waits, and can close it.
     RestoreProgressWindow::getOrCreate();
 }
 

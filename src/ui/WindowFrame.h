@@ -13,8 +13,8 @@ void placeWindow(HWND window, HWND host);
 // Sets the restore icon for caption and task bar.
 void setWindowIcons(HWND window);
 
-// Runs the message loop of a modeless dialog until WM_QUIT. With `showAfterMs` the dialog is hidden and is shown after
-// the first message that ends that much later, so it must have a timer.
+// Runs the message loop of a modeless dialog until WM_QUIT. With `showAfterMs` it shows the hidden dialog once that
+// time has passed, which it checks after each message: the dialog needs a timer, so that messages keep coming.
 void runDialogLoop(HWND dialog, std::optional<DWORD> showAfterMs = std::nullopt);
 
 // Returns the object that was passed as the dialog's creation parameter, or null before WM_INITDIALOG. For dialog

@@ -13,13 +13,14 @@ using namespace tavi::test;
 TEST(CommandPipe, KeepsTheCommandOnlyIfThePipeCannotBeOpened)
 {
     LogCapture log;
-    auto command = CommandPipe::cancelRestore();
-    EXPECT_FALSE(CommandPipe::sendCommand(command));
+    auto command = cancelRestoreCommand();
+    EXPECT_FALSE(sendCommand(command));
     EXPECT_EQ(log.takeText(), "1: Error: Unable to open command pipe: 2");
-    EXPECT_TRUE(command && serialised(*command) == serialised(*event(EventType::restoreEnded)));
+    ASSERT_TRUE(command);
+    EXPECT_EQ(serialized(*command), serialized(*event(EventType::restoreEnded)));
     // A write that fails: the server hangs up and has read nothing.
     const PipeServer deaf(kCommand, PIPE_ACCESS_INBOUND, 1, 0);
-    std::thread writer([&] { EXPECT_FALSE(CommandPipe::sendCommand(command)); });
+    std::thread writer([&] { EXPECT_FALSE(sendCommand(command)); });
     EXPECT_TRUE(deaf.waitClient());
     deaf.hangUp();
     writer.join();

@@ -25,10 +25,10 @@ inline auto event(EventType type, std::uint64_t value = 0, const wxString& conte
     return std::make_unique<EventMessage>(type, 0, value, flag, text(content));
 }
 
-inline std::string serialised(const PipeMessage& message)
+inline std::string serialized(const PipeMessage& message)
 {
     const auto buffer = MessageBuffer::create();
-    message.serialise(*buffer);
+    message.serialize(*buffer);
     return {reinterpret_cast<const char*>(buffer->data()), buffer->length()};
 }
 

@@ -55,7 +55,8 @@ TEST(MessageReader, ReadsOneFrameOrNone)
     for (const auto& [what, parts, isRead, pauses, largestRead] : cases) {
         Peer peer(parts);
         EXPECT_EQ(readFrame(peer, nullptr) != nullptr, isRead) << what;
-        EXPECT_TRUE(peer.pauses == pauses && peer.largestRead == largestRead) << what;
+        EXPECT_EQ(peer.pauses, pauses) << what;
+        EXPECT_EQ(peer.largestRead, largestRead) << what;
     }
 }
 

@@ -31,11 +31,13 @@ TEST(PipeMessage, MessagesKeepTheirLayoutInBothDirections)
          "15000000 12000000 0700000000000000 01000000 02000000 6162"},
         {std::make_shared<TextTripleMessage>(text(L"a"), text(L""), text(L"bc")),
          "16000000 0f000000 01000000 00000000 02000000 616263"},
+        {std::make_shared<CounterMessage>(1, 2, 3, 4),
+         "17000000 18000000 01000000 0200000000000000 0300000000000000 04000000"},
     };
     for (const auto& [message, frame] : cases) {
         const std::string expected = bytes(frame);
-        EXPECT_EQ(serialised(*message), expected) << frame;
-        EXPECT_EQ(serialised(*created(message->type(), expected.substr(kFrameHeaderSize))->clone()), expected) << frame;
+        EXPECT_EQ(serialized(*message), expected) << frame;
+        EXPECT_EQ(serialized(*created(message->type(), expected.substr(kFrameHeaderSize))->clone()), expected) << frame;
     }
 }
 
@@ -48,7 +50,8 @@ TEST(PipeMessage, TypeAndLengthDecideWhatIsCreated)
         const std::uint32_t kind = type >= 20 && type <= 23 ? type - 19 : 0;
         EXPECT_FALSE(created(E{type}, std::string(kLengths[kind] - 1, '\0'))) << type;
         const auto message = created(E{type}, std::string(kLengths[kind], '\0'));
-        EXPECT_TRUE(isUnused ? !message : message && message->kind() == MessageKind{kind}) << type;
+        EXPECT_EQ(message == nullptr, isUnused) << type;
+        EXPECT_TRUE(!message || message->kind() == MessageKind{kind}) << type;
     }
 }
 
@@ -58,7 +61,8 @@ TEST(PipeMessage, TextsExtendToTheEndOfTheBufferAtMost)
     for (const auto& [count, length] : counts) {
         const auto message = created(E::restoreItem, std::string(16, '\0') + bytes(count) + "abc");
         const wxString& held = *static_cast<const EventMessage&>(*message).text;
-        EXPECT_TRUE(held.length() == length && held.StartsWith(L"abc")) << count;
+        EXPECT_EQ(held.length(), length) << count;
+        EXPECT_TRUE(held.StartsWith(L"abc")) << count;
     }
 }
 
@@ -68,5 +72,7 @@ TEST(PipeMessage, ABufferThatCannotGrowHoldsNoMessage)
     buffer->ensure(1025);
     EXPECT_EQ(buffer->capacity(), 2049u);
     buffer->ensure(UINT32_MAX);
-    EXPECT_TRUE(!buffer->data() && buffer->capacity() == 0 && !createMessage(52, *buffer));
+    EXPECT_EQ(buffer->data(), nullptr);
+    EXPECT_EQ(buffer->capacity(), 0u);
+    EXPECT_FALSE(createMessage(52, *buffer));
 }

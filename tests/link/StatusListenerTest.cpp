@@ -30,13 +30,13 @@ TEST(StatusListener, ReconnectsAfterAMalformedFrameAndKeepsTheStatus)
     const PipeServer servers[] = {{kStatus, PIPE_ACCESS_OUTBOUND, 2}, {kStatus, PIPE_ACCESS_OUTBOUND, 2}};
     const Listener listener;
     ASSERT_TRUE(servers[0].waitClient());
-    servers[0].write(serialised(*event(EventType::restoreTotal, 7)) + serialised(CounterMessage(1, 1, 1, 1)));
+    servers[0].write(serialized(*event(EventType::restoreTotal, 7)) + serialized(CounterMessage(1, 1, 1, 1)));
     EXPECT_TRUE(waitUntil([] { return transferStatus().restoreTotal == 7; }));
     const DWORD start = GetTickCount();
     servers[0].write(bytes("34000000 00000000"));
     ASSERT_TRUE(servers[1].waitClient());
     EXPECT_LT(GetTickCount() - start, 4000u) << "only a failed open waits";
-    servers[1].write(serialised(*event(EventType::restoreMore, 2)));
+    servers[1].write(serialized(*event(EventType::restoreMore, 2)));
     EXPECT_TRUE(waitUntil([] { return transferStatus().restoreTotal == 9; }));
     servers[1].write(bytes("34000000 14000000")); // stops in mid-frame, which must not delay the listener's end
 }
@@ -44,7 +44,7 @@ TEST(StatusListener, ReconnectsAfterAMalformedFrameAndKeepsTheStatus)
 TEST(StatusListener, WaitsForAMissingServiceAndAfterAnException)
 {
     LogCapture log;
-    setMessageSink([](std::unique_ptr<PipeMessage>) { throw std::bad_alloc(); });
+    setMessageSink([](const PipeMessage&) { throw std::bad_alloc(); });
     DWORD start = GetTickCount();
     {
         const Listener listener;
@@ -53,10 +53,10 @@ TEST(StatusListener, WaitsForAMissingServiceAndAfterAnException)
         EXPECT_TRUE(servers[0].waitClient());
         EXPECT_GT(GetTickCount() - start, 4500u);
         start = GetTickCount();
-        servers[0].write(serialised(*event(EventType::restoreEnded)));
+        servers[0].write(serialized(*event(EventType::restoreEnded)));
         EXPECT_TRUE(servers[1].waitClient());
         EXPECT_GT(GetTickCount() - start, 4500u);
-        servers[1].write(serialised(*event(EventType::restoreTotal, 9)));
+        servers[1].write(serialized(*event(EventType::restoreTotal, 9)));
         EXPECT_TRUE(waitUntil([] { return transferStatus().restoreTotal == 9; }));
         start = GetTickCount();
     }

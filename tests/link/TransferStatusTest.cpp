@@ -18,22 +18,23 @@ std::atomic<std::uint32_t> now{0};
 
 struct Status : TransferStatus {
     Status() : TransferStatus(true, [] { return now.load(); }) {}
-    // Returns the fields that are not 0: flags, whether there are texts, amounts, the ring by bytes per second, rates.
+    // Returns the fields that are not 0: flags, whether there are texts, amounts, rings by bytes per second, rates.
     std::string contents() const
     {
         const auto field = [](const char* name, std::int64_t value) {
             return value == 0 ? "" : name + (value == 1 ? "" : '=' + std::to_string(value)) + ' ';
         };
+        const auto speed = [](const RateRing& ring) { return std::llround(ring.rateOver(1 << 30) * 1000); };
         return field("ended", ended) + field("ended3", ended3) + field("mark", mark10) + field("switch", switch24) +
                field("textA", !statusTextA.get().empty()) + field("doneA", doneA) + field("totalA", totalA) +
-               field("doneB", doneB) + field("totalB", totalB) + field("started", restoreStarted) +
+               field("doneB", doneB) + field("totalB", totalB) + field("ringA", speed(ringA)) +
+               field("ringB", speed(ringB)) + field("started", restoreStarted) +
                field("item", !restoreText.get().empty()) + field("done", restoreDone) + field("total", restoreTotal) +
-               field("ring", std::llround(restoreRing.rateOver(1 << 30) * 1000)) +
-               field("rates", restoreRateShort > 0 && restoreRateLong > 0);
+               field("ring", speed(restoreRing)) + field("rates", restoreRateShort > 0 && restoreRateLong > 0);
     }
 };
 
-const std::string kBackup = "switch textA doneA=90 totalA=90 doneB=90 totalB=90 ";
+const std::string kBackup = "switch textA doneA=90 totalA=90 doneB=90 totalB=90 ringA=30 ";
 const std::string kRestore = "item done=90 total=90 ring=11 rates ";
 
 TEST(TransferStatus, MessagesChangeTheirFieldsOnly)
@@ -45,7 +46,8 @@ TEST(TransferStatus, MessagesChangeTheirFieldsOnly)
         {"end", event(E::backupEnded2), "ended " + kRestore},
         {"end with an outcome", event(E::backupEnded3), "ended ended3 " + kRestore},
         {"end with totals", event(E::backupEnded10, 7), "ended mark totalA=7 totalB=7 " + kRestore},
-        {"beyond the total", event(E::doneA, 90), kBackup + kRestore},
+        {"beyond the total", event(E::doneB, 90), kBackup + kRestore},
+        {"sample of B", event(E::doneB, 90, "", 1), kBackup + "ringB=10 " + kRestore},
         {"restore started", event(E::restoreStarted), kBackup + "started "},
         {"restore ended", event(E::restoreEnded), kBackup},
         {"end of item", event(E::restoreItemEnded), kBackup + left + "ring=11 rates "},
@@ -81,14 +83,17 @@ TEST(TransferStatus, EachOutcomeAndSwitchHasItsFlag)
         {E::backupEnded5, &S::ended5, E::backupReset},   {E::backupEnded6, &S::ended6, E::backupReset},
         {E::backupEnded8, &S::ended8, E::backupReset},   {E::backupEnded9, &S::ended9, E::backupReset},
         {E::backupEnded10, &S::ended10, E::backupReset}, {E::backupEnded10, &S::mark10, E::mark10Off},
-        {E::switch24On, &S::switch24, E::switch24Off},   {E::switch32On, &S::switch32, E::switch32Off},
-        {E::switch34On, &S::switch34, E::switch34Off},   {E::switch39On, &S::switch39, E::switch39Off}};
+        {E::backupEnded0, &S::ended, E::backupReset},    {E::switch24On, &S::switch24, E::switch24Off},
+        {E::switch32On, &S::switch32, E::switch32Off},   {E::switch34On, &S::switch34, E::switch34Off},
+        {E::switch39On, &S::switch39, E::switch39Off}};
     for (const auto& [on, flag, off] : cases) {
         Status status;
+        status.apply(*event(E::restoreStarted));
         status.apply(*event(on));
         EXPECT_TRUE(status.*flag) << static_cast<std::uint32_t>(on);
         status.apply(*event(off));
         EXPECT_FALSE(status.*flag) << static_cast<std::uint32_t>(off);
+        EXPECT_TRUE(status.restoreStarted) << "a backup that starts or ends beside a restore";
     }
 }
 
@@ -129,19 +134,33 @@ TEST(TransferStatus, EstimatesNeedARateOfAKilobit)
     }
 }
 
-// The listener and a window's thread at once, for the thread sanitizer.
-TEST(TransferStatus, IsReadWhileItChanges)
+TEST(TransferStatus, TextsHaveAtMostTheLengthOfAPath)
 {
+    constexpr std::size_t kLongest = 32767;
     Status status;
+    for (const auto& [length, kept] : {std::pair(kLongest, kLongest), {kLongest + 1, kLongest}, {1 << 24, kLongest}}) {
+        status.apply(*event(E::restoreItem, 0, wxString(L'x', length)));
+        EXPECT_EQ(status.restoreText.get(), wxString(L'x', kept));
+    }
+    status.apply(*event(E::textA, 0, wxString(L'x', kLongest - 1) + L"\U0001F4BE"));
+    EXPECT_EQ(status.statusTextA.get().length(), sizeof(wchar_t) == 2 ? kLongest - 1 : kLongest) << "no half a pair";
+}
+
+// The listener and a window's thread at once.
+TEST(TransferStatus, TextsAreWholeWhileTheyChange)
+{
+    const wxString texts[] = {wxString(L'a', 40), wxString(L'b', 90)};
+    Status status;
+    status.apply(*event(E::restoreItem, 0, texts[0]));
     std::thread listener([&] {
         for (std::uint32_t round = 0; round < 50000; ++round)
-            status.apply(*event(E{round % 500 == 0 ? 51 : 53 + round % 5}, 1000, wxString(L'a', round % 40)));
+            status.apply(*event(E{round % 500 == 0 ? 57 : 53 + round % 2}, 1000, texts[round / 2 % 2]));
         status.apply(SnapshotMessage(7, 1, 2, 3, 4));
     });
     while (status.doneB == 0) {
         status.timerTick();
-        status.restoreText.get();
-        status.restoreRing.clearRing();
+        const wxString text = status.restoreText.get();
+        EXPECT_TRUE(text == texts[0] || text == texts[1] || text.empty()) << text;
     }
     listener.join();
 }

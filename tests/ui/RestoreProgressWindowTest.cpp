@@ -6,7 +6,7 @@
 
 #include "link/StatusListener.h"
 #include "tests/link/Frames.h"
-#include "tests/support/Dialogs.h"
+#include "tests/support/Pipes.h"
 #include "ui/resource.h"
 
 namespace tavi {
@@ -17,56 +17,135 @@ using namespace test;
 constexpr auto kStarted = EventType::restoreStarted, kEnded = EventType::restoreEnded, kItem = EventType::restoreItem,
                kTotal = EventType::restoreTotal, kDone = EventType::restoreDone;
 
+// Instead of a window's procedure: counts the messages, and makes the thread wait or its timer stop.
+std::map<HWND, WNDPROC> procedures;
+std::atomic<bool> isBusy, isStopped;
+std::atomic<unsigned> counts[WM_USER + 2];
+std::atomic<DWORD> lastTick, shortestMs;
+LRESULT CALLBACK spy(HWND window, UINT message, WPARAM wParam, LPARAM lParam)
+{
+    waitUntil([] { return !isBusy; });
+    if (message == WM_TIMER) {
+        if (isStopped)
+            return 0;
+        const DWORD before = lastTick.exchange(GetTickCount());
+        shortestMs = std::min(shortestMs.load(), lastTick - before);
+    }
+    if (message < std::size(counts))
+        ++counts[message];
+    return CallWindowProcW(procedures.at(window), window, message, wParam, lParam);
+}
+
 struct RestoreProgressWindowTest : UiTest {
-    // Queues a restore and returns the dialog, still hidden.
-    static HWND open()
+    // Queues restores and waits for the dialog, still hidden.
+    void open(int restores = 1)
     {
-        RestoreProgressWindow::getOrCreate();
+        transferStatus().resetRestore();
+        for (int i = 0; i < restores; ++i)
+            RestoreProgressWindow::getOrCreate();
         waitUntil([] { return RestoreProgressWindow::current()->dialog() != nullptr; });
-        return RestoreProgressWindow::current()->dialog();
+        dialog = RestoreProgressWindow::current()->dialog();
+        isBusy = isStopped = false;
+        shortestMs = INFINITE;
+        std::fill(std::begin(counts), std::end(counts), 0);
+        const HWND windows[] = {dialog, GetDlgItem(dialog, TAVI_PROGRESS_STATUS)};
+        for (const HWND window : windows)
+            procedures[window] = reinterpret_cast<WNDPROC>(GetWindowLongPtrW(window, GWLP_WNDPROC));
+        for (const HWND window : windows)
+            SetWindowLongPtrW(window, GWLP_WNDPROC, LONG_PTR(&spy));
     }
-    static bool shows(HWND dialog, const std::wstring& status)
+    bool shows(const std::wstring& text, int control = TAVI_PROGRESS_STATUS) const
     {
-        return waitUntil([&] { return controlText(dialog, TAVI_PROGRESS_STATUS) == status; });
+        return waitUntil([&] { return controlText(dialog, control) == text; });
     }
-    static bool closes(HWND dialog)
+    bool reaches(LRESULT position) const
+    {
+        return waitUntil([&] { return SendDlgItemMessageW(dialog, TAVI_PROGRESS_BAR, PBM_GETPOS, 0, 0) == position; });
+    }
+    bool closes() const
     {
         return waitUntil([&] { return !IsWindow(dialog); }) && !RestoreProgressWindow::current();
     }
+    HWND dialog = nullptr;
 };
 
-TEST_F(RestoreProgressWindowTest, ShowsItselfLateAndFollowsRestoresToTheLastEnd)
+TEST_F(RestoreProgressWindowTest, ShowsItselfLateAndEachLineOfTheStatus)
 {
     const DWORD start = GetTickCount();
-    RestoreProgressWindow::getOrCreate();
-    const HWND dialog = open();
+    open();
     ASSERT_EQ(waitDialog(L"Restoring..."), dialog);
     EXPECT_GE(GetTickCount() - start, 490u);
+    EXPECT_TRUE(shows(L"Waiting to begin restore..."));
+    EXPECT_TRUE(shows(L"Unknown", TAVI_PROGRESS_REMAINING));
+    EXPECT_TRUE(shows(L"0.0 b/s", TAVI_PROGRESS_SPEED));
     dispatch(event(kStarted));
-    dispatch(event(kDone, 1 << 30)); // before the first item: not part of its speed
-    dispatch(event(kTotal, 1000));
+    EXPECT_TRUE(shows(L"Finding file on server..."));
     dispatch(event(kItem, 0, "C:\\d\\A & B.txt"));
-    EXPECT_TRUE(shows(dialog, L"C:\\d\\A & B.txt"));
-    EXPECT_EQ(transferStatus().restoreRing.rateOver(60000), 0);
+    EXPECT_TRUE(shows(L"C:\\d\\A & B.txt"));
+    dispatch(event(kTotal, 1000));
     dispatch(event(kDone, 500));
-    const auto position = [&] { return SendDlgItemMessageW(dialog, TAVI_PROGRESS_BAR, PBM_GETPOS, 0, 0); };
-    EXPECT_TRUE(waitUntil([&] { return position() == 125; }));
-    dispatch(event(kItem, 0, "C:\\d\\B.txt"));
-    EXPECT_TRUE(waitUntil([] { return transferStatus().restoreSpeed() > 0; })) << "only the first item clears it";
-    EXPECT_TRUE(waitUntil([&] { // the window's timer renews the rate
-        return transferStatus().restoreRateLong = 1000, controlText(dialog, TAVI_PROGRESS_REMAINING) == L"4 seconds";
+    EXPECT_TRUE(reaches(125));
+    EXPECT_TRUE(waitUntil([&] { // some ticks compute the rates again
+        transferStatus().restoreRateShort = 2048;
+        transferStatus().restoreRateLong = 1000;
+        return controlText(dialog, TAVI_PROGRESS_SPEED) == L"2.0 Kb/s" &&
+               controlText(dialog, TAVI_PROGRESS_REMAINING) == L"4 seconds";
     }));
-    dispatch(std::make_unique<SnapshotMessage>(7, 0, 0, 0, 0));
-    EXPECT_TRUE(waitUntil([&] { return controlText(dialog, TAVI_PROGRESS_REMAINING) == L"Unknown"; }));
-    dispatch(event(kEnded));
-    dispatch(event(kStarted));
-    EXPECT_TRUE(shows(dialog, L"Finding file on server..."));
-    EXPECT_EQ(position(), 125) << "until an amount moves it";
     // The dialog manager uses the number of the window's own message, too.
     SendMessageW(dialog, DM_SETDEFID, TAVI_PROGRESS_CANCEL, 0);
     EXPECT_EQ(LOWORD(SendMessageW(dialog, DM_GETDEFID, 0, 0)), TAVI_PROGRESS_CANCEL);
+    EXPECT_TRUE(waitUntil([] { return counts[WM_TIMER] >= 8 && shortestMs < 375; }));
+    EXPECT_LE(counts[WM_TIMER], (GetTickCount() - start) / 250 + 2);
     dispatch(event(kEnded));
-    EXPECT_TRUE(closes(dialog));
+    EXPECT_TRUE(closes());
+}
+
+TEST_F(RestoreProgressWindowTest, StaysUntilTheLastEndAndBeginsAgainWithEachRestore)
+{
+    open(2);
+    dispatch(event(kStarted));
+    dispatch(event(kDone, 1 << 30)); // before the first item: not part of its speed
+    const RateRing& ring = transferStatus().restoreRing;
+    EXPECT_TRUE(waitUntil([&] { return ring.rateOver(60000) > 0; }));
+    dispatch(event(kItem, 0, "A"));
+    EXPECT_EQ(ring.rateOver(60000), 0);
+    dispatch(event(kTotal, 1000));
+    dispatch(event(kDone, 500));
+    dispatch(event(kItem, 0, "B"));
+    EXPECT_TRUE(waitUntil([&] { return ring.rateOver(60000) > 0; })) << "only the first item clears it";
+    EXPECT_TRUE(reaches(125));
+    dispatch(event(kEnded));
+    dispatch(event(kStarted));
+    EXPECT_TRUE(shows(L"Finding file on server..."));
+    EXPECT_TRUE(reaches(125)) << "until an amount moves it";
+    dispatch(event(kEnded));
+    EXPECT_TRUE(closes());
+}
+
+TEST_F(RestoreProgressWindowTest, RefreshesForAStartAnEndAndASnapshotOnly)
+{
+    open(2);
+    EXPECT_TRUE(shows(L"Waiting to begin restore..."));
+    isStopped = true;
+    // A message, and the number of times that it sets the first line.
+    std::pair<std::unique_ptr<PipeMessage>, unsigned> cases[] = {
+        {event(kItem, 0, "not before the next refresh"), 0},
+        {event(kDone, 1), 0},
+        {std::make_unique<CounterMessage>(1, 1, 1, 1), 0},
+        {event(EventType::snapshot), 0}, // no snapshot: its kind decides
+        {std::make_unique<SnapshotMessage>(7, 0, 0, 0, 0), 1},
+        {event(kStarted), 1},
+        {event(kEnded), 1},
+    };
+    for (auto& [message, count] : cases) {
+        counts[WM_SETTEXT] = 0;
+        const EventType type = message->type();
+        dispatch(std::move(message));
+        SendMessageW(dialog, WM_NULL, 0, 0); // after the notification
+        EXPECT_EQ(counts[WM_SETTEXT], count) << static_cast<std::uint32_t>(type);
+    }
+    dispatch(event(kEnded));
+    EXPECT_TRUE(closes());
 }
 
 TEST_F(RestoreProgressWindowTest, StaysRegisteredThoughItsDialogCannotBeCreated)
@@ -84,45 +163,53 @@ TEST_F(RestoreProgressWindowTest, StaysRegisteredThoughItsDialogCannotBeCreated)
     EXPECT_EQ(moduleRefCount()--, 1) << "the thread's stays raised";
 }
 
-// Instead of the dialog's window procedure: makes its thread wait.
-WNDPROC procedure;
-std::atomic<bool> isBusy;
-LRESULT CALLBACK waitWhileBusy(HWND window, UINT message, WPARAM wParam, LPARAM lParam)
-{
-    waitUntil([] { return !isBusy; });
-    return CallWindowProcW(procedure, window, message, wParam, lParam);
-}
-
-TEST_F(RestoreProgressWindowTest, HoldsFewMessagesWhileBusyAndCatchesUpInOneGo)
+TEST_F(RestoreProgressWindowTest, CatchesUpAfterOneNotificationWhenItWasBusy)
 {
     translate("Finding file on server...", "Sucht die Datei...");
-    RestoreProgressWindow::getOrCreate();
-    const HWND dialog = open();
+    open(3);
     isBusy = true;
-    procedure = reinterpret_cast<WNDPROC>(SetWindowLongPtrW(dialog, GWLP_WNDPROC, LONG_PTR(&waitWhileBusy)));
-    dispatch(event(kEnded));
-    const auto item = text(L"item");
-    for (int round = 0; round < 50000; ++round)
-        dispatch(std::make_unique<EventMessage>(round % 100 == 0 ? kStarted : kItem, 0, 0, 0, item));
-    EXPECT_TRUE(item.use_count() > 1 && item.use_count() <= 1001) << item.use_count();
-    dispatch(event(kStarted));
+    for (const EventType type : {kEnded, kStarted, kItem, kEnded, kStarted})
+        dispatch(event(type));
     isBusy = false;
-    EXPECT_TRUE(shows(dialog, L"Sucht die Datei..."));
+    EXPECT_TRUE(shows(L"Sucht die Datei..."));
+    EXPECT_EQ(counts[WM_USER + 1], 1u);
     dispatch(event(kEnded));
-    EXPECT_TRUE(closes(dialog)) << "neither end was lost";
-    EXPECT_TRUE(waitUntil([&] { return item.use_count() == 1; }));
+    EXPECT_TRUE(closes()) << "no end was lost";
 }
 
-TEST_F(RestoreProgressWindowTest, ClosesByEveryButtonThoughItCannotCancel)
+TEST_F(RestoreProgressWindowTest, ClosesThoughANotificationIsLost)
+{
+    open();
+    // As if its dialog were this one, which does not exist.
+    RestoreProgressWindow::current()->handleMessage(reinterpret_cast<HWND>(LONG_PTR{0x7FFE}), WM_INITDIALOG, 0, 0);
+    dispatch(event(kEnded));
+    EXPECT_TRUE(closes());
+}
+
+TEST_F(RestoreProgressWindowTest, HidesBeforeItWaitsForAServiceThatDoesNotRead)
+{
+    const PipeServer deaf(kCommand, PIPE_ACCESS_INBOUND, 1, 0);
+    open();
+    ASSERT_EQ(waitDialog(L"Restoring..."), dialog);
+    click(dialog, TAVI_PROGRESS_CANCEL);
+    EXPECT_TRUE(deaf.waitClient());
+    EXPECT_TRUE(IsWindow(dialog)) << "it waits";
+    EXPECT_FALSE(IsWindowVisible(dialog));
+    EXPECT_FALSE(RestoreProgressWindow::current()) << "the next restore has a new window";
+    deaf.hangUp();
+    EXPECT_TRUE(closes());
+}
+
+TEST_F(RestoreProgressWindowTest, ClosesAtOnceByEveryButtonThoughItCannotCancel)
 {
     log.onNextLine([] { throw std::bad_alloc(); }); // the line that Cancel finds no service
     const std::tuple<UINT, WPARAM, std::size_t> cases[] = {
         {WM_COMMAND, TAVI_PROGRESS_CANCEL, 1}, {WM_COMMAND, TAVI_PROGRESS_CLOSE, 0}, {WM_CLOSE, 0, 0}};
     for (const auto& [message, command, lines] : cases) {
-        const HWND dialog = open();
+        open(2);
         dispatch(event(kStarted));
         PostMessageW(dialog, message, command, 0);
-        EXPECT_TRUE(closes(dialog));
+        EXPECT_TRUE(closes()) << "though two restores hold it";
         EXPECT_EQ(log.take().size(), lines);
         EXPECT_TRUE(transferStatus().restoreStarted) << "the service goes on with the restore";
     }

@@ -111,9 +111,10 @@ TEST_F(SelectionTest, SummarizesVersionsAndStates)
     for (const auto& [paths, summary] : cases) {
         Selection of{paths, kNone, kSome, true, L"?"};
         summarizeVersions(of, manifest.get());
-        EXPECT_EQ(Summary(of.restoreMode, summarizeStates(paths, states), of.isFolder, of.displayName), summary);
+        EXPECT_EQ(Summary(of.restoreMode, summarizeStates(paths, states), of.hasFolder, of.displayName), summary);
         summarizeVersions(of, nullptr);
-        EXPECT_TRUE(of.restoreMode == kNone && !of.isFolder);
+        EXPECT_EQ(of.restoreMode, kNone);
+        EXPECT_FALSE(of.hasFolder);
     }
     service.database(L"taviconf.dat").execDML("DROP TABLE filesystem");
     EXPECT_EQ(summarizeStates({in(L"sub")}, states), kNone) << "a table that can no longer be read";

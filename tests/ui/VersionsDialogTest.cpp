@@ -1,5 +1,8 @@
 #include "ui/VersionsDialog.h"
 
+#include <cstdlib>
+#include <ctime>
+
 #include <commctrl.h>
 #include <dlgs.h>
 #include <shlobj.h>
@@ -7,17 +10,24 @@
 #include "tests/support/Dialogs.h"
 #include "ui/resource.h"
 #include "ui/RestoreProgressWindow.h"
+#include "ui/VersionsWindow.h"
 
 namespace tavi {
 namespace {
 
 using namespace test;
 
+void setTimeZone(const char* zone)
+{
+    _putenv_s("TZ", zone);
+    _tzset();
+}
+
 struct VersionsDialogTest : UiTest {
-    void open(const PathSet& paths, bool isFolder, const wxString& files)
+    void open(const PathSet& paths, bool hasFolder, const wxString& files)
     {
         const Coverage versions = paths.size() == 1 ? Coverage::all : Coverage::some;
-        startVersionsDialog({paths, {}, versions, isFolder, {}}, Manifest::parse(L"FILES\n" + files), nullptr);
+        openVersionsWindow({paths, {}, versions, hasFolder, {}}, Manifest::parse(L"FILES\n" + files), nullptr);
         dialog = waitDialog(L"Restore Files");
         list = GetDlgItem(dialog, TAVI_VERSIONS_LIST);
     }
@@ -26,14 +36,29 @@ struct VersionsDialogTest : UiTest {
         return IsWindowEnabled(GetDlgItem(dialog, TAVI_VERSIONS_RESTORE)) +
                IsWindowEnabled(GetDlgItem(dialog, TAVI_VERSIONS_COPY_TO));
     }
+    // Returns title, width at 96 dots per inch, and text of the first row for each column.
+    std::wstring columns() const
+    {
+        std::wstring all;
+        wchar_t title[50], text[50];
+        LVCOLUMNW column{LVCF_TEXT | LVCF_WIDTH, 0, 0, title, 50, 0, 0, 0, 0, 0, 0};
+        const ScreenDc dc(GetDC(nullptr));
+        for (int i = 0; ListView_GetColumn(list, i, &column); ++i) {
+            ListView_GetItemText(list, 0, i, text, 50);
+            const int width = MulDiv(column.cx, 96, GetDeviceCaps(dc.get(), LOGPIXELSX));
+            all += std::wstring(title) + L' ' + std::to_wstring(width) + L" [" + text + L"] ";
+        }
+        return all;
+    }
     HWND dialog = nullptr, list = nullptr;
 };
 
 TEST_F(VersionsDialogTest, ListsEachRunOnceAndSelectsTheNewest)
 {
+    setTimeZone("XYZ-5");
     const wchar_t* const files =
-        L"C:\\d\\50% & more.txt\n4:5:1:10:0::0:0\n4:1:1:11:0::0:0\n5:1:1:-1:0::0:0\n6:5:1:9:0::0:0\n\n"
-        L"C:\\d\\ends.txt\n5:5:5:10:0::0:0\n6:5:5:-1:0::0:0\n\n"
+        L"C:\\d\\50% & more.txt\n4:86465:1:10:0::0:0\n4:1:1:11:0::0:0\n5:1:1:-1:0::0:0\n6:5:1:9:0::0:0\n\n"
+        L"C:\\d\\ends.txt\n5:86465:5:10:0::0:0\n6:5:5:-1:0::0:0\n\n"
         L"simple.map\n4:1:1:1:0::0:0\n5:1:1:1:0::0:0\n6:1:1:1:0::0:0";
     const std::tuple<PathSet, bool, std::wstring, int, int> cases[] = {
         {{L"C:\\d\\50% & more.txt"}, false, L"50% & more.txt are", 2, 1},
@@ -41,19 +66,21 @@ TEST_F(VersionsDialogTest, ListsEachRunOnceAndSelectsTheNewest)
         {{L"C:\\d"}, true, L"the items you selected are", 3, 2},
         {{L"C:\\a", L"C:\\b"}, true, L"some of the items you selected are", 3, 2},
     };
-    for (const auto& [paths, isFolder, message, rows, selected] : cases) {
-        open(paths, isFolder, files);
+    for (const auto& [paths, hasFolder, message, rows, selected] : cases) {
+        open(paths, hasFolder, files);
         EXPECT_EQ(controlText(dialog, TAVI_VERSIONS_MESSAGE).find(L"The following versions of " + message), 0u);
-        EXPECT_EQ(controlText(dialog, TAVI_VERSIONS_LABEL), isFolder ? L"Available &Versions:" : L"File &Versions:");
+        EXPECT_EQ(controlText(dialog, TAVI_VERSIONS_LABEL), hasFolder ? L"Available &Versions:" : L"File &Versions:");
         EXPECT_EQ(ListView_GetItemCount(list), rows);
         EXPECT_EQ(ListView_GetNextItem(list, -1, LVNI_SELECTED), selected);
         EXPECT_EQ(enabledActions(), selected < 0 ? 0 : 2);
-        wchar_t size[20] = L"";
-        ListView_GetItemText(list, 0, 2, size, 20);
-        EXPECT_STREQ(size, isFolder ? L"" : L"10 bytes") << "the first of two versions of one run";
+        // Of two versions of one run, the first.
+        EXPECT_EQ(columns(), hasFolder ? L"Backup Time 125 [01/01/1970 05:00 AM] "
+                                       : L"Backup Time 125 [01/01/1970 05:00 AM] "
+                                         L"Modified Time 125 [01/02/1970 05:01 AM] File Size 75 [10 bytes] ");
         PostMessageW(list, WM_KEYDOWN, VK_ESCAPE, 0);
         waitForThreads();
     }
+    setTimeZone("UTC0");
 }
 
 TEST_F(VersionsDialogTest, EnablesItsButtonsForARowAndShortensALongName)
@@ -67,7 +94,8 @@ TEST_F(VersionsDialogTest, EnablesItsButtonsForARowAndShortensALongName)
     SIZE ideal{};
     EXPECT_TRUE(Button_GetIdealSize(GetDlgItem(dialog, IDCANCEL), &ideal)) << "a button of version 6 of the controls";
     const std::wstring message = controlText(dialog, TAVI_VERSIONS_MESSAGE);
-    EXPECT_TRUE(message.find(L"beginxx") < message.find(L"xend.txt are") && message.length() < 250) << message;
+    EXPECT_LT(message.find(L"beginxx"), message.find(L"xend.txt are"));
+    EXPECT_LT(message.length(), 250u);
     click(dialog, IDCANCEL);
 }
 
@@ -83,26 +111,59 @@ void chooseFolder(HWND browser, const wxString& folder)
     }));
 }
 
-TEST_F(VersionsDialogTest, RequestsWhatTheAnswersSay)
+// In folder "f" there is a file, and it and one deeper are backed up. Folder "t" is for the targets.
+struct VersionsRequestTest : VersionsDialogTest {
+    VersionsRequestTest()
+    {
+        for (const wchar_t* name : {L"f", L"t"})
+            CreateDirectoryW(in(name).wc_str(), nullptr);
+        for (const wchar_t* name : {L"f\\5%", L"t\\was", L"t\\5%"})
+            std::ofstream(in(name).wc_str());
+        service.createTables();
+    }
+    // Gives the answer to the box that the dialog has opened, after a choice of "t\was" or of folder "t".
+    void answer(HWND box, int button, const std::wstring& question)
+    {
+        if (GetDlgItem(box, cmb13)) {
+            EXPECT_EQ(controlText(box, cmb13), L"5%");
+            SetDlgItemTextW(box, cmb13, in(L"t\\was").wc_str());
+        }
+        chooseFolder(box, in(L"t"));
+        EXPECT_TRUE(button == IDOK || controlText(box, 0xFFFF).find(question) != std::wstring::npos);
+        button == kCloseWindow ? PostMessageW(dialog, WM_CLOSE, 0, 0) : click(box, button);
+    }
+    // Returns the stored requests, relative to the folder, and removes them: source, time, attributes, target,
+    // overwrite.
+    wxString takeRequests()
+    {
+        DbConnection database = service.database(L"tavistate.dat");
+        DbQuery stored = database.execQuery("SELECT ifnull(group_concat(manifest_path || ' ' || timestamp || ' ' || "
+                                            "attributes || ' ' || target_path || ' ' || overwrite, ';'), '') "
+                                            "FROM restore_files");
+        const char* text = nullptr;
+        EXPECT_TRUE(stored.nextRow());
+        stored.fieldText(0, text);
+        wxString requests = fromUtf8(text);
+        requests.Replace(in(L""), L"");
+        database.execDML("DELETE FROM restore_files");
+        return requests;
+    }
+    static constexpr int kRestore = TAVI_VERSIONS_RESTORE, kCopy = TAVI_VERSIONS_COPY_TO, kCloseWindow = 0;
+};
+
+TEST_F(VersionsRequestTest, StoresWhatTheAnswersSay)
 {
-    // In folder "f" there is a file, and it and one deeper are backed up. Folder "t" is for the targets.
-    for (const wchar_t* name : {L"f", L"t"})
-        CreateDirectoryW(in(name).wc_str(), nullptr);
-    for (const wchar_t* name : {L"f\\5%", L"t\\was", L"t\\5%"})
-        std::ofstream(in(name).wc_str());
-    service.createTables();
-    DbConnection database = service.database(L"tavistate.dat");
     const wxString files = in(L"f\\5%\n100:1:7:1:0::0:40\n200:1:8:2:0::0:41\n\n") +
                            in(L"f\\b\\c\n100:1:7:3:0::0:0\n\n") + L"simple.map\n100:1:1:1:0::0:0";
     const PathSet one = {in(L"f\\5%")}, whole = {in(L"f")}, several = {in(L"f\\5%"), in(L"f\\b")},
                   fresh = {in(L"f\\b"), in(L"f\\x")};
-    constexpr int kRestore = TAVI_VERSIONS_RESTORE, kCopy = TAVI_VERSIONS_COPY_TO, kCloseWindow = 0;
-    // The selection, the row, the button, the answer to each box, words of the last question, the request: source,
-    // time, attributes, target, overwrite. A chosen folder ends in a backslash; the rest of a path below it begins with
-    // one.
+    const auto currentFolder = std::filesystem::current_path();
+    // The selection, the row, the button, the answer to each box, words of the last question, the request. A chosen
+    // folder ends in a backslash; the rest of a path below it begins with one.
     const std::tuple<const PathSet&, int, int, std::vector<int>, const wchar_t*, const wchar_t*> cases[] = {
         {one, 0, kRestore, {IDYES}, L"Restoring this file", LR"(f\5% 100 32 f\5% 1)"},
         {one, 1, kRestore, {IDNO}, L"Restoring this file", LR"(f\5% 200 33 f\5% (1) 0)"},
+        {one, 1, kRestore, {IDCANCEL}, L"Restoring this file", L""},
         {one, 1, kRestore, {kCloseWindow}, L"Restoring this file", L""},
         {whole, 0, kRestore, {IDYES}, L"they were last backed up", LR"(f\5% 100 32 f\5% 1;f\b\c 100 0 f\b\c 1)"},
         // The save box itself asks about an existing file.
@@ -120,15 +181,9 @@ TEST_F(VersionsDialogTest, RequestsWhatTheAnswersSay)
         ListView_SetItemState(list, row, LVIS_SELECTED, LVIS_SELECTED);
         click(dialog, button);
         HWND box = nullptr;
-        for (const int answer : answers) {
+        for (const int each : answers) {
             box = waitDialog(nullptr, dialog, box);
-            if (GetDlgItem(box, cmb13)) {
-                EXPECT_EQ(controlText(box, cmb13), L"5%");
-                SetDlgItemTextW(box, cmb13, in(L"t\\was").wc_str());
-            }
-            chooseFolder(box, in(L"t"));
-            EXPECT_TRUE(answer == IDOK || controlText(box, 0xFFFF).find(question) != std::wstring::npos);
-            answer == kCloseWindow ? PostMessageW(dialog, WM_CLOSE, 0, 0) : click(box, answer);
+            answer(box, each, question);
         }
         EXPECT_TRUE(waitUntil([&] { return !IsWindow(dialog); }));
         const auto progress = RestoreProgressWindow::current();
@@ -136,16 +191,8 @@ TEST_F(VersionsDialogTest, RequestsWhatTheAnswersSay)
         if (progress && waitUntil([&] { return progress->dialog() != nullptr; }))
             PostMessageW(progress->dialog(), WM_CLOSE, 0, 0);
         waitForThreads();
-        DbQuery stored = database.execQuery("SELECT ifnull(group_concat(manifest_path || ' ' || timestamp || ' ' || "
-                                            "attributes || ' ' || target_path || ' ' || overwrite, ';'), '') "
-                                            "FROM restore_files");
-        const char* text = nullptr;
-        EXPECT_TRUE(stored.nextRow());
-        stored.fieldText(0, text);
-        wxString requested = fromUtf8(text);
-        requested.Replace(in(L""), L"");
-        EXPECT_EQ(requested, request);
-        database.execDML("DELETE FROM restore_files");
+        EXPECT_EQ(takeRequests(), request);
+        EXPECT_EQ(std::filesystem::current_path(), currentFolder) << "of the host";
     }
 }
 
