@@ -118,13 +118,13 @@ INT_PTR RestoreProgressWindow::handleMessage(HWND window, UINT message, WPARAM w
         if (wParam != kTimer)
             return FALSE;
         transferStatus().timerTick();
-        handleArrivals(window, true);
+        handleArrivals(window);
         return TRUE;
     case kMessagesArrived:
         // The dialog manager uses this number, too: DM_SETDEFID.
         if (lParam != reinterpret_cast<LPARAM>(this))
             return FALSE;
-        handleArrivals(window, false);
+        handleArrivals(window);
         return TRUE;
     case WM_COMMAND:
         if (LOWORD(wParam) == TAVI_PROGRESS_CANCEL)
@@ -205,7 +205,7 @@ void RestoreProgressWindow::deliver(const PipeMessage& message)
         SendNotifyMessageW(dialog, kMessagesArrived, 0, reinterpret_cast<LPARAM>(this));
 }
 
-void RestoreProgressWindow::handleArrivals(HWND window, bool mustRefresh)
+void RestoreProgressWindow::handleArrivals(HWND window)
 {
     bool isHeld = false;
     {
@@ -217,13 +217,12 @@ void RestoreProgressWindow::handleArrivals(HWND window, bool mustRefresh)
             position_ = 0;
             remainingLine_.clear();
             statusLine_.clear();
-            mustRefresh = true;
         }
     }
-    if (!isHeld)
-        DestroyWindow(window);
-    else if (mustRefresh)
+    if (isHeld)
         refresh();
+    else
+        DestroyWindow(window);
 }
 
 void RestoreProgressWindow::showText(int control, wxString& shown, const wxString& text)

@@ -44,7 +44,7 @@ class RestoreProgressWindow {
   private:
     void initialize(HWND window);
     void cancel(HWND window);
-    void handleArrivals(HWND window, bool mustRefresh);
+    void handleArrivals(HWND window);
     // Drops at most all restores. Returns whether one still holds the window. For callers that have the lock.
     bool dropRestores(std::int32_t count);
     void dropAllRestores();
