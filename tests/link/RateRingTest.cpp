@@ -20,6 +20,17 @@ struct Ring : RateRing {
     }
 };
 
+TEST(RateRing, CountsAmountsAndTimeSinceTheLastClear)
+{
+    Ring ring;
+    ring.add(5);
+    now += 100;
+    ring.clearRing();
+    EXPECT_EQ(ring.rateOver(1000), 0);
+    ring.add(6);
+    EXPECT_EQ(ring.rateOver(1000), 6);
+}
+
 TEST(RateRing, CountsNoAmountOfALapAgo)
 {
     Ring ring;
