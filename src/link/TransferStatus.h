@@ -3,7 +3,6 @@
 #include <atomic>
 #include <cstdint>
 #include <optional>
-#include <utility>
 
 #include <wx/string.h>
 
@@ -26,7 +25,7 @@ class PublishedText {
 
   private:
     struct Shared : RefCounted<Shared> {
-        explicit Shared(wxString newText) : text(std::move(newText)) {}
+        explicit Shared(const wxString& newText) : text(newText) {}
         const wxString text;
     };
 
