@@ -1,9 +1,9 @@
 #include "manifest/StoredManifest.h"
 
-#include <atomic>
+#include <algorithm>
 #include <cstring>
 #include <memory>
-#include <string_view>
+#include <utility>
 
 #include <wx/mstream.h>
 #include <wx/zstream.h>
@@ -15,30 +15,16 @@ namespace tavi {
 namespace {
 
 constexpr std::size_t kReadBytes = 64 * 1024;
-constexpr std::size_t kMaxPendingBytes = 3;
 
-// The first bytes of a character that a read cut in two; the top byte is their number. One for the process, not one for
-// each text: the bytes that are left at the end of one stored manifest begin the next. Every reader of the format
-// keeps them so, and the module must decode each text as the others do.
-std::atomic<std::uint32_t> pendingBytes{0};
+// The first bytes of a character that is cut in two.
+struct PartialSequence {
+    char bytes[3];
+    unsigned char count;
+};
 
-std::uint32_t packPending(std::string_view bytes) noexcept
-{
-    auto word = static_cast<std::uint32_t>(bytes.size()) << 24;
-    for (std::size_t i = 0; i < bytes.size(); ++i)
-        word |= std::uint32_t{static_cast<unsigned char>(bytes[i])} << (8 * i);
-    return word;
-}
-
-// Moves the pending bytes directly before `text` and returns where they start.
-char* prependPending(char* text) noexcept
-{
-    const std::uint32_t pending = pendingBytes.exchange(0);
-    char* const begin = text - (pending >> 24);
-    for (char* to = begin; to != text; ++to)
-        *to = static_cast<char>(pending >> (8 * (to - begin)));
-    return begin;
-}
+// One for the process, not one for each text: the bytes that are left at the end of one stored manifest begin the next.
+// Every reader of the format keeps them so, and the module must decode each text as the others do.
+PartialSequence leftOver{};
 
 // Skips ASCII characters other than zero, a word at a time.
 char* skipAsciiWords(char* at, const char* end) noexcept
@@ -55,66 +41,74 @@ char* skipAsciiWords(char* at, const char* end) noexcept
 // Decodes a text in slices and passes it, up to its first zero, to the parser.
 class TextDecoder {
   public:
-    explicit TextDecoder(ManifestParser& parser) : parser_(parser), buffer_(new char[kMaxPendingBytes + kReadBytes + 1])
+    // `before` precedes the text.
+    TextDecoder(ManifestParser& parser, PartialSequence before)
+        : parser_(parser), buffer_(new char[sizeof before.bytes + kReadBytes + 1]), pending_(before)
     {
     }
 
     // Returns where the next slice, of at most kReadBytes, is read to.
     char* slice() noexcept
     {
-        return buffer_.get() + kMaxPendingBytes;
+        return buffer_.get() + sizeof pending_.bytes;
     }
     // Decodes the slice. Returns false at a malformed sequence, which ends the text.
     bool decodeSlice(std::size_t length);
+    // Returns the bytes behind the last whole character.
+    PartialSequence pending() const noexcept
+    {
+        return pending_;
+    }
     std::uint32_t units() const noexcept
     {
         return units_;
     }
 
   private:
-    void pass(char* begin, char* end, std::uint32_t surplusBytes);
+    void pass(char* begin, char* end);
 
     ManifestParser& parser_;
     std::unique_ptr<char[]> buffer_;
+    PartialSequence pending_;
     std::uint32_t units_ = 0;
     bool hasEnded_ = false;
 };
 
 bool TextDecoder::decodeSlice(std::size_t length)
 {
+    using Form = Utf8Sequence::Form;
     const char* const end = slice() + length;
-    char* const begin = prependPending(slice());
-    char* zero = nullptr;
-    // Bytes beyond one for each UTF-16 unit: a character of four bytes has two units, any other one.
-    std::uint32_t surplusBytes = 0;
-    auto form = Utf8Sequence::Form::whole;
+    char* const begin = slice() - pending_.count;
+    std::copy_n(pending_.bytes, pending_.count, begin);
+    auto form = Form::whole;
     char* at = begin;
     while ((at = skipAsciiWords(at, end)) != end) {
-        const std::string_view rest(at, static_cast<std::size_t>(end - at));
-        const Utf8Sequence sequence = decodeUtf8(rest);
+        const Utf8Sequence sequence = decodeUtf8({at, static_cast<std::size_t>(end - at)});
         form = sequence.form;
-        if (form == Utf8Sequence::Form::truncated)
-            pendingBytes = packPending(rest);
-        if (form != Utf8Sequence::Form::whole)
+        if (form != Form::whole)
             break;
-        if (sequence.point == 0 && !zero)
-            zero = at;
-        if (!zero)
-            surplusBytes += static_cast<std::uint32_t>(sequence.length == 4 ? 2 : sequence.length - 1);
+        // Decoding continues behind a zero, since the bytes at the end may begin the next text.
+        if (sequence.point == 0 && !hasEnded_) {
+            pass(begin, at);
+            hasEnded_ = true;
+        }
+        // A character of four bytes has two UTF-16 units, any other one.
+        if (!hasEnded_)
+            units_ -= static_cast<std::uint32_t>(sequence.length == 4 ? 2 : sequence.length - 1);
         at += sequence.length;
     }
-    // Decoding continues behind a zero, since the bytes at the end may begin the next text.
+    pending_.count = form == Form::truncated ? static_cast<unsigned char>(end - at) : 0;
+    std::copy_n(at, pending_.count, pending_.bytes);
     if (!hasEnded_)
-        pass(begin, zero ? zero : at, surplusBytes);
-    hasEnded_ = hasEnded_ || zero;
-    return form != Utf8Sequence::Form::malformed;
+        pass(begin, at);
+    return form != Form::malformed;
 }
 
-void TextDecoder::pass(char* begin, char* end, std::uint32_t surplusBytes)
+void TextDecoder::pass(char* begin, char* end)
 {
     *end = 0;
     const auto length = static_cast<std::size_t>(end - begin);
-    units_ += static_cast<std::uint32_t>(length) - surplusBytes;
+    units_ += static_cast<std::uint32_t>(length);
     parser_.feed(begin, length);
 }
 
@@ -123,7 +117,7 @@ void TextDecoder::pass(char* begin, char* end, std::uint32_t surplusBytes)
 ManifestRef parseStoredManifest(const void* bytes, std::size_t length)
 {
     ManifestParser parser;
-    TextDecoder decoder(parser);
+    TextDecoder decoder(parser, std::exchange(leftOver, {}));
     if (length != 0) {
         wxMemoryInputStream packed(bytes, length);
         wxZlibInputStream text(packed, wxZLIB_AUTO);
@@ -132,7 +126,10 @@ ManifestRef parseStoredManifest(const void* bytes, std::size_t length)
             more = count != 0 && decoder.decodeSlice(count);
         }
     }
-    return parser.finish(decoder.units());
+    ManifestRef manifest = parser.finish(decoder.units());
+    // Only now: a parse that runs out of memory must not leave bytes of its text to the next.
+    leftOver = decoder.pending();
+    return manifest;
 }
 
 } // namespace tavi
