@@ -40,10 +40,12 @@ ManifestRef readStoredManifest()
 void runManifestWatcher(WatcherState& state, const WatcherServices& services)
 {
     const auto load = [&] {
+        state.isLoadDue = true;
         guarded("manifest load", [&] {
             // An invalid text leaves the former manifest in force until the service stores another.
             if (ManifestRef manifest = services.loadManifest())
                 state.manifest.replace(std::move(manifest));
+            state.isLoadDue = false;
         });
         state.lastLoad = services.now();
     };
@@ -58,10 +60,10 @@ void runManifestWatcher(WatcherState& state, const WatcherServices& services)
     guarded("exclusion build", [&] { services.buildExclusions(true); });
     // The host may keep the module after a stop request. The watcher that is then started finds the manifest of the
     // former one.
-    if (state.manifest.acquire())
-        loadIfChanged();
-    else
+    if (state.isLoadDue || !state.manifest.acquire())
         load();
+    else
+        loadIfChanged();
     for (std::uint32_t polls = 0;;) {
         for (int sleeps = 0; sleeps < kSleepsPerPoll; ++sleeps) {
             if (services.isStopping())
@@ -71,8 +73,12 @@ void runManifestWatcher(WatcherState& state, const WatcherServices& services)
         if (services.isStopping())
             return;
         loadIfChanged();
-        if (++polls % kPollsPerExclusionBuild == 0)
+        if (++polls % kPollsPerExclusionBuild == 0) {
             guarded("exclusion build", [&] { services.buildExclusions(false); });
+            // Not in every poll: a load for which the host has not the memory takes processor time, too.
+            if (state.isLoadDue)
+                load();
+        }
     }
 }
 

@@ -9,11 +9,13 @@
 
 namespace tavi {
 
-// The data that the watcher thread shares with the rest of the module.
+// The data that the watcher thread shares with the rest of the module. They outlive it.
 struct WatcherState {
     PublishedPointer<const Manifest> manifest;
-    // The local time of the last load in milliseconds since 1970. Only the watcher thread uses it.
+    // The rest is only for the watcher thread. The local time of the last load in milliseconds since 1970.
     std::int64_t lastLoad = 0;
+    // Until a load has ended without an exception.
+    bool isLoadDue = true;
 };
 
 // The system as the watcher sees it. All functions are called on the watcher's thread.

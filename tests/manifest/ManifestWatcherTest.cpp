@@ -12,40 +12,81 @@ namespace {
 
 using namespace test;
 
-TEST(ManifestWatcher, LoadsChangedManifestsOnlyAndRebuildsTheExclusionsEvery18thPoll)
-{
+// Watchers whose sleeps are all that moves the clock.
+struct ManifestWatcher : testing::Test {
+    ManifestWatcher()
+    {
+        services.loadManifest = [this] { return load(++loads); };
+        services.manifestTime = [this] { return stored; };
+        services.now = [this] { return now; };
+        services.sleep = [this](std::uint32_t milliseconds) {
+            EXPECT_EQ(milliseconds, 500u) << "the time within which a stop request takes effect";
+            now += milliseconds;
+        };
+        services.isStopping = [this] { return now >= end; };
+        services.buildExclusions = [this](bool isFirst) {
+            builds.push_back(isFirst ? 0 : now / 5000);
+            throw std::runtime_error("must not end the watcher");
+        };
+    }
+    // Runs one watcher for some polls and returns the number of all loads.
+    int run(int polls)
+    {
+        end = now + 5000 * polls + 500;
+        runManifestWatcher(state, services);
+        EXPECT_EQ(now, end);
+        return loads;
+    }
+
     const LogCapture log;
     WatcherState state;
     WatcherServices services;
-    // Load n happens at n seconds. The third is invalid and the fourth fails.
     int loads = 0;
-    services.loadManifest = [&] {
-        if (++loads == 4)
-            throw std::runtime_error("no manifest");
-        return loads == 3 ? ManifestRef() : Manifest::parse(wxString::Format("USER\n_hash|%d", loads));
+    std::function<ManifestRef(int)> load = [](int number) {
+        return Manifest::parse(wxString::Format("USER\n_hash|%d", number));
     };
-    const std::optional<std::int64_t> times[] = {{}, 1000, 1001, 1999, 2000, 9000, 9000, {}};
-    std::size_t polls = 0;
-    services.manifestTime = [&] { return times[std::min(polls++, std::size(times) - 1)]; };
-    services.now = [&] { return 1000 * loads; };
-    std::uint32_t slept = 0, length = 0;
-    services.sleep = [&](std::uint32_t milliseconds) { slept += milliseconds; };
-    services.isStopping = [&] { return slept >= length; };
-    std::vector<std::size_t> builds;
-    services.buildExclusions = [&](bool isFirst) {
-        builds.push_back(isFirst ? 0 : polls);
-        throw std::runtime_error("must not end the watcher");
-    };
-    // The time of the third run's poll is later than the first load.
-    for (const int expected : {1, 1, 1, 2, 2}) {
-        runManifestWatcher(state, services);
-        EXPECT_EQ(loads, expected) << "after poll " << polls;
+    std::optional<std::int64_t> stored;
+    std::int64_t now = 0, end = 0;
+    std::vector<std::int64_t> builds;
+};
+
+TEST_F(ManifestWatcher, LoadsAManifestOnceAndOneThatWasStoredLater)
+{
+    EXPECT_EQ(run(2), 1) << "there is no time";
+    for (const int later : {0, 1}) {
+        stored = state.lastLoad + later;
+        EXPECT_EQ(run(2), 1 + later) << "by a watcher that finds a manifest";
     }
-    length = 5000 * 55 + 1500;
-    runManifestWatcher(state, services);
-    EXPECT_EQ(loads, 4);
-    EXPECT_EQ(dump(state.manifest.acquire()), "2[] ");
-    EXPECT_EQ(builds, (std::vector<std::size_t>{0, 0, 0, 0, 0, 0, 23, 41, 59}));
+    const std::int64_t last = state.lastLoad;
+    services.manifestTime = [&] { return now < end - 500 ? last : last + 1; };
+    EXPECT_EQ(run(2), 3) << "by a poll";
+    EXPECT_EQ(dump(state.manifest.acquire()), "3[] ");
+}
+
+TEST_F(ManifestWatcher, KeepsItsManifestIfTheNextOneIsInvalid)
+{
+    run(0);
+    load = [](int) { return ManifestRef(); };
+    stored = 1;
+    EXPECT_EQ(run(19), 2);
+    EXPECT_EQ(dump(state.manifest.acquire()), "1[] ");
+}
+
+TEST_F(ManifestWatcher, LoadsWithTheNextExclusionBuildWhatItCouldNotLoad)
+{
+    load = [valid = load](int number) { return number == 3 || number == 5 ? valid(number) : throw std::bad_alloc(); };
+    EXPECT_EQ(run(17), 1);
+    EXPECT_EQ(run(36), 3) << "at once by another watcher, then after 18 polls";
+    stored = now;
+    EXPECT_EQ(run(17), 4);
+    EXPECT_EQ(run(36), 5);
+    EXPECT_EQ(dump(state.manifest.acquire()), "5[] ");
+}
+
+TEST_F(ManifestWatcher, BuildsTheExclusionsAtTheStartAndEvery18thPoll)
+{
+    run(55);
+    EXPECT_EQ(builds, (std::vector<std::int64_t>{0, 18, 36, 54}));
 }
 
 TEST(readStoredManifest, IsEmptyWhereThereIsNoneAndLogsFailures)
