@@ -1,5 +1,6 @@
 #include "manifest/ManifestWatcher.h"
 
+#include <string>
 #include <utility>
 
 #include "core/Boundary.h"
@@ -17,20 +18,24 @@ constexpr std::uint32_t kSleepMs = 500;
 constexpr int kSleepsPerPoll = 10;
 constexpr std::uint32_t kPollsPerExclusionBuild = 18;
 
+// Returns a copy: the service cannot commit while a statement reads the row, and parsing takes long.
+std::string readBlob()
+{
+    DbConnection database;
+    database.open(getDataFilePath(DataFile::stateDatabase));
+    DbQuery rows = database.execQuery(kSelectManifest);
+    const char* blob = nullptr;
+    const int length = rows.nextRow() ? rows.fieldText(0, blob) : 0;
+    return {blob, static_cast<std::size_t>(length)};
+}
+
 } // namespace
 
 ManifestRef readStoredManifest()
 {
     try {
-        DbConnection database;
-        database.open(getDataFilePath(DataFile::stateDatabase));
-        DbQuery rows = database.execQuery(kSelectManifest);
-        if (rows.nextRow()) {
-            const char* blob = nullptr;
-            const int length = rows.fieldText(0, blob);
-            if (length > 0)
-                return parseStoredManifest(blob, static_cast<std::size_t>(length));
-        }
+        const std::string blob = readBlob();
+        return parseStoredManifest(blob.data(), blob.size());
     } catch (const DbException& error) {
         logWarning(L"Failed to retrieve stored manifest (%d: %ls)", error.code(), error.message().wc_str());
     }

@@ -89,6 +89,20 @@ TEST_F(ManifestWatcher, BuildsTheExclusionsAtTheStartAndEvery18thPoll)
     EXPECT_EQ(builds, (std::vector<std::int64_t>{0, 18, 36, 54}));
 }
 
+TEST(readStoredManifest, LeavesTheDatabaseToTheServiceWhileItParses)
+{
+    LogCapture log;
+    const InstalledService service;
+    service.createTables();
+    service.storeManifest(packed("FILES\na\n:::::::::"));
+    DbConnection database = service.database(L"tavistate.dat");
+    database.execDML("PRAGMA busy_timeout=0");
+    int changes = 0;
+    log.onNextLine([&] { changes = database.execDML("DELETE FROM manifest"); });
+    EXPECT_FALSE(readStoredManifest()) << "an invalid line, which is logged";
+    EXPECT_EQ(changes, 1);
+}
+
 TEST(readStoredManifest, IsEmptyWhereThereIsNoneAndLogsFailures)
 {
     LogCapture log;
