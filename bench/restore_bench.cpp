@@ -68,11 +68,18 @@ void runRestore(Bench& bench)
         RestoreRequest all = wholeSet(*manifest);
         performRestore(all, *manifest);
     };
-    const auto times = leastProcessorSeconds(bench.quick ? 3 : 5, {insert, request});
+    // Each file exists, so that each row has a name of its own.
+    RestoreRequest keeping = wholeSet(*manifest);
+    keeping.overwrite = false;
+    const auto plan = [&] {
+        planRestore(keeping, *manifest, [](const std::string& path) { return path.find('(') == std::string::npos; });
+    };
+    const auto times = leastProcessorSeconds(bench.quick ? 3 : 5, {insert, request, plan});
     DbQuery rows = database.execQuery("SELECT count(*) FROM restore_files");
     if (!rows.nextRow() || rows.fieldInt(0, 0) != static_cast<int>(bench.files))
         throw std::runtime_error("the request lacks rows");
     bench.report("planning and writing / bare inserts" + at, times[1] / times[0], 1.2, "x");
+    bench.report("planning of free names / bare inserts" + at, times[2] / times[0], 0.5, "x");
     bench.report("planning and writing" + at, times[1] * 1e3, kNoBound, "ms");
     const auto memory = bench.inOwnProcess("planning", {text.file, std::to_string(bench.files)});
     bench.report("memory of planning, less 8 MB, a row" + at, (memory[0] - 8e6) / memory[1], 24, "bytes");

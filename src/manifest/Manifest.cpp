@@ -86,7 +86,7 @@ ManifestRef Manifest::parse(const wxString& text)
 bool Manifest::isBackedUp(std::wstring_view path, std::uint32_t time) const
 {
     const std::uint32_t file = findFile(path);
-    return file != storage::NumberTable::kNone && (time == kAnyTime || patches(file).existsAt(time));
+    return file != storage::HashIndex::kNone && (time == kAnyTime || patches(file).existsAt(time));
 }
 
 bool Manifest::hasBackedUpUnder(std::wstring_view prefix, std::uint32_t time) const
@@ -102,7 +102,7 @@ bool Manifest::hasBackedUpUnder(std::wstring_view prefix, std::uint32_t time) co
 std::optional<ManifestPatchList> Manifest::findPatches(std::wstring_view path) const
 {
     const std::uint32_t file = findFile(path);
-    if (file == storage::NumberTable::kNone)
+    if (file == storage::HashIndex::kNone)
         return std::nullopt;
     return patches(file);
 }

@@ -184,7 +184,7 @@ class Manifest : public RefCounted<Manifest> {
     storage::VersionStore versions_;
     BlockArray<FileRecord, 15> files_;
     BlockArray<FolderRecord, 16> folders_;
-    storage::NumberTable filesByPath_;
+    storage::HashIndex filesByPath_;
 };
 
 inline ManifestPatch ManifestPatchList::operator[](std::size_t i) const noexcept

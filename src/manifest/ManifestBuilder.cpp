@@ -76,25 +76,19 @@ std::uint32_t ManifestBuilder::internFolder(std::string_view folder)
 {
     storage::ByteArena& texts = manifest_->texts_;
     // The service writes its files folder by folder.
-    if (lastFolder_ != storage::NumberTable::kNone && texts.at(folders_[lastFolder_].text) == folder)
+    if (lastFolder_ != storage::HashIndex::kNone && texts.at(folders_[lastFolder_].text) == folder)
         return lastFolder_;
 
     const std::uint32_t hash = storage::hashBytes(0, folder);
     lastFolder_ = foldersByText_.find(hash, [&](std::uint32_t number) {
         return folders_[number].hash == hash && texts.at(folders_[number].text) == folder;
     });
-    if (lastFolder_ != storage::NumberTable::kNone)
+    if (lastFolder_ != storage::HashIndex::kNone)
         return lastFolder_;
 
     lastFolder_ = folders_.size();
     folders_.push({texts.append(folder), hash, 0});
-    if (folders_.size() > foldersByText_.capacity()) {
-        foldersByText_.allocate(2 * folders_.size());
-        for (std::uint32_t number = 0; number < folders_.size(); ++number)
-            foldersByText_.insert(folders_[number].hash, number);
-    } else {
-        foldersByText_.insert(hash, lastFolder_);
-    }
+    foldersByText_.push([this](std::uint32_t number) { return folders_[number].hash; });
     return lastFolder_;
 }
 
@@ -108,7 +102,7 @@ ManifestRef ManifestBuilder::finish(std::uint32_t textLength)
     const auto& files = manifest_->files_;
     manifest_->filesByPath_.allocate(files.size());
     for (std::uint32_t file = 0; file < files.size(); ++file)
-        manifest_->filesByPath_.insert(files[file].hash, file);
+        manifest_->filesByPath_.push([&](std::uint32_t number) { return files[number].hash; });
     return std::move(manifest_);
 }
 

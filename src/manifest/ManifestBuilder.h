@@ -58,9 +58,9 @@ class ManifestBuilder {
     RefPtr<Manifest> manifest_;
     BlockArray<Manifest::FileRecord, 15> files_;
     BlockArray<LoadedFolder, 15> folders_;
-    storage::NumberTable foldersByText_;
+    storage::HashIndex foldersByText_;
     std::string extra_;
-    std::uint32_t lastFolder_ = storage::NumberTable::kNone;
+    std::uint32_t lastFolder_ = storage::HashIndex::kNone;
 };
 
 } // namespace tavi

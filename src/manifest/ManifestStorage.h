@@ -106,12 +106,12 @@ class ByteArena {
     std::size_t bytes_ = 0;
 };
 
-// A hash table, with open addressing, over numbers of elements that are stored elsewhere.
-class NumberTable {
+// A hash table, with open addressing, over the numbers of elements that are stored elsewhere and numbered from 0.
+class HashIndex {
   public:
     static constexpr std::uint32_t kNone = 0xFFFFFFFF;
 
-    // Empties the table and makes room for so many elements.
+    // Empties the index and makes room for so many elements.
     void allocate(std::uint32_t elements)
     {
         std::uint32_t slots = 16;
@@ -121,17 +121,21 @@ class NumberTable {
         slots_ = {};
         slots_.allocate(slots);
         slots_.fill(kNone);
+        size_ = 0;
     }
-    std::uint32_t capacity() const noexcept
+    // Adds the next element; hashOf(number) returns the hash of each so far.
+    template <class HashOf>
+    void push(HashOf hashOf)
     {
-        return slots_.size() / 2;
-    }
-    void insert(std::uint32_t hash, std::uint32_t number) noexcept
-    {
-        std::uint32_t slot = hash & mask_;
-        while (slots_[slot] != kNone)
-            slot = (slot + 1) & mask_;
-        slots_[slot] = number;
+        const std::uint32_t elements = size_ + 1;
+        if (elements > slots_.size() / 2)
+            allocate(elements);
+        for (; size_ < elements; ++size_) {
+            std::uint32_t slot = hashOf(size_) & mask_;
+            while (slots_[slot] != kNone)
+                slot = (slot + 1) & mask_;
+            slots_[slot] = size_;
+        }
     }
     // Returns the first number of this hash that `matches` accepts, or kNone.
     template <class Matches>
@@ -152,6 +156,7 @@ class NumberTable {
   private:
     BlockArray<std::uint32_t, 18> slots_;
     std::uint32_t mask_ = 0;
+    std::uint32_t size_ = 0;
 };
 
 // One version of one file. Nearly every aux text is 40 hexadecimal digits, which fit in `digest`, and nearly every

@@ -11,8 +11,8 @@ namespace {
 
 constexpr std::uint32_t kMaxFreeName = 9999;
 
-// Inserts " (n)" before the extension: at the end of a name without a dot, at the front of one whose last dot comes
-// first.
+// Inserts " (n)" before the last dot of the name, even if the name begins with that dot, or at the end of a name
+// without one.
 void insertFreeName(std::string& path, std::uint32_t number)
 {
     const std::size_t slash = path.rfind('\\');
@@ -21,6 +21,14 @@ void insertFreeName(std::string& path, std::uint32_t number)
     if (dot == std::string::npos || dot < nameStart)
         dot = path.size();
     path.insert(dot, " (" + std::to_string(number) + ")");
+}
+
+// Names that differ in letter case only are one file. Letters beyond ASCII stay as they are: each file system has a
+// table of its own for them.
+void toKey(std::string& target)
+{
+    for (char& c : target)
+        c = c >= 'A' && c <= 'Z' ? static_cast<char>(c | 0x20) : c;
 }
 
 } // namespace
@@ -49,19 +57,40 @@ void RestorePlan::plan(std::uint32_t file, const RestoreRequest& request, const 
     // A file without a version, or whose version is a deletion, did not exist then.
     if (!patch || patches[*patch].isDeletion())
         return;
-    std::uint32_t freeName = 0;
-    if (!overwrite_) {
-        const auto isTaken = [&] {
-            buildTarget(manifestPath_, freeName, target_);
-            return exists(target_);
-        };
-        manifestPath_.clear();
-        manifest_->appendFilePathUtf8(file, manifestPath_);
-        // If all numbers are taken, the next one is used without a check, so that the file still gets its row.
-        while (isTaken() && ++freeName <= kMaxFreeName) {
-        }
+    Row row{file, static_cast<std::uint32_t>(*patch), 0, 0};
+    if (overwrite_) {
+        rows_.push(row);
+        return;
     }
-    rows_.push({file, static_cast<std::uint32_t>(*patch), freeName});
+    manifestPath_.clear();
+    manifest_->appendFilePathUtf8(file, manifestPath_);
+    for (;; ++row.freeName) {
+        buildTarget(manifestPath_, row.freeName, target_);
+        key_ = target_;
+        toKey(key_);
+        row.hash = storage::hashBytes(0, key_);
+        // If all numbers are taken, the next one is used without a check, so that the file still gets its row.
+        if (row.freeName > kMaxFreeName || !isTaken(row, exists))
+            break;
+    }
+    rows_.push(row);
+    rowsByTarget_.push([this](std::uint32_t number) { return rows_[number].hash; });
+}
+
+// Returns whether an earlier row has the target of this one or the disk has it.
+bool RestorePlan::isTaken(const Row& row, const PathProbe& exists)
+{
+    const std::uint32_t equal = rowsByTarget_.find(row.hash, [&](std::uint32_t number) {
+        const Row& earlier = rows_[number];
+        if (earlier.hash != row.hash)
+            return false;
+        std::string path, key;
+        manifest_->appendFilePathUtf8(earlier.file, path);
+        buildTarget(path, earlier.freeName, key);
+        toKey(key);
+        return key == key_;
+    });
+    return equal != storage::HashIndex::kNone || exists(target_);
 }
 
 void RestorePlan::readEntry(std::uint32_t row, RestoreFileEntry& entry) const
@@ -87,8 +116,8 @@ RestorePlan planRestore(const RestoreRequest& request, const Manifest& manifest,
         paths.push_back(&path);
     std::sort(paths.begin(), paths.end(), [](const wxString* a, const wxString* b) { return *a < *b; });
     for (const wxString* path : paths) {
-        // A plain prefix without a separator, as in the menu's question whether anything is backed up there. A file's
-        // path therefore also selects longer names that begin alike; the service and its users rely on the same rows.
+        // A plain prefix: a file's path also selects longer names that begin alike, and a folder's its siblings. The
+        // menu asks for a folder with its separator; here the service and its users rely on these rows.
         manifest.forEachUnder(view(*path), [&](std::uint32_t file) {
             plan.plan(file, request, exists);
             return true;

@@ -61,10 +61,13 @@ class RestorePlan {
         std::uint32_t patch;
         // The number in the target's name, 0 for none.
         std::uint32_t freeName;
+        // Of the target's key. Unused if files may be overwritten.
+        std::uint32_t hash;
     };
 
     RestorePlan(const RestoreRequest& request, const Manifest& manifest);
     void plan(std::uint32_t file, const RestoreRequest& request, const PathProbe& exists);
+    bool isTaken(const Row& row, const PathProbe& exists);
     void buildTarget(const std::string& manifestPath, std::uint32_t freeName, std::string& target) const;
 
     const Manifest* manifest_;
@@ -72,12 +75,14 @@ class RestorePlan {
     std::size_t removedUnits_ = 0;
     bool overwrite_;
     BlockArray<Row, 15> rows_;
+    storage::HashIndex rowsByTarget_;
     std::string manifestPath_;
     std::string target_;
+    std::string key_;
 };
 
-// Chooses the version and the target of every file of the manifest whose path begins with a selected path. Calls
-// `exists` only if existing files are to be kept.
+// Chooses the version and the target of every file of the manifest whose path begins with a selected path. If existing
+// files are to be kept, no two targets are equal, and `exists` accepts none; else it is not called.
 RestorePlan planRestore(const RestoreRequest& request, const Manifest& manifest, const PathProbe& exists);
 
 } // namespace tavi
