@@ -75,7 +75,7 @@ TEST(StoredManifest, IsWholeAfterALoadThatRanOutOfMemory)
     int succeeding = 0;
     for (; read != whole; ++succeeding) {
         try {
-            const FailingAllocations failing(succeeding, Heap::cpp, 1);
+            const FailingAllocations failing(succeeding, Heap::c, 1);
             read = dump(stored(blob));
         } catch (const std::bad_alloc&) {
         }
