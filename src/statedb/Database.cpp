@@ -337,7 +337,8 @@ StatementSlot DbConnection::prepare(const char* sql) const
 {
     check();
     auto slot = std::make_shared<sqlite3_stmt*>(nullptr);
-    // The detail stays empty, because scripts that read the log recognise this failure by the empty detail.
+    // Not the _v2 call, whose statements prepare themselves again after a change of the tables: the log shows such a
+    // change as DB_SCHEMA. The detail stays empty, because scripts that read the log recognise this failure by that.
     if (const int result = sqlite3_prepare(connection_, sql, -1, slot.get(), nullptr); result != SQLITE_OK)
         throw DbException(result, wxString());
     return slot;
@@ -369,20 +370,27 @@ std::int64_t DbConnection::lastRowId() const
 
 void DbConnection::beginTransaction(TransactionMode mode)
 {
-    execDML(mode == TransactionMode::deferred    ? "begin deferred transaction"
-            : mode == TransactionMode::immediate ? "begin immediate transaction"
-                                                 : "begin transaction");
+    switch (mode) {
+    case TransactionMode::deferred:
+        execDML(wxString(L"begin deferred transaction"));
+        break;
+    case TransactionMode::immediate:
+    case TransactionMode::exclusive:
+        execDML(wxString(L"begin immediate transaction"));
+        break;
+    default:
+        execDML(wxString(L"begin transaction"));
+    }
 }
 
-// Narrow texts, which need no conversion: a transaction ends even when no memory is left.
 void DbConnection::commitTransaction()
 {
-    execDML("commit transaction");
+    execDML(wxString(L"commit transaction"));
 }
 
 void DbConnection::rollbackTransaction()
 {
-    execDML("rollback transaction");
+    execDML(wxString(L"rollback transaction"));
 }
 
 Transaction::Transaction(DbConnection& connection, TransactionMode mode) : connection_(connection)

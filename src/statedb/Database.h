@@ -108,9 +108,9 @@ class DbStatement {
     StatementSlot statement_;
 };
 
-// How a transaction locks the database: plain and deferred ones when they first read or write, immediate ones at once
-// for writing. There is no exclusive mode: it would lock the service out of reading.
-enum class TransactionMode { plain, deferred, immediate };
+// How a transaction locks the database: plain and deferred ones when they first read or write, the others at once for
+// writing. Exclusive is immediate: an exclusive lock would keep the service from reading.
+enum class TransactionMode { plain, deferred, immediate, exclusive };
 
 class DbConnection {
   public:

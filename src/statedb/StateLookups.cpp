@@ -27,20 +27,21 @@ FolderStateTable::FolderStateTable()
     delete_ = connection_.compileStatement(kFolderDelete);
 }
 
+// delete_ is finalized by its own destructor and so outlives the connection, which DbConnection::close allows.
 FolderStateTable::~FolderStateTable()
 {
     try {
         select_.finalize();
         replace_.finalize();
     } catch (...) {
-        // Finalizing reports a failure of the last run, which was thrown then. The members' destructors finalize the
-        // rest.
+        // Finalizing reports a failure of the last run, which was thrown then.
     }
     connection_.close();
 }
 
-FolderStateTable::ReadScope::ReadScope(FolderStateTable& table) : table_(table), transaction_(table.connection_)
+FolderStateTable::ReadScope::ReadScope(FolderStateTable& table) : table_(table)
 {
+    table_.connection_.beginTransaction();
     table_.knownParent_.clear();
     table_.isReading_ = true;
 }
@@ -49,6 +50,13 @@ FolderStateTable::ReadScope::~ReadScope()
 {
     table_.isReading_ = false;
     table_.knownParent_.clear();
+    try {
+        // Nothing was written: this only unlocks. A narrow text needs no conversion, so it also unlocks when no memory
+        // is left.
+        table_.connection_.execDML("rollback transaction");
+    } catch (...) {
+        // SQLite has ended the transaction after a failure.
+    }
 }
 
 std::optional<FolderState> FolderStateTable::recordedState(const wxString& folder)

@@ -35,8 +35,6 @@ class FolderStateTable {
 
       private:
         FolderStateTable& table_;
-        // Nothing is written: the rollback at the end only unlocks.
-        Transaction transaction_;
     };
 
   private:

@@ -1,6 +1,8 @@
 #include "statedb/Database.h"
 
+#include <filesystem>
 #include <functional>
+#include <random>
 
 #include <gtest/gtest.h>
 
@@ -60,7 +62,8 @@ TEST(Database, ReadsRowsAndKeepsBindings)
     insert.execDML();
     insert.execDML(); // the last binding again
     insert.bind(1, std::int64_t{0x7FFFFFFFFFFFFFFF});
-    EXPECT_TRUE(insert.execDML() == 1 && connection.lastRowId() == 3);
+    EXPECT_EQ(insert.execDML(), 1);
+    EXPECT_EQ(connection.lastRowId(), 3);
     EXPECT_EQ(connection.execDML("INSERT INTO t(b) VALUES(''),(NULL),(x'6100C3A9')"), 3);
     DbQuery rows = connection.execQuery("SELECT b FROM t ORDER BY a");
     const std::pair<int, std::string> expected[] = {
@@ -68,7 +71,8 @@ TEST(Database, ReadsRowsAndKeepsBindings)
         {4, {"a\0\xC3\xA9", 4}}};
     for (const auto& [type, content] : expected) {
         const char* text = nullptr;
-        EXPECT_TRUE(rows.nextRow() && rows.fieldType(0) == type) << content;
+        EXPECT_TRUE(rows.nextRow()) << content;
+        EXPECT_EQ(rows.fieldType(0), type) << content;
         const auto length = static_cast<std::size_t>(rows.fieldText(0, text));
         EXPECT_EQ(std::string(text ? text : "", length), content);
         EXPECT_EQ(rows.fieldInt(0, 42) == 42, type == 5);
@@ -76,14 +80,29 @@ TEST(Database, ReadsRowsAndKeepsBindings)
     EXPECT_FALSE(rows.nextRow() || rows.nextRow());
 }
 
-TEST(Database, TransactionsEndWithTheirScope)
+TEST(Database, TransactionsLockByTheirModeAndEndWithTheirScope)
 {
-    DbConnection connection = opened();
-    for (const bool commits : {true, false}) {
-        Transaction transaction(connection, TransactionMode::immediate);
+    const auto file = std::filesystem::temp_directory_path() / ("tavi-" + std::to_string(std::random_device()()));
+    DbConnection connection, other;
+    connection.open(file.wstring());
+    other.open(file.wstring());
+    other.execDML("PRAGMA busy_timeout=0; CREATE TABLE t(a)");
+    for (int mode = 0; mode <= 4; ++mode) {
+        const Transaction transaction(connection, static_cast<TransactionMode>(mode));
+        EXPECT_EQ(other.execQuery("SELECT count(*) FROM t").fieldInt(0, -1), 0) << mode;
+        if (mode == 2 || mode == 3)
+            EXPECT_THROW(other.beginTransaction(TransactionMode::immediate), DbException) << mode;
+        else
+            EXPECT_TRUE(Transaction(other, TransactionMode::immediate).rollback()) << mode;
         connection.execDML("INSERT INTO t DEFAULT VALUES");
-        if (commits)
-            transaction.commit();
     }
-    EXPECT_EQ(connection.execQuery("SELECT count(*) FROM t").fieldInt(0, -1), 1);
+    {
+        Transaction transaction(connection);
+        connection.execDML("INSERT INTO t DEFAULT VALUES");
+        transaction.commit();
+    }
+    EXPECT_TRUE(other.execQuery("SELECT * FROM t").nextRow());
+    connection.close();
+    other.close();
+    std::filesystem::remove(file);
 }
