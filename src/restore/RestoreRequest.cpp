@@ -96,12 +96,12 @@ bool RestoreRequestWriter::requestRestore(const RestorePlan& files, const wxStri
         return true;
     } catch (const DbException& error) {
         logError(L"Error requesting restore: %ls", error.message().wc_str());
-        beginAgain();
+        restartTransaction();
         return false;
     }
 }
 
-void RestoreRequestWriter::beginAgain() noexcept
+void RestoreRequestWriter::restartTransaction() noexcept
 {
     try {
         if (transaction_ && transaction_->rollback()) {

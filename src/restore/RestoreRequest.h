@@ -20,7 +20,7 @@ class RestoreRequestWriter {
     void close();
 
   private:
-    void beginAgain() noexcept;
+    void restartTransaction() noexcept;
     void disconnect() noexcept;
 
     std::unique_ptr<DbConnection> connection_;

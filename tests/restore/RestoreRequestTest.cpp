@@ -13,9 +13,11 @@ namespace {
 
 struct RestoreRequests : testing::Test {
     // Returns what was logged.
-    std::string perform(const wchar_t* selected = L"C:\\one")
+    std::string perform(const wchar_t* selected = L"C:\\one", bool isNamed = true)
     {
         RestoreRequest request{{selected}, 100, L"", L"", true, L"id", L"alias", L"key"};
+        if (!isNamed)
+            request.machineId = request.machineAlias = request.encryptionKey = wxString();
         performRestore(request, *manifest);
         EXPECT_TRUE(request.selectedPaths.empty());
         return log.takeText();
@@ -34,8 +36,11 @@ struct RestoreRequests : testing::Test {
 
 TEST_F(RestoreRequests, AreStoredWithTheirFiles)
 {
-    EXPECT_EQ(perform() + perform(L"C:\\nothing there"), "");
+    EXPECT_EQ(perform(), "");
+    EXPECT_EQ(perform(L"C:\\nothing there", false), "");
     EXPECT_EQ(count(), 2 + 2) << "a request without files is stored as well";
+    EXPECT_EQ(count("SELECT count(*) FROM restores WHERE machine_id='' AND machine_alias='' AND encryption_key=''"), 1)
+        << "not NULL";
     // Its time is not the version's. Times are signed 32-bit numbers; attributes are octal in the manifest.
     EXPECT_EQ(count("SELECT count(*) FROM restores JOIN restore_files ON restores.rowid=restore_id WHERE "
                     "abs(request_time-strftime('%s','now'))<60 AND machine_id='id' AND machine_alias='alias' AND "
@@ -66,7 +71,8 @@ TEST_F(RestoreRequests, WaitAMinuteForOtherTransactions)
         const Transaction other(database, mode);
         EXPECT_EQ(waited = count(), 0);
         EXPECT_EQ(perform(), "1: Error: Error requesting restore: DB_BUSY[5]: database is locked");
-        EXPECT_TRUE(waited == 60000000 && count() == 0);
+        EXPECT_EQ(waited, 60000000);
+        EXPECT_EQ(count(), 0);
     }
     system->xSleep = sleep;
 }

@@ -5,6 +5,7 @@
 #include <gtest/gtest.h>
 
 #include "tests/support/Allocations.h"
+#include "tests/support/LogCapture.h"
 #include "tests/support/Registry.h"
 
 using namespace tavi;
@@ -26,8 +27,10 @@ TEST(StateLookups, FoldersInheritFromTheNearestRecordedOne)
         EXPECT_EQ(stateOf(folder + L"\\x"), passedOn) << state;
         EXPECT_EQ(stateOf(folder + L"\\x\\y\\"), passedOn) << state;
     }
-    EXPECT_EQ(stateOf(L"C:\\S2") + stateOf(L"E:\\a\\b") + stateOf(L""), 24);
-    EXPECT_TRUE(stateOf(L"C:\\null") == 0 && stateOf(L"D:\\any") == 4);
+    for (const wchar_t* const unrecorded : {L"C:\\S2", L"E:\\a\\b", L""})
+        EXPECT_EQ(stateOf(unrecorded), 8) << unrecorded;
+    EXPECT_EQ(stateOf(L"C:\\null"), 0);
+    EXPECT_EQ(stateOf(L"D:\\any"), 4);
 
     writer.execDML("UPDATE filesystem SET state=2 WHERE folder='C:\\s6'"); // connected, but not locked
     std::optional<FolderStateTable::ReadScope> reading(std::in_place, states);
@@ -36,4 +39,24 @@ TEST(StateLookups, FoldersInheritFromTheNearestRecordedOne)
     test::FailingAllocations(0), reading.reset(); // the end unlocks without memory
     EXPECT_EQ(writer.execDML("UPDATE filesystem SET state=5 WHERE folder='C:\\s6'"), 1);
     EXPECT_EQ(stateOf(L"C:\\s6\\x"), 7);
+}
+
+TEST(StateLookups, FilesHaveTheirRecordedStateOnly)
+{
+    test::LogCapture log;
+    test::InstalledService service;
+    const auto stateOf = [](const wchar_t* path) { return FileStateLookup().getFileState(path); };
+    EXPECT_EQ(stateOf(L"C:\\one"), 15);
+    EXPECT_EQ(log.takeText(), "1: Error: Failed to retrieve file state (1: DB_ERROR[1]: )");
+    service.createTables();
+    service.database(L"tavistate.dat").execDML("INSERT INTO file_states VALUES('C:\\one',1),('C:\\null',NULL)");
+    EXPECT_EQ(stateOf(L"C:\\one"), 1);
+    EXPECT_EQ(stateOf(L"C:\\null"), 0);
+    for (const wchar_t* const unrecorded : {L"C:\\One", L"C:\\one\\below", L""})
+        EXPECT_EQ(stateOf(unrecorded), 15) << unrecorded;
+    EXPECT_EQ(log.takeText(), "");
+    service.install().SetValue(L"DataPath", wxString(service.file(L"no folder")));
+    EXPECT_EQ(stateOf(L"C:\\one"), 15);
+    EXPECT_EQ(log.takeText(),
+              "1: Error: Failed to open file-state db (14: DB_CANTOPEN[14]: unable to open database file)");
 }
