@@ -138,36 +138,42 @@ std::uint32_t Manifest::findFile(std::wstring_view path) const
     });
 }
 
+// The paths that begin with a text are those from the text itself up to the text and kAboveAll.
 Manifest::FileRanges Manifest::filesUnder(std::wstring_view prefix) const
 {
-    const auto firstFileOf = [this](std::uint32_t folder) {
-        return folder < folders_.size() ? folders_[folder].firstFile : files_.size();
-    };
-    // Finds the paths from `low` up to but not including `high`, which have all bytes but `high`'s last in common:
-    // files of one folder whose names continue the text, and all files of the folders that begin with it.
-    const auto between = [&](const std::string& low, const std::string& high, FileRange& names, FileRange& folders) {
-        folders = {firstFileOf(firstFolderFrom(low)), firstFileOf(firstFolderFrom(high))};
-        const SplitPath split = splitPath(low);
-        const std::uint32_t folder = firstFolderFrom(split.folder);
-        if (split.name.empty() || folder == folders_.size() || texts_.at(folders_[folder].text) != split.folder)
-            return;
-        const FileRange files{folders_[folder].firstFile, firstFileOf(folder + 1)};
-        names = {firstNameFrom(files, split.name), firstNameFrom(files, splitPath(high).name)};
-    };
-
     // Not part of UTF-8, so greater than every continuation of a path.
     constexpr char kAboveAll = '\xFF';
-    FileRanges found;
-    FileRange(&ranges)[4] = found.ranges;
-    std::string low = toUtf8(prefix);
-    between(low, low + kAboveAll, ranges[0], ranges[2]);
+    const std::string low = toUtf8(prefix), high = low + kAboveAll;
+    FileRanges found{{namesBetween(low, high), {}, foldersBetween(low, high), {}}};
     if (!prefix.empty() && isHighSurrogate(static_cast<char32_t>(prefix.back()))) {
         // The prefix ends within a character: paths with any character that begins with this half match too.
-        const std::wstring whole(prefix);
-        low = toUtf8(whole + kFirstLowSurrogate);
-        between(low, toUtf8(whole + kLastLowSurrogate) + kAboveAll, ranges[1], ranges[3]);
+        const std::wstring half(prefix);
+        const std::string first = toUtf8(half + kFirstLowSurrogate);
+        const std::string last = toUtf8(half + kLastLowSurrogate) + kAboveAll;
+        found.ranges[1] = namesBetween(first, last);
+        found.ranges[3] = foldersBetween(first, last);
     }
     return found;
+}
+
+Manifest::FileRange Manifest::foldersBetween(std::string_view low, std::string_view high) const noexcept
+{
+    return {firstFileOf(firstFolderFrom(low)), firstFileOf(firstFolderFrom(high))};
+}
+
+Manifest::FileRange Manifest::namesBetween(std::string_view low, std::string_view high) const noexcept
+{
+    const SplitPath split = splitPath(low);
+    const std::uint32_t folder = firstFolderFrom(split.folder);
+    if (split.name.empty() || folder == folders_.size() || texts_.at(folders_[folder].text) != split.folder)
+        return {};
+    const FileRange files{firstFileOf(folder), firstFileOf(folder + 1)};
+    return {firstNameFrom(files, split.name), firstNameFrom(files, splitPath(high).name)};
+}
+
+std::uint32_t Manifest::firstFileOf(std::uint32_t folder) const noexcept
+{
+    return folder < folders_.size() ? folders_[folder].firstFile : files_.size();
 }
 
 std::uint32_t Manifest::firstFolderFrom(std::string_view text) const noexcept

@@ -174,6 +174,12 @@ class Manifest : public RefCounted<Manifest> {
 
     std::uint32_t findFile(std::wstring_view path) const;
     FileRanges filesUnder(std::wstring_view prefix) const;
+    // Both return files from one path up to but not including another, which differ in the end of their last component
+    // only: those of the folders in between, and those of the folder of both whose names are in between.
+    FileRange foldersBetween(std::string_view low, std::string_view high) const noexcept;
+    FileRange namesBetween(std::string_view low, std::string_view high) const noexcept;
+    // Returns the number of all files for the folder behind the last.
+    std::uint32_t firstFileOf(std::uint32_t folder) const noexcept;
     std::uint32_t firstFolderFrom(std::string_view text) const noexcept;
     std::uint32_t firstNameFrom(FileRange files, std::string_view name) const noexcept;
 

@@ -2,7 +2,7 @@
 
 #include <algorithm>
 #include <array>
-#include <cstring>
+#include <iterator>
 #include <new>
 
 #include "core/LogLine.h"
@@ -15,9 +15,19 @@ constexpr std::string_view kUserHeader = "USER";
 constexpr std::string_view kFilesHeader = "FILES";
 constexpr std::string_view kHashMark = "_hash|";
 constexpr unsigned kSeparatorNewlines = 3;
-constexpr std::size_t kMaxFields = 8;
 // A line of the log has room for no more.
 constexpr std::size_t kMaxLoggedBytes = std::size_t{3} * 4095;
+
+// The values of a version, in the order of the longest line.
+enum Value { kTimestamp, kModifiedTime, kCtime, kFileSize, kAux1, kAuxText, kAux2, kAttributes, kValueCount };
+constexpr Value kWithoutTimestamp[] = {kModifiedTime, kFileSize, kAux1, kAuxText, kAux2};
+// A seventh field replaces the sixth.
+constexpr Value kWithTimestamp[] = {kTimestamp, kModifiedTime, kFileSize, kAux1, kAuxText, kAux2, kAux2};
+constexpr Value kComplete[] = {kTimestamp, kModifiedTime, kCtime, kFileSize, kAux1, kAuxText, kAux2, kAttributes};
+// The value of each field of a line, by the number of its fields less one.
+constexpr const Value* kLayouts[] = {kWithoutTimestamp, kWithoutTimestamp, kWithoutTimestamp, kWithoutTimestamp,
+                                     kWithoutTimestamp, kWithTimestamp,    kWithTimestamp,    kComplete};
+
 // Every number of so many digits fits 32 bits.
 constexpr std::ptrdiff_t kMaxSizeDigits = 9;
 
@@ -248,30 +258,26 @@ void ManifestParser::addPatchLine(std::string_view line)
 
 bool ManifestParser::addPatch(std::string_view line)
 {
-    std::array<std::string_view, kMaxFields> fields;
-    std::size_t count = 0;
-    for (std::size_t at = 0; at <= line.size();) {
-        if (count == kMaxFields)
-            return false;
-        const std::size_t colon = std::min(line.find(':', at), line.size());
-        fields[count++] = line.substr(at, colon - at);
-        at = colon + 1;
+    const auto colons = static_cast<std::size_t>(std::count(line.begin(), line.end(), ':'));
+    if (colons >= std::size(kLayouts))
+        return false;
+    // Missing values are empty and so 0.
+    std::array<std::string_view, kValueCount> values;
+    for (std::size_t field = 0; field <= colons; ++field) {
+        const std::size_t length = std::min(line.find(':'), line.size());
+        values[kLayouts[colons][field]] = line.substr(0, length);
+        line.remove_prefix(std::min(length + 1, line.size()));
     }
-
-    // Missing fields are empty and so 0. Seven fields are laid out as six; the seventh replaces the sixth.
-    const std::size_t times = count == 8 ? 3 : count >= 6 ? 2 : 1;
-    const std::string_view* rest = fields.data() + times;
-    const std::string_view aux2 = count == 7 ? fields[6] : rest[3];
     try {
         storage::PackedVersion& version = builder_->versions().next();
-        version.timestamp = count >= 6 ? toTime(fields[0]) : 0;
-        version.modifiedTime = toTime(fields[times >= 2 ? 1 : 0]);
-        version.ctime = count == 8 ? toTime(fields[2]) : 0;
-        const std::uint64_t size = toNumber(rest[0]);
+        version.timestamp = toTime(values[kTimestamp]);
+        version.modifiedTime = toTime(values[kModifiedTime]);
+        version.ctime = toTime(values[kCtime]);
+        const std::uint64_t size = toNumber(values[kFileSize]);
         version.sizeLow = static_cast<std::uint32_t>(size);
         version.sizeHigh = static_cast<std::uint32_t>(size >> 32);
-        version.attributes = count == 8 ? static_cast<std::uint32_t>(toNumber(fields[7], 8)) : 0;
-        builder_->keepVersion(toSize(rest[1]), toSize(aux2), rest[2]);
+        version.attributes = static_cast<std::uint32_t>(toNumber(values[kAttributes], 8));
+        builder_->keepVersion(toSize(values[kAux1]), toSize(values[kAux2]), values[kAuxText]);
     } catch (const std::bad_alloc&) {
         // Without memory for the version its line counts as invalid, which the callers handle and log.
         return false;
