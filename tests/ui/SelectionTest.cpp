@@ -120,5 +120,18 @@ TEST_F(SelectionTest, SummarizesVersionsAndStates)
     EXPECT_EQ(summarizeStates({in(L"sub")}, states), kNone) << "a table that can no longer be read";
 }
 
+TEST_F(SelectionTest, FindsAFolderAtAnyPlaceAmongTheItems)
+{
+    CreateDirectoryW(in(L"sub").wc_str(), nullptr);
+    const ManifestRef manifest = Manifest::parse(wxString());
+    for (int i = 0; i < 20; ++i) { // the order of a set depends on the texts
+        Selection summary;
+        summary.paths = {in(L"sub"), in(wxString::Format(L"%d", i))};
+        summarizeVersions(summary, manifest.get());
+        const auto& [paths, states, versions, hasFolder, name] = summary;
+        EXPECT_TRUE(hasFolder) << i;
+    }
+}
+
 } // namespace
 } // namespace tavi
