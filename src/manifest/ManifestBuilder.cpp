@@ -39,9 +39,9 @@ bool packDigest(std::string_view text, unsigned char (&digest)[20]) noexcept
 
 ManifestBuilder::ManifestBuilder() : manifest_(new Manifest) {}
 
-void ManifestBuilder::keepVersion(std::int64_t aux1, std::int64_t aux2, std::string_view auxText)
+void ManifestBuilder::addVersion(storage::PackedVersion version, std::int64_t aux1, std::int64_t aux2,
+                                 std::string_view auxText)
 {
-    storage::PackedVersion& version = versions().next();
     const bool fits = aux1 == 0 && aux2 == 0 && packDigest(auxText, version.digest);
     if (!fits) {
         const storage::Extra extra{aux1, aux2};
@@ -50,7 +50,7 @@ void ManifestBuilder::keepVersion(std::int64_t aux1, std::int64_t aux2, std::str
         const storage::ByteArena::Ref ref = manifest_->texts_.append(extra_);
         std::memcpy(version.digest, &ref, sizeof ref);
     }
-    versions().keep(!fits);
+    versions().push(version, !fits);
 }
 
 void ManifestBuilder::addFile(std::string_view path, std::uint32_t firstVersion)

@@ -32,9 +32,9 @@ class ManifestBuilder {
     {
         return manifest_->versions_;
     }
-    // Keeps the version in versions().next() and gives it these aux values.
-    void keepVersion(std::int64_t aux1, std::int64_t aux2, std::string_view auxText);
-    // Adds the file of all versions kept since `firstVersion`. It replaces an earlier file of the same path.
+    // Adds the version with these aux values in place of its digest.
+    void addVersion(storage::PackedVersion version, std::int64_t aux1, std::int64_t aux2, std::string_view auxText);
+    // Adds the file of all versions added since `firstVersion`. It replaces an earlier file of the same path.
     void addFile(std::string_view path, std::uint32_t firstVersion);
     void setUserText(const wxString& text);
     void setHash(const wxString& hash);

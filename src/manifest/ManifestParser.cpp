@@ -138,13 +138,12 @@ void ManifestParser::feed(const char* bytes, std::size_t length)
 const char* ManifestParser::feedVersions(const char* at, const char* end)
 {
     storage::VersionStore& versions = builder_->versions();
-    while (at != end && isDigit(*at) && versions.hasRoom()) {
+    storage::PackedVersion version{};
+    while (at != end && isDigit(*at)) {
         const char* field = at;
-        storage::PackedVersion& version = versions.next();
         if (!readTime(field, version.timestamp) || !readTime(field, version.modifiedTime) ||
             !readTime(field, version.ctime) || !readSize(field, version.sizeLow) || !readZero(field))
             break;
-        version.sizeHigh = 0;
         constexpr std::ptrdiff_t kDigest = 2 * sizeof version.digest;
         if (end - field < kDigest || !packDigest({field, kDigest}, version.digest))
             break;
@@ -156,7 +155,11 @@ const char* ManifestParser::feedVersions(const char* at, const char* end)
             version.attributes = version.attributes * 8 + static_cast<std::uint32_t>(*field++ - '0');
         if (*field != '\n')
             break;
-        versions.keep();
+        try {
+            versions.push(version);
+        } catch (const std::bad_alloc&) {
+            break; // addPatch, which tries it again, counts the line as invalid.
+        }
         at = field + 1;
     }
     return at;
@@ -269,7 +272,7 @@ bool ManifestParser::addPatch(std::string_view line)
         line.remove_prefix(std::min(length + 1, line.size()));
     }
     try {
-        storage::PackedVersion& version = builder_->versions().next();
+        storage::PackedVersion version{};
         version.timestamp = toTime(values[kTimestamp]);
         version.modifiedTime = toTime(values[kModifiedTime]);
         version.ctime = toTime(values[kCtime]);
@@ -277,7 +280,7 @@ bool ManifestParser::addPatch(std::string_view line)
         version.sizeLow = static_cast<std::uint32_t>(size);
         version.sizeHigh = static_cast<std::uint32_t>(size >> 32);
         version.attributes = static_cast<std::uint32_t>(toNumber(values[kAttributes], 8));
-        builder_->keepVersion(toSize(values[kAux1]), toSize(values[kAux2]), values[kAuxText]);
+        builder_->addVersion(version, toSize(values[kAux1]), toSize(values[kAux2]), values[kAuxText]);
     } catch (const std::bad_alloc&) {
         // Without memory for the version its line counts as invalid, which the callers handle and log.
         return false;

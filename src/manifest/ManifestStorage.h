@@ -14,6 +14,7 @@
 // here grows by copying, no block is much above 1 MB, and no entry has a heap block of its own.
 namespace tavi::storage {
 
+// MurmurHash3 for 32 bits, but for the length, which comes first, and the last bytes, each of which is mixed as a word.
 constexpr std::uint32_t hashBytes(std::uint32_t seed, std::string_view bytes) noexcept
 {
     std::uint32_t hash = seed ^ static_cast<std::uint32_t>(bytes.size());
@@ -180,57 +181,37 @@ struct Extra {
 
 // All versions of all files, in the order of the text.
 class VersionStore {
-    static constexpr unsigned kLog = 14;
-    static constexpr std::uint32_t kBlock = 1u << kLog;
-    struct Block {
-        PackedVersion versions[kBlock];
-        std::uint32_t extras[kBlock / 32];
-    };
-
   public:
     std::uint32_t size() const noexcept
     {
-        return size_;
+        return versions_.size();
     }
     const PackedVersion& operator[](std::uint32_t i) const noexcept
     {
-        return blocks_[i >> kLog]->versions[i & (kBlock - 1)];
+        return versions_[i];
     }
     bool hasExtra(std::uint32_t i) const noexcept
     {
-        return (blocks_[i >> kLog]->extras[(i & (kBlock - 1)) / 32] >> (i % 32) & 1) != 0;
+        return (extras_[i / 32] >> (i % 32) & 1) != 0;
     }
-    bool hasRoom() const noexcept
+    // After an exception the version may be added again.
+    void push(const PackedVersion& version, bool extra = false)
     {
-        return size_ >> kLog != blocks_.size();
-    }
-    // Returns the place of the next version, which is undefined until written and not counted until keep().
-    PackedVersion& next()
-    {
-        if (!hasRoom())
-            addBlock();
-        return blocks_[size_ >> kLog]->versions[size_ & (kBlock - 1)];
-    }
-    void keep(bool extra = false) noexcept
-    {
-        if (extra)
-            blocks_[size_ >> kLog]->extras[(size_ & (kBlock - 1)) / 32] |= 1u << (size_ % 32);
-        ++size_;
+        const std::uint32_t i = size();
+        if (i / 32 == extras_.size())
+            extras_.push(0);
+        versions_.push(version);
+        extras_[i / 32] |= std::uint32_t{extra} << (i % 32);
     }
     std::size_t bytes() const noexcept
     {
-        return blocks_.size() * sizeof(Block);
+        return versions_.bytes() + extras_.bytes();
     }
 
   private:
-    void addBlock()
-    {
-        blocks_.emplace_back(new Block);
-        std::memset(blocks_.back()->extras, 0, sizeof(Block::extras));
-    }
-
-    std::vector<std::unique_ptr<Block>> blocks_;
-    std::uint32_t size_ = 0;
+    BlockArray<PackedVersion, 14> versions_;
+    // One bit for each version.
+    BlockArray<std::uint32_t, 9> extras_;
 };
 
 } // namespace tavi::storage
