@@ -1,7 +1,6 @@
 #include "link/TransferStatus.h"
 
 #include <cmath>
-#include <thread>
 
 #include <gtest/gtest.h>
 
@@ -144,25 +143,6 @@ TEST(TransferStatus, TextsHaveAtMostTheLengthOfAPath)
     }
     status.apply(*event(E::textA, 0, wxString(L'x', kLongest - 1) + L"\U0001F4BE"));
     EXPECT_EQ(status.statusTextA.get().length(), sizeof(wchar_t) == 2 ? kLongest - 1 : kLongest) << "no half a pair";
-}
-
-// The listener and a window's thread at once.
-TEST(TransferStatus, TextsAreWholeWhileTheyChange)
-{
-    const wxString texts[] = {wxString(L'a', 40), wxString(L'b', 90)};
-    Status status;
-    status.apply(*event(E::restoreItem, 0, texts[0]));
-    std::thread listener([&] {
-        for (std::uint32_t round = 0; round < 50000; ++round)
-            status.apply(*event(E{round % 500 == 0 ? 57 : 53 + round % 2}, 1000, texts[round / 2 % 2]));
-        status.apply(SnapshotMessage(7, 1, 2, 3, 4));
-    });
-    while (status.doneB == 0) {
-        status.timerTick();
-        const wxString text = status.restoreText.get();
-        EXPECT_TRUE(text == texts[0] || text == texts[1] || text.empty()) << text;
-    }
-    listener.join();
 }
 
 } // namespace
