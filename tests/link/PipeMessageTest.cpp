@@ -69,10 +69,7 @@ TEST(PipeMessage, TextsExtendToTheEndOfTheBufferAtMost)
 TEST(PipeMessage, ABufferThatCannotGrowHoldsNoMessage)
 {
     const auto buffer = MessageBuffer::create();
-    buffer->ensure(1025);
-    EXPECT_EQ(buffer->capacity(), 2049u);
     buffer->ensure(UINT32_MAX);
     EXPECT_EQ(buffer->data(), nullptr);
-    EXPECT_EQ(buffer->capacity(), 0u);
     EXPECT_FALSE(createMessage(52, *buffer));
 }

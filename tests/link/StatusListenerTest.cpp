@@ -4,6 +4,7 @@
 
 #include <gtest/gtest.h>
 
+#include "link/CommandPipe.h"
 #include "tests/link/Frames.h"
 #include "tests/support/Pipes.h"
 
@@ -13,55 +14,53 @@ namespace {
 
 using namespace test;
 
-struct Listener {
-    ~Listener()
-    {
-        stop = true;
-        thread.join();
-        setMessageSink(nullptr);
-    }
-    std::atomic<bool> stop{false};
-    std::atomic<int> checks{0};
-    std::thread thread{[this] { listenToStatus([this] { return ++checks, stop.load(); }); }};
-};
-
-TEST(StatusListener, ReconnectsAfterAMalformedFrameAndKeepsTheStatus)
-{
-    const PipeServer servers[] = {{kStatus, PIPE_ACCESS_OUTBOUND, 2}, {kStatus, PIPE_ACCESS_OUTBOUND, 2}};
-    const Listener listener;
-    ASSERT_TRUE(servers[0].waitClient());
-    servers[0].write(serialized(*event(EventType::restoreTotal, 7)) + serialized(CounterMessage(1, 1, 1, 1)));
-    EXPECT_TRUE(waitUntil([] { return transferStatus().restoreTotal == 7; }));
-    const DWORD start = GetTickCount();
-    servers[0].write(bytes("34000000 00000000"));
-    ASSERT_TRUE(servers[1].waitClient());
-    EXPECT_LT(GetTickCount() - start, 4000u) << "only a failed open waits";
-    servers[1].write(serialized(*event(EventType::restoreMore, 2)));
-    EXPECT_TRUE(waitUntil([] { return transferStatus().restoreTotal == 9; }));
-    servers[1].write(bytes("34000000 14000000")); // stops in mid-frame, which must not delay the listener's end
-}
-
-TEST(StatusListener, WaitsForAMissingServiceAndAfterAnException)
+TEST(StatusListener, ReconnectsKeepingTheStatusAndWaitsForAMissingServiceAndAfterAnException)
 {
     LogCapture log;
-    setMessageSink([](const PipeMessage&) { throw std::bad_alloc(); });
+    std::atomic<bool> stop{false};
+    std::atomic<int> checks{0};
     DWORD start = GetTickCount();
-    {
-        const Listener listener;
-        EXPECT_TRUE(waitUntil([&] { return listener.checks > 0; })) << "an attempt has failed";
-        const PipeServer servers[] = {{kStatus, PIPE_ACCESS_OUTBOUND, 2}, {kStatus, PIPE_ACCESS_OUTBOUND, 2}};
-        EXPECT_TRUE(servers[0].waitClient());
-        EXPECT_GT(GetTickCount() - start, 4500u);
-        start = GetTickCount();
-        servers[0].write(serialized(*event(EventType::restoreEnded)));
-        EXPECT_TRUE(servers[1].waitClient());
-        EXPECT_GT(GetTickCount() - start, 4500u);
-        servers[1].write(serialized(*event(EventType::restoreTotal, 9)));
-        EXPECT_TRUE(waitUntil([] { return transferStatus().restoreTotal == 9; }));
-        start = GetTickCount();
-    }
+    std::thread listener([&] { listenToStatus([&] { return ++checks, stop.load(); }); });
+    EXPECT_TRUE(waitUntil([&] { return checks > 0; })) << "an attempt has failed";
+    const PipeServer servers[] = {
+        {kStatus, PIPE_ACCESS_OUTBOUND, 3}, {kStatus, PIPE_ACCESS_OUTBOUND, 3}, {kStatus, PIPE_ACCESS_OUTBOUND, 3}};
+    EXPECT_TRUE(servers[0].waitClient());
+    EXPECT_GT(GetTickCount() - start, 4500u);
+    servers[0].write(serialized(*event(EventType::restoreTotal, 7)) + serialized(CounterMessage(1, 1, 1, 1)));
+    EXPECT_TRUE(waitUntil([] { return transferStatus().restoreTotal == 7; }));
+    start = GetTickCount();
+    servers[0].write(bytes("34000000 00000000")); // malformed
+    EXPECT_TRUE(servers[1].waitClient());
+    EXPECT_LT(GetTickCount() - start, 4000u);
+    setMessageSink([](const PipeMessage&) { throw std::bad_alloc(); });
+    start = GetTickCount();
+    servers[1].write(serialized(*event(EventType::restoreMore, 2)));
+    EXPECT_TRUE(servers[2].waitClient());
+    EXPECT_GT(GetTickCount() - start, 4500u);
+    servers[2].write(serialized(*event(EventType::restoreMore, 4)));
+    EXPECT_TRUE(waitUntil([] { return transferStatus().restoreTotal == 13; }));
+    start = GetTickCount();
+    stop = true;
+    listener.join();
     EXPECT_LT(GetTickCount() - start, 4000u) << "a stop ends the pause between two attempts";
+    setMessageSink(nullptr);
     EXPECT_EQ(log.take().size(), 2u);
+}
+
+TEST(StatusListener, SendsACommandThatIsKeptOnlyIfThePipeCannotBeOpened)
+{
+    LogCapture log;
+    auto command = cancelRestoreCommand();
+    EXPECT_FALSE(sendCommand(command));
+    EXPECT_EQ(log.takeText(), "1: Error: Unable to open command pipe: 2");
+    ASSERT_TRUE(command);
+    // A write that fails: the server hangs up and has read nothing.
+    const PipeServer deaf(kCommand, PIPE_ACCESS_INBOUND, 1, 0);
+    std::thread writer([&] { EXPECT_FALSE(sendCommand(command)); });
+    EXPECT_TRUE(deaf.waitClient());
+    deaf.hangUp();
+    writer.join();
+    EXPECT_FALSE(command);
 }
 
 } // namespace

@@ -7,7 +7,8 @@
 #include "tests/support/Dialogs.h"
 #include "ui/resource.h"
 
-namespace tavi {
+using namespace tavi;
+
 namespace {
 
 using namespace test;
@@ -36,7 +37,6 @@ TEST_F(PropertyPageTest, IsOfferedForABackedUpFileAndDestroyedOnce)
     for (const auto& [paths, count] :
          {std::pair<PathSet, int>({L"C:\\"}, 0), {{L"C:\\gone"}, 0}, {{L"C:\\none", L"C:\\f"}, 1}}) {
         const HPROPSHEETPAGE page = pageFor(paths);
-        EXPECT_EQ(page != nullptr, count == 1);
         EXPECT_EQ(moduleRefCount(), count);
         DestroyPropertySheetPage(page);
         EXPECT_EQ(moduleRefCount(), 0);
@@ -84,4 +84,3 @@ TEST_F(PropertyPageTest, CountsUntilItsLastFrameHasReturned)
 }
 
 } // namespace
-} // namespace tavi

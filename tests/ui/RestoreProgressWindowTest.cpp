@@ -9,7 +9,8 @@
 #include "tests/support/Pipes.h"
 #include "ui/resource.h"
 
-namespace tavi {
+using namespace tavi;
+
 namespace {
 
 using namespace test;
@@ -51,9 +52,9 @@ struct RestoreProgressWindowTest : UiTest {
         procedure = reinterpret_cast<WNDPROC>(GetWindowLongPtrW(dialog, GWLP_WNDPROC));
         SetWindowLongPtrW(dialog, GWLP_WNDPROC, LONG_PTR(&spy));
     }
-    bool shows(const std::wstring& text, int control = TAVI_PROGRESS_STATUS) const
+    bool shows(const std::wstring& text) const
     {
-        return waitUntil([&] { return controlText(dialog, control) == text; });
+        return waitUntil([&] { return controlText(dialog, TAVI_PROGRESS_STATUS) == text; });
     }
     bool reaches(LRESULT position) const
     {
@@ -78,8 +79,6 @@ TEST_F(RestoreProgressWindowTest, ShowsItselfLateAndTheStatusOfEachRestoreUntilT
     ASSERT_EQ(waitDialog(L"Restoring..."), dialog);
     EXPECT_GE(GetTickCount() - start, 490u);
     EXPECT_TRUE(shows(L"Waiting to begin restore..."));
-    EXPECT_TRUE(shows(L"Unknown", TAVI_PROGRESS_REMAINING));
-    EXPECT_TRUE(shows(L"0.0 b/s", TAVI_PROGRESS_SPEED));
     dispatch(event(kStarted));
     EXPECT_TRUE(shows(L"Finding file on server..."));
     dispatch(event(kDone, 1 << 30)); // before the first item: not part of its speed
@@ -93,12 +92,6 @@ TEST_F(RestoreProgressWindowTest, ShowsItselfLateAndTheStatusOfEachRestoreUntilT
     EXPECT_TRUE(waitUntil([&] { return ring.rateOver(60000) > 0; })) << "only the first item clears it";
     EXPECT_TRUE(shows(L"C:\\d\\A & B.txt"));
     EXPECT_TRUE(reaches(125));
-    EXPECT_TRUE(waitUntil([&] { // some ticks compute the rates again
-        transferStatus().restoreRateShort = 2048;
-        transferStatus().restoreRateLong = 1000;
-        return controlText(dialog, TAVI_PROGRESS_SPEED) == L"2.0 Kb/s" &&
-               controlText(dialog, TAVI_PROGRESS_REMAINING) == L"4 seconds";
-    }));
     // The dialog manager uses the number of the window's own message, too.
     SendMessageW(dialog, DM_SETDEFID, TAVI_PROGRESS_CANCEL, 0);
     EXPECT_EQ(LOWORD(SendMessageW(dialog, DM_GETDEFID, 0, 0)), TAVI_PROGRESS_CANCEL);
@@ -218,4 +211,3 @@ TEST_F(RestoreProgressWindowTest, SurvivesRestoresThatStartEndAndCloseOnSeveralT
 }
 
 } // namespace
-} // namespace tavi

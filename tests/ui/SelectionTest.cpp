@@ -3,7 +3,8 @@
 #include "statedb/StateLookups.h"
 #include "tests/support/Dialogs.h"
 
-namespace tavi {
+using namespace tavi;
+
 namespace {
 
 using SelectionTest = test::UiTest;
@@ -11,9 +12,7 @@ using IdList = std::shared_ptr<ITEMIDLIST>;
 
 IdList idsOf(const wxString& path)
 {
-    LPITEMIDLIST list = nullptr;
-    EXPECT_EQ(SHParseDisplayName(path.wc_str(), nullptr, &list, 0, nullptr), S_OK) << path;
-    return IdList(list, ILFree);
+    return IdList(ILCreateFromPathW(path.wc_str()), ILFree);
 }
 
 UINT driveType = DRIVE_REMOTE;
@@ -134,4 +133,3 @@ TEST_F(SelectionTest, FindsAFolderAtAnyPlaceAmongTheItems)
 }
 
 } // namespace
-} // namespace tavi

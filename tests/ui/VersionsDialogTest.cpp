@@ -8,20 +8,16 @@
 #include <shlobj.h>
 
 #include "tests/support/Dialogs.h"
+#include "ui/CopyTarget.h"
 #include "ui/resource.h"
 #include "ui/RestoreProgressWindow.h"
 #include "ui/VersionsWindow.h"
 
-namespace tavi {
+using namespace tavi;
+
 namespace {
 
 using namespace test;
-
-void setTimeZone(const char* zone)
-{
-    _putenv_s("TZ", zone);
-    _tzset();
-}
 
 struct VersionsDialogTest : UiTest {
     void open(const PathSet& paths, bool hasFolder, const wxString& files)
@@ -36,24 +32,13 @@ struct VersionsDialogTest : UiTest {
         return IsWindowEnabled(GetDlgItem(dialog, TAVI_VERSIONS_RESTORE)) +
                IsWindowEnabled(GetDlgItem(dialog, TAVI_VERSIONS_COPY_TO));
     }
-    // Returns title, width and text of the first row for each column.
-    std::wstring columns() const
-    {
-        std::wstring all;
-        wchar_t title[50], text[50];
-        LVCOLUMNW column{LVCF_TEXT | LVCF_WIDTH, 0, 0, title, 50, 0, 0, 0, 0, 0, 0};
-        for (int i = 0; ListView_GetColumn(list, i, &column); ++i) {
-            ListView_GetItemText(list, 0, i, text, 50);
-            all += std::wstring(title) + L' ' + std::to_wstring(column.cx) + L" [" + text + L"] ";
-        }
-        return all;
-    }
     HWND dialog = nullptr, list = nullptr;
 };
 
 TEST_F(VersionsDialogTest, ListsEachRunOnceAndSelectsTheNewest)
 {
-    setTimeZone("XYZ-5");
+    _putenv_s("TZ", "XYZ-5");
+    _tzset();
     const wxString longName = L"begin" + wxString(L'x', 200) + L"end.txt",
                    files = L"C:\\d\\50% & more.txt\n4:86465:1:10:0::0:0\n4:1:1:11:0::0:0\n5:1:1:-1:0::0:0\n"
                            L"6:5:1:9:0::0:0\n\nC:\\d\\" +
@@ -75,75 +60,56 @@ TEST_F(VersionsDialogTest, ListsEachRunOnceAndSelectsTheNewest)
         EXPECT_EQ(ListView_GetItemCount(list), rows);
         EXPECT_EQ(ListView_GetNextItem(list, -1, LVNI_SELECTED), selected);
         EXPECT_EQ(enabledActions(), selected < 0 ? 0 : 2);
-        for (const UINT state : {LVIS_SELECTED, 0}) {
+        for (const UINT state : {UINT{LVIS_SELECTED}, 0u}) {
             ListView_SetItemState(list, rows - 1, state, LVIS_SELECTED);
             EXPECT_EQ(enabledActions(), state == 0 ? 0 : 2);
         }
         SIZE ideal{};
         EXPECT_TRUE(Button_GetIdealSize(GetDlgItem(dialog, IDCANCEL), &ideal)) << "a button of version 6";
+        std::wstring columns;
+        for (int i = 0; i < 3; ++i) {
+            wchar_t text[50] = L"";
+            ListView_GetItemText(list, 0, i, text, 50);
+            columns += std::to_wstring(ListView_GetColumnWidth(list, i)) + L": " + text + L"; ";
+        }
         // Of two versions of one run, the first.
-        EXPECT_EQ(columns(), hasFolder ? L"Backup Time 125 [01/01/1970 05:00 AM] "
-                                       : L"Backup Time 125 [01/01/1970 05:00 AM] "
-                                         L"Modified Time 125 [01/02/1970 05:01 AM] File Size 75 [10 bytes] ");
+        EXPECT_EQ(columns, hasFolder ? L"125: 01/01/1970 05:00 AM; 0: ; 0: ; "
+                                     : L"125: 01/01/1970 05:00 AM; 125: 01/02/1970 05:01 AM; 75: 10 bytes; ");
         PostMessageW(list, WM_KEYDOWN, VK_ESCAPE, 0);
         waitForThreads();
     }
-    setTimeZone("UTC0");
+    _putenv_s("TZ", "UTC0");
+    _tzset();
 }
 
-// The browser shows itself before it has opened the folder that it starts with.
-void chooseFolder(HWND browser, const wxString& folder)
+TEST_F(VersionsDialogTest, CopiesFromTheFoldersThatAllPathsShare)
 {
-    const HWND tree = FindWindowExW(browser, nullptr, WC_TREEVIEWW, nullptr);
-    EXPECT_TRUE(!tree || waitUntil([&] {
-        SendMessageW(browser, BFFM_SETSELECTIONW, TRUE, reinterpret_cast<LPARAM>(folder.wc_str()));
-        wchar_t name[MAX_PATH] = L"";
-        TVITEMW item{TVIF_TEXT, TreeView_GetSelection(tree), 0, 0, name, MAX_PATH, 0, 0, 0, 0};
-        return TreeView_GetItem(tree, &item) && folder.AfterLast(L'\\') == name;
-    }));
+    const wxString deep = L"C:\\" + wxString(L'd', 300);
+    const std::pair<PathSet, wxString> cases[] = {
+        {{}, L""},
+        {{L"C:\\a\\none"}, L"C:\\a\\none"}, // the target is the folder itself
+        {{L"C:\\a\\xx", L"C:\\a\\xy"}, L"C:\\a"},
+        {{L"C:\\a", L"C:\\a\\X"}, L"C:\\a"},
+        {{L"C:\\Dir\\N", L"c:\\dIR\\m"}, L"C:\\Dir"},
+        {{L"C:\\n", L"D:\\n"}, L""},
+        {{L"C:\\a\\x", L"C:\\a\\b\\n", L"C:\\a\\b\\m"}, L"C:\\a"},
+        {{L"C:\\a\\b\\n", L"C:\\a\\b\\m", L"C:\\a\\x"}, L"C:\\a"},
+        {{deep + L"\\n", deep + L"\\m"}, deep},
+    };
+    for (const auto& [paths, prefix] : cases)
+        EXPECT_TRUE(commonPrefix(paths).IsSameAs(prefix, false)) << commonPrefix(paths) << " for " << prefix;
 }
 
 // In folder "f" there is a file, and it and one deeper are backed up. Folder "t" is for the targets.
-struct VersionsRequestTest : VersionsDialogTest {
-    VersionsRequestTest()
-    {
-        for (const wchar_t* name : {L"f", L"t"})
-            CreateDirectoryW(in(name).wc_str(), nullptr);
-        for (const wchar_t* name : {L"f\\5%", L"t\\was", L"t\\5%"})
-            std::ofstream(in(name).wc_str());
-        service.createTables();
-    }
-    // Gives the answer to the box that the dialog has opened, after a choice of "t\was" or of folder "t".
-    void answer(HWND box, int button, const std::wstring& question)
-    {
-        if (GetDlgItem(box, cmb13)) {
-            EXPECT_EQ(controlText(box, cmb13), L"5%");
-            SetDlgItemTextW(box, cmb13, in(L"t\\was").wc_str());
-        }
-        chooseFolder(box, in(L"t"));
-        EXPECT_TRUE(button == IDOK || controlText(box, 0xFFFF).find(question) != std::wstring::npos);
-        button == kCloseWindow ? PostMessageW(dialog, WM_CLOSE, 0, 0) : click(box, button);
-    }
-    // Returns the stored requests, relative to the folder, and removes them: source, time, attributes, target,
-    // overwrite.
-    wxString takeRequests()
-    {
-        DbConnection database = service.database(L"tavistate.dat");
-        const char* text = nullptr;
-        database
-            .execQuery("SELECT ifnull(group_concat(manifest_path || ' ' || timestamp || ' ' || attributes || ' ' || "
-                       "target_path || ' ' || overwrite, ';'), '') FROM restore_files")
-            .fieldText(0, text);
-        wxString requests = fromUtf8(text);
-        requests.Replace(in(L""), L"");
-        database.execDML("DELETE FROM restore_files");
-        return requests;
-    }
-    static constexpr int kRestore = TAVI_VERSIONS_RESTORE, kCopy = TAVI_VERSIONS_COPY_TO, kCloseWindow = 0;
-};
-
-TEST_F(VersionsRequestTest, StoresWhatTheAnswersSay)
+TEST_F(VersionsDialogTest, StoresWhatTheAnswersSay)
 {
+    for (const wchar_t* name : {L"f", L"t"})
+        CreateDirectoryW(in(name).wc_str(), nullptr);
+    for (const wchar_t* name : {L"f\\5%", L"t\\was", L"t\\5%"})
+        std::ofstream(in(name).wc_str());
+    service.createTables();
+    DbConnection database = service.database(L"tavistate.dat");
+    constexpr int kRestore = TAVI_VERSIONS_RESTORE, kCopy = TAVI_VERSIONS_COPY_TO, kCloseWindow = 0;
     const wxString files = in(L"f\\5%\n100:1:7:1:0::0:40\n200:1:8:2:0::0:41\n\n") +
                            in(L"f\\b\\c\n100:1:7:3:0::0:0\n\n") + L"simple.map\n100:1:1:1:0::0:0";
     const PathSet one = {in(L"f\\5%")}, whole = {in(L"f")}, several = {in(L"f\\5%"), in(L"f\\b")},
@@ -174,7 +140,20 @@ TEST_F(VersionsRequestTest, StoresWhatTheAnswersSay)
         HWND box = nullptr;
         for (const int each : answers) {
             box = waitDialog(nullptr, dialog, box);
-            answer(box, each, question);
+            if (GetDlgItem(box, cmb13)) {
+                EXPECT_EQ(controlText(box, cmb13), L"5%");
+                SetDlgItemTextW(box, cmb13, in(L"t\\was").wc_str());
+            }
+            // The browser shows itself before it has opened the folder that it starts with.
+            const HWND tree = FindWindowExW(box, nullptr, WC_TREEVIEWW, nullptr);
+            EXPECT_TRUE(!tree || waitUntil([&] {
+                SendMessageW(box, BFFM_SETSELECTIONW, TRUE, reinterpret_cast<LPARAM>(in(L"t").wc_str()));
+                wchar_t name[MAX_PATH] = L"";
+                TVITEMW item{TVIF_TEXT, TreeView_GetSelection(tree), 0, 0, name, MAX_PATH, 0, 0, 0, 0};
+                return TreeView_GetItem(tree, &item) && std::wstring(name) == L"t";
+            }));
+            EXPECT_TRUE(each == IDOK || controlText(box, 0xFFFF).find(question) != std::wstring::npos);
+            each == kCloseWindow ? PostMessageW(dialog, WM_CLOSE, 0, 0) : click(box, each);
         }
         EXPECT_TRUE(waitUntil([&] { return !IsWindow(dialog); }));
         const auto progress = RestoreProgressWindow::current();
@@ -182,10 +161,18 @@ TEST_F(VersionsRequestTest, StoresWhatTheAnswersSay)
         if (progress && waitUntil([&] { return progress->dialog() != nullptr; }))
             PostMessageW(progress->dialog(), WM_CLOSE, 0, 0);
         waitForThreads();
-        EXPECT_EQ(takeRequests(), request);
+        // Source, time, attributes, target, overwrite; relative to the folder.
+        DbQuery stored = database.execQuery("SELECT ifnull(group_concat(manifest_path || ' ' || timestamp || ' ' || "
+                                            "attributes || ' ' || target_path || ' ' || overwrite, ';'), '') "
+                                            "FROM restore_files");
+        const char* text = nullptr;
+        stored.fieldText(0, text);
+        wxString requests = fromUtf8(text);
+        requests.Replace(in(L""), L"");
+        EXPECT_EQ(requests, request);
+        database.execDML("DELETE FROM restore_files");
         EXPECT_EQ(std::filesystem::current_path(), currentFolder) << "of the host";
     }
 }
 
 } // namespace
-} // namespace tavi
