@@ -5,12 +5,13 @@
 
 #include "core/Handles.h"
 
-namespace tavi {
+using namespace tavi;
+
 namespace {
 
 std::atomic<int> bodies{0};
 std::atomic<DWORD> thread{0};
-std::atomic<bool> sawStop{false}, throws{false};
+std::atomic<bool> sawStop{false};
 const KernelHandle entered(CreateSemaphoreW(nullptr, 0, 100, nullptr));
 const KernelHandle leave(CreateSemaphoreW(nullptr, 0, 100, nullptr));
 
@@ -21,63 +22,46 @@ bool waitFor(const KernelHandle& handle)
 
 BackgroundThread subject("test", [](const BackgroundThread& self) {
     thread = GetCurrentThreadId();
-    ++bodies;
+    const int body = ++bodies;
     ReleaseSemaphore(entered.get(), 1, nullptr);
     waitFor(leave);
     sawStop = self.isStopping();
-    if (throws.exchange(false))
+    if (body == 3)
         throw 1;
 });
 
-// Starts the thread, whose body waits.
-struct BackgroundThreads : testing::Test {
-    BackgroundThreads()
-    {
-        bodies = 0;
-        subject.start();
-        EXPECT_TRUE(waitFor(entered));
-    }
-    // Lets the body return and waits for the end of the thread.
-    static void expectEnd()
-    {
-        const KernelHandle ended(subject.releaseHandle());
-        ReleaseSemaphore(leave.get(), 1, nullptr);
-        EXPECT_TRUE(waitFor(ended));
-        EXPECT_FALSE(subject.isActive());
-    }
-};
-
-TEST_F(BackgroundThreads, RunOnceUntilTheyAreStopped)
+// Lets the body return and waits for the end of the thread.
+void expectEnd()
 {
-    subject.start();
-    subject.requestStop();
-    expectEnd();
-    EXPECT_TRUE(sawStop);
-    EXPECT_EQ(bodies, 1);
-    subject.requestStop(); // nothing to stop
-    EXPECT_FALSE(subject.isStopping());
+    const KernelHandle ended(subject.releaseHandle());
+    ReleaseSemaphore(leave.get(), 1, nullptr);
+    EXPECT_TRUE(waitFor(ended));
+    EXPECT_FALSE(subject.isActive());
 }
 
-TEST_F(BackgroundThreads, RunAgainOnTheSameThreadIfTheStopIsWithdrawn)
+TEST(BackgroundThread, RunsOnceUntilItIsStoppedOrThrows)
 {
+    const wxLogNull quiet;
+    subject.start();
+    EXPECT_TRUE(waitFor(entered));
     const DWORD first = thread;
     subject.requestStop();
     subject.start();
     EXPECT_FALSE(subject.isStopping());
     ReleaseSemaphore(leave.get(), 1, nullptr);
-    EXPECT_TRUE(waitFor(entered));
+    EXPECT_TRUE(waitFor(entered)) << "a withdrawn stop runs the body again";
     EXPECT_FALSE(sawStop);
     EXPECT_EQ(thread, first) << "a second thread would compete with the first";
+    subject.start();
     subject.requestStop();
     expectEnd();
-}
-
-TEST_F(BackgroundThreads, EndAfterAnException)
-{
-    const wxLogNull quiet;
-    throws = true;
+    EXPECT_TRUE(sawStop);
+    EXPECT_EQ(bodies, 2);
+    subject.requestStop(); // nothing to stop
+    EXPECT_FALSE(subject.isStopping());
+    subject.start();
+    EXPECT_TRUE(waitFor(entered));
     expectEnd();
 }
 
 } // namespace
-} // namespace tavi

@@ -7,7 +7,8 @@
 #include "tests/support/LogCapture.h"
 #include "tests/support/Registry.h"
 
-namespace tavi {
+using namespace tavi;
+
 namespace {
 
 struct Options : testing::Test {
@@ -48,4 +49,3 @@ TEST_F(Options, AndPathsAreReadOrGivenUpWhereMemoryRunsOut)
 }
 
 } // namespace
-} // namespace tavi

@@ -2,8 +2,7 @@
 
 #include <gtest/gtest.h>
 
-namespace tavi {
-namespace {
+using namespace tavi;
 
 using Texts = std::vector<wxString>;
 using Text = std::optional<wxString>;
@@ -43,6 +42,3 @@ TEST(ExclusionRules, AreTheMachinesAndThenTheUsersPlacesInOrder)
                      R"(#38\Intuit\QuickBooks Pro+|#38\Intuit\Quicken+|#38\Quicken+|#38\Qualcomm\Eudora+|#38\Palm+|)"
                      R"(#38\palmOne+|#38\Sony Handheld+|)");
 }
-
-} // namespace
-} // namespace tavi

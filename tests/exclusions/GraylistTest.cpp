@@ -7,18 +7,15 @@
 #include "core/Options.h"
 #include "exclusions/UserProfiles.h"
 #include "tests/support/Allocations.h"
-#include "tests/support/Hives.h"
 #include "tests/support/LogCapture.h"
+#include "tests/support/Registry.h"
 
-namespace tavi {
+using namespace tavi;
+using namespace tavi::test;
+
 namespace {
 
-using namespace test;
-
-RefPtr<const PathTree> adopt(const PathTree* tree)
-{
-    return RefPtr<const PathTree>::adopt(tree);
-}
+using Tree = RefPtr<const PathTree>;
 
 // Users whose folders get every odd state, by which they are named. Each build logs one line, since the install key
 // names no data folder.
@@ -82,7 +79,7 @@ TEST_F(Graylists, CountNoEntryThatTheListInForceLeavesOut)
         EXPECT_EQ(getUserDataTree(true)->lookup(view(here + name)), FolderState::on) << name;
     // In the users' places all count, also if another list is published during the build.
     log.onNextLine([] { getGraylist(false)->Release(); });
-    EXPECT_EQ(adopt(getGraylist(true))->lookup(view(here)), FolderState::onMostOn);
+    EXPECT_EQ(Tree::adopt(getGraylist(true))->lookup(view(here)), FolderState::onMostOn);
     EXPECT_EQ(log.take().size(), 3u) << "one for each list";
 }
 
@@ -94,14 +91,16 @@ TEST_F(Graylists, AreBuiltOneAtATimeAndPublishedBeforeTheHivesAreUnloaded)
         waiter = std::async(std::launch::async, getGraylist, false);
         builder = std::async(std::launch::async, getUserDataTree, true);
         EXPECT_EQ(builder.wait_for(std::chrono::milliseconds(500)), std::future_status::timeout);
-        unloadHive(hive = temporaryHives().at(0));
+        setPrivilege(processToken().get(), L"SeRestorePrivilege", true);
+        EXPECT_EQ(RegUnLoadKeyW(HKEY_USERS, (hive = temporaryHives().at(0)).c_str()), ERROR_SUCCESS);
+        setPrivilege(processToken().get(), L"SeRestorePrivilege", false);
         log.onNextLine([&] {
             reader = std::async(std::launch::async, getGraylist, false);
             EXPECT_EQ(reader.wait_for(std::chrono::minutes(1)), std::future_status::ready);
         });
     });
     const PathTree* const built = getGraylist(true);
-    EXPECT_EQ(adopt(reader.get()).get(), built);
+    EXPECT_EQ(Tree::adopt(reader.get()).get(), built);
     EXPECT_EQ(builder.get(), getUserDataTree(false));
     EXPECT_EQ(log.take().back(), "1: Error: Unable to unload temp reg hive " + toUtf8(hive) + ": 2");
     // The waiter has no reference: the builder's and the published one are the last.
@@ -114,4 +113,3 @@ TEST_F(Graylists, AreBuiltOneAtATimeAndPublishedBeforeTheHivesAreUnloaded)
 }
 
 } // namespace
-} // namespace tavi

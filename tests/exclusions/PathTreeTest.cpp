@@ -6,8 +6,7 @@
 
 #include "fuzz/PathTreeModel.h"
 
-namespace tavi {
-namespace {
+using namespace tavi;
 
 using namespace std::string_literals;
 
@@ -48,6 +47,3 @@ TEST(PathTree, TakesOddAndVeryLongPaths)
     EXPECT_EQ(tree->lookup(L"c:\\A"), FolderState::allOff);
     EXPECT_EQ(tree->lookup(deep), FolderState::allOn);
 }
-
-} // namespace
-} // namespace tavi

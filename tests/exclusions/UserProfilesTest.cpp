@@ -6,13 +6,13 @@
 #include <gtest/gtest.h>
 
 #include "tests/support/Allocations.h"
-#include "tests/support/Hives.h"
 #include "tests/support/LogCapture.h"
+#include "tests/support/Registry.h"
 
-namespace tavi {
+using namespace tavi;
+using namespace tavi::test;
+
 namespace {
-
-using namespace test;
 
 // Three users who are not logged on, the last without a hive.
 struct UserProfiles : testing::Test {
@@ -84,4 +84,3 @@ TEST_F(UserProfiles, StayUnloadedInSilenceWithoutAPrivilege)
 }
 
 } // namespace
-} // namespace tavi

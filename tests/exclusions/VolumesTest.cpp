@@ -7,7 +7,8 @@
 
 #include "tests/support/LogCapture.h"
 
-namespace tavi {
+using namespace tavi;
+
 namespace {
 
 using namespace std::string_literals;
@@ -74,27 +75,20 @@ NTSTATUS NTAPI closeLink(HANDLE)
     return --openLinks;
 }
 
-TEST(Volumes, HaveTheDeviceToWhichTheirNameLinks)
+TEST(Volumes, AreFixedWithReadablePathsAndTheDeviceToWhichTheirNameLinks)
 {
-    volumes = {{L"C:\\\0"s, 0}, {L"D:\\\0"s, 0}, {L"E:\\\0"s, 0}};
+    test::LogCapture log;
+    const auto noPath = L"\0"s;
+    volumes = {{L"C:\\\0"s, 0}, {L"D:\\\0"s, 0}, {L"E:\\\0"s, 0},  {L"R:\\\0"s, 0},
+               {noPath, 0},     {L"F:\\\0"s, 5}, {L"G:\\\0"s, 234}};
     VolumeTable table(
         {findFirst, findNext, FindVolumeClose, queryDevice, driveType, pathNames, openLink, queryLink, closeLink});
     table.refreshVolumes();
+    EXPECT_EQ(table.mountPoints(), (std::set<wxString>{L"C:\\", L"D:\\", L"E:\\"}));
     EXPECT_EQ(table.mountPointOf(L"\\Device\\Target"), L"C:\\");
     EXPECT_EQ(table.mountPointOf(L"\\Device\\1"), L"D:\\");
     EXPECT_EQ(table.mountPointOf(L"\\Device\\2"), L"E:\\");
     EXPECT_EQ(openLinks, 0) << "not closed";
-}
-
-TEST(Volumes, AreTheMountPointsOfFixedVolumesWhosePathsCanBeRead)
-{
-    test::LogCapture log;
-    volumes = {{L"\0"s, 0}, {L"F:\\\0"s, 5}, {L"G:\\\0"s, 234}, {L"E:\\\0"s, 0}, {L"C:\\\0C:\\mount\\\0"s, 0}};
-    // Without the native functions, which a system may lack.
-    VolumeTable table({findFirst, findNext, FindVolumeClose, QueryDosDeviceW, driveType, pathNames});
-    table.refreshVolumes();
-    EXPECT_EQ(table.mountPoints(), (std::set<wxString>{L"C:\\", L"C:\\mount\\"}));
-    EXPECT_EQ(table.mountPointOf(L""), L"C:\\mount\\") << "the last one without a device";
     EXPECT_EQ(log.takeText(), "1: Error: Failed to retrieve mount point names: 00000005"
                               "1: Error: Failed to retrieve mount point names: 000000ea");
     volumes.clear();
@@ -103,5 +97,13 @@ TEST(Volumes, AreTheMountPointsOfFixedVolumesWhosePathsCanBeRead)
     EXPECT_TRUE(VolumeFunctions::system().openLink);
 }
 
+TEST(Volumes, NeedNoNativeFunctionsAndNoDevice)
+{
+    volumes = {{L"C:\\\0C:\\mount\\\0"s, 0}};
+    VolumeTable table({findFirst, findNext, FindVolumeClose, QueryDosDeviceW, driveType, pathNames});
+    table.refreshVolumes();
+    EXPECT_EQ(table.mountPoints(), (std::set<wxString>{L"C:\\", L"C:\\mount\\"}));
+    EXPECT_EQ(table.mountPointOf(L""), L"C:\\mount\\") << "the last one without a device";
+}
+
 } // namespace
-} // namespace tavi

@@ -6,10 +6,8 @@
 #include "tests/support/Counts.h"
 #include "tests/support/LoadedModule.h"
 
-namespace tavi {
-namespace {
-
-using namespace test;
+using namespace tavi;
+using namespace tavi::test;
 using LifecycleTest = HostTest;
 
 TEST_F(LifecycleTest, AdmitsProgramsByTheBeginningOfTheirName)
@@ -55,6 +53,3 @@ TEST_F(LifecycleTest, GivesAToolTheClassesAndNothingElse)
     EXPECT_EQ(countThreads(), before);
     EXPECT_EQ(GetFileAttributesW(service.file(L"tavi.log").c_str()), INVALID_FILE_ATTRIBUTES);
 }
-
-} // namespace
-} // namespace tavi

@@ -20,10 +20,10 @@ extern decltype(&SHChangeNotify) importedNotify asm("__imp__SHChangeNotify@16");
 #endif
 decltype(&SHChangeNotify) importedNotify = countAnnouncement;
 
-namespace tavi {
-namespace {
+using namespace tavi;
+using namespace tavi::test;
 
-using namespace test;
+namespace {
 
 const wxString kOwnKey = L"HKEY_CURRENT_USER\\Software\\TaviTest", kClasses = L"\\CLSID\\",
                kId = L"{5e0c31a7-8d42-4b19-a6f3-2c7d90e1b845}", kShown = L"Tavi Remote Backup Shell Extension",
@@ -98,4 +98,3 @@ TEST_F(RegistrationTest, WritesTheClassAndItsHandlersAndDeletesTheClassOnly)
 }
 
 } // namespace
-} // namespace tavi

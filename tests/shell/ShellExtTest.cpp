@@ -4,10 +4,8 @@
 
 #include "tests/support/LoadedModule.h"
 
-namespace tavi {
-namespace {
-
-using namespace test;
+using namespace tavi;
+using namespace tavi::test;
 using ShellExtTest = HostTest;
 
 TEST_F(ShellExtTest, HasTheOverlayTableBehindTheOthers)
@@ -47,6 +45,3 @@ TEST_F(ShellExtTest, OffersWhatItsLastInitializeWasGiven)
         DestroyPropertySheetPage(page);
     }
 }
-
-} // namespace
-} // namespace tavi

@@ -2,10 +2,8 @@
 
 #include "tests/support/LoadedModule.h"
 
-namespace tavi {
-namespace {
-
-using namespace test;
+using namespace tavi;
+using namespace tavi::test;
 using StubFolderTest = HostTest;
 
 TEST_F(StubFolderTest, HasTwoTablesAndNoCurFolderInTheFirst)
@@ -40,6 +38,3 @@ TEST_F(StubFolderTest, ParsesEveryNameToTheEmptyListAndRefusesTheRest)
     EXPECT_EQ(folder->BindToObject(parsed.get(), nullptr, IID_IShellFolder, &out), E_FAIL);
     EXPECT_EQ(out, &module);
 }
-
-} // namespace
-} // namespace tavi

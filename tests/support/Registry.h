@@ -5,32 +5,25 @@
 #include <stdexcept>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include <windows.h>
-#include <sqlite3.h>
 #include <wx/msw/registry.h>
 
 #include "core/Handles.h"
 #include "core/InstallPaths.h"
-#include "core/Utf8.h"
 #include "exclusions/Privileges.h"
 #include "statedb/Database.h"
 
 namespace tavi {
 
-// The two keys, in the view that the module reads.
-inline wxRegKey installKey()
-{
-    return {getInstallKeyName(), wxRegKey::WOW64ViewMode_32};
-}
+// In the view that the module reads.
 inline wxRegKey settingsKey()
 {
     return {getSettingsKeyName(), wxRegKey::WOW64ViewMode_32};
 }
 
-} // namespace tavi
-
-namespace tavi::test {
+namespace test {
 
 // A new folder, which is deleted with its content.
 class TemporaryFolder {
@@ -43,8 +36,7 @@ class TemporaryFolder {
         std::filesystem::remove_all(path_);
         std::filesystem::create_directory(path_);
     }
-    TemporaryFolder(const TemporaryFolder&) = delete;
-    TemporaryFolder& operator=(const TemporaryFolder&) = delete;
+    TemporaryFolder(TemporaryFolder&&) = delete;
     ~TemporaryFolder()
     {
         std::error_code ignored;
@@ -102,22 +94,15 @@ class InstalledService {
     // Stores a compressed manifest text.
     void storeManifest(std::string_view blob) const
     {
-        sqlite3* database = nullptr;
-        sqlite3_stmt* insert = nullptr;
-        const bool stored =
-            sqlite3_open(toUtf8(file(L"tavistate.dat")).c_str(), &database) == SQLITE_OK &&
-            sqlite3_prepare_v2(database, "INSERT INTO manifest VALUES(?)", -1, &insert, nullptr) == SQLITE_OK &&
-            sqlite3_bind_blob(insert, 1, blob.data(), static_cast<int>(blob.size()), SQLITE_STATIC) == SQLITE_OK &&
-            sqlite3_step(insert) == SQLITE_DONE;
-        sqlite3_finalize(insert);
-        sqlite3_close(database);
-        if (!stored)
-            throw std::runtime_error("cannot store the manifest");
+        std::string hex;
+        for (const char byte : blob)
+            (hex += "0123456789ABCDEF"[byte >> 4 & 15]) += "0123456789ABCDEF"[byte & 15];
+        database(L"tavistate.dat").execDML(("INSERT INTO manifest VALUES(x'" + hex + "')").c_str());
     }
 
   private:
     TemporaryFolder folder_;
-    wxRegKey install_ = installKey();
+    wxRegKey install_{getInstallKeyName(), wxRegKey::WOW64ViewMode_32};
 };
 
 inline KernelHandle processToken()
@@ -127,23 +112,33 @@ inline KernelHandle processToken()
     return token;
 }
 
+// Returns the hives that the module has loaded.
+inline std::vector<std::wstring> temporaryHives()
+{
+    std::vector<std::wstring> names;
+    wchar_t name[256];
+    for (DWORD index = 0; RegEnumKeyW(HKEY_USERS, index, name, 256) == ERROR_SUCCESS; ++index) {
+        if (std::wstring_view(name).substr(0, 4) == L"tavi")
+            names.emplace_back(name);
+    }
+    return names;
+}
+
 // A user who is not logged on: a profile and a saved hive that maps the names of shell folders to their paths.
 struct AbsentUser {
     AbsentUser(const std::map<std::wstring, std::wstring>& shellFolders)
     {
-        wxRegKey source(L"HKCU\\Software\\TaviTestHive");
-        wxRegKey folders(source, L"Software\\Microsoft\\Windows\\CurrentVersion\\Explorer\\Shell Folders");
-        folders.Create();
+        RegistryKey source;
+        RegCreateKeyW(HKEY_CURRENT_USER, L"Software\\TaviTestHive", source.out());
         for (const auto& [name, path] : shellFolders)
-            folders.SetValue(name, wxString(path));
+            RegSetKeyValueW(source.get(), L"Software\\Microsoft\\Windows\\CurrentVersion\\Explorer\\Shell Folders",
+                            name.c_str(), REG_SZ, path.c_str(), DWORD(path.size() + 1) * sizeof(wchar_t));
         const KernelHandle token = processToken();
         setPrivilege(token.get(), L"SeBackupPrivilege", true);
-        RegistryKey key;
-        RegOpenKeyExW(HKEY_CURRENT_USER, L"Software\\TaviTestHive", 0, KEY_READ, key.out());
-        if (RegSaveKeyW(key.get(), hiveFile.c_str(), nullptr) != ERROR_SUCCESS)
+        if (RegSaveKeyW(source.get(), hiveFile.c_str(), nullptr) != ERROR_SUCCESS)
             throw std::runtime_error("cannot save the hive of a user");
         setPrivilege(token.get(), L"SeBackupPrivilege", false);
-        source.DeleteSelf();
+        RegDeleteTreeW(HKEY_CURRENT_USER, L"Software\\TaviTestHive");
 
         const SID sid = {SID_REVISION, 1, SECURITY_NT_AUTHORITY, {SECURITY_LOCAL_SERVICE_RID}};
         wxMemoryBuffer bytes;
@@ -164,4 +159,5 @@ struct AbsentUser {
                      std::to_wstring(users++)};
 };
 
-} // namespace tavi::test
+} // namespace test
+} // namespace tavi
