@@ -17,7 +17,15 @@ namespace {
 // Three users who are not logged on, the last without a hive.
 struct UserProfiles : testing::Test {
     LogCapture log;
-    const std::map<std::wstring, std::wstring> folders{{L"Cookies", L"c:\\windows"}};
+    static std::wstring shortPath(const TemporaryFolder& folder)
+    {
+        wchar_t path[MAX_PATH];
+        GetShortPathNameW(folder.path().c_str(), path, MAX_PATH);
+        EXPECT_NE(path, folder.path());
+        return L"c" + std::wstring(path + 1);
+    }
+    const TemporaryFolder folder;
+    const std::map<std::wstring, std::wstring> folders{{L"Cookies", shortPath(folder)}, {L"Gone", L"C:\\missing"}};
     const AbsentUser users[3] = {folders, folders, folders};
     const BOOL isHiveDeleted = DeleteFileW(users[2].hiveFile.c_str());
     const KernelHandle token = processToken();
@@ -32,7 +40,8 @@ TEST_F(UserProfiles, AreReachableFromTheOutermostLoadToItsUnload)
         const auto loaded = temporaryHives();
         names.insert(loaded.begin(), loaded.end());
         const auto paths = shellFolderPaths(L"Cookies");
-        EXPECT_EQ(std::count(paths.begin(), paths.end(), L"C:\\windows"), 2);
+        EXPECT_EQ(std::count(paths.begin(), paths.end(), L"C" + folder.path().substr(1)), 2);
+        EXPECT_TRUE(shellFolderPaths(L"Gone").empty());
         loadUserHives();
         unloadUserHives();
         EXPECT_EQ(temporaryHives(), loaded) << "after a nested pair";
@@ -42,17 +51,6 @@ TEST_F(UserProfiles, AreReachableFromTheOutermostLoadToItsUnload)
         EXPECT_FALSE(isPrivilegeEnabled(token.get(), L"SeBackupPrivilege"));
     }
     EXPECT_EQ(names.size(), 4u) << "each load uses new names";
-}
-
-TEST(LongPath, HasAnUpperCaseDriveLetterAndIsEmptyIfThereIsNone)
-{
-    const TemporaryFolder folder;
-    wchar_t shortPath[MAX_PATH];
-    GetShortPathNameW(folder.path().c_str(), shortPath, MAX_PATH);
-    EXPECT_NE(shortPath, folder.path());
-    shortPath[0] = L'c';
-    EXPECT_EQ(longPath(shortPath), L"C" + folder.path().substr(1));
-    EXPECT_EQ(longPath(folder.path() + L"\\missing"), L"");
 }
 
 TEST_F(UserProfiles, LeaveNoHiveLoadedWhereMemoryRunsOut)
