@@ -132,7 +132,7 @@ struct AbsentUser {
         RegCreateKeyW(HKEY_CURRENT_USER, L"Software\\TaviTestHive", source.out());
         for (const auto& [name, path] : shellFolders)
             RegSetKeyValueW(source.get(), L"Software\\Microsoft\\Windows\\CurrentVersion\\Explorer\\Shell Folders",
-                            name.c_str(), REG_SZ, path.c_str(), DWORD(path.size() + 1) * sizeof(wchar_t));
+                            name.c_str(), REG_SZ, path.c_str(), DWORD((path.size() + 1) * sizeof(wchar_t)));
         const KernelHandle token = processToken();
         setPrivilege(token.get(), L"SeBackupPrivilege", true);
         if (RegSaveKeyW(source.get(), hiveFile.c_str(), nullptr) != ERROR_SUCCESS)
