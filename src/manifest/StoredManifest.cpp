@@ -118,6 +118,7 @@ ManifestRef parseStoredManifest(const void* bytes, std::size_t length)
 {
     ManifestParser parser;
     TextDecoder decoder(parser, std::exchange(leftOver, {}));
+    bool isComplete = true;
     if (length != 0) {
         wxMemoryInputStream packed(bytes, length);
         wxZlibInputStream text(packed, wxZLIB_AUTO);
@@ -125,10 +126,13 @@ ManifestRef parseStoredManifest(const void* bytes, std::size_t length)
             const std::size_t count = text.Read(decoder.slice(), kReadBytes).LastRead();
             more = count != 0 && decoder.decodeSlice(count);
         }
+        isComplete = text.GetLastError() != wxSTREAM_READ_ERROR;
     }
     ManifestRef manifest = parser.finish(decoder.units());
-    // Only now: a parse that runs out of memory must not leave bytes of its text to the next.
-    leftOver = decoder.pending();
+    // Only now: a parse that runs out of memory must not leave bytes of its text to the next. wxWidgets reports zlib's
+    // lack of memory like a damaged blob.
+    if (isComplete)
+        leftOver = decoder.pending();
     return manifest;
 }
 
