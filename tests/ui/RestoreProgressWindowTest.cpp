@@ -125,21 +125,6 @@ TEST_F(RestoreProgressWindowTest, RefreshesForAStartAnEndAndASnapshotOnly)
     EXPECT_TRUE(ends());
 }
 
-TEST_F(RestoreProgressWindowTest, StaysRegisteredThoughItsDialogCannotBeCreated)
-{
-    setModuleInstance(GetModuleHandleW(L"kernel32.dll"));
-    std::atomic<bool> hasLogged{false};
-    log.onNextLine([&] { hasLogged = true; });
-    RestoreProgressWindow::getOrCreate();
-    EXPECT_TRUE(waitUntil([&] { return hasLogged.load(); }));
-    dispatch(event(kItem, 0, "not shown"));
-    EXPECT_EQ(moduleRefCount(), 2);
-    // Posts WM_QUIT to its thread.
-    std::thread([] { RestoreProgressWindow::current()->handleMessage(nullptr, WM_DESTROY, 0, 0); }).join();
-    EXPECT_FALSE(RestoreProgressWindow::current());
-    EXPECT_EQ(moduleRefCount()--, 1) << "the thread's stays raised";
-}
-
 TEST_F(RestoreProgressWindowTest, CatchesUpAfterOneNotificationOrNone)
 {
     translate("Finding file on server...", "Sucht die Datei...");
