@@ -68,14 +68,6 @@ TEST(PipeMessage, TextsExtendToTheEndOfTheBufferAtMost)
     }
 }
 
-TEST(PipeMessage, ABufferThatCannotGrowHoldsNoMessage)
-{
-    const auto buffer = MessageBuffer::create();
-    buffer->ensure(UINT32_MAX);
-    EXPECT_EQ(buffer->data(), nullptr);
-    EXPECT_FALSE(createMessage(52, *buffer));
-}
-
 // A peer that sends the parts and closes the pipe. After each part, and at an empty one, one look finds nothing.
 struct Peer : ByteSource {
     explicit Peer(std::deque<std::string> sent) : parts(std::move(sent)) {}
