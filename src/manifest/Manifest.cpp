@@ -7,7 +7,7 @@ namespace tavi {
 namespace {
 
 // The hash of a manifest without a hash line: the SHA-1 digest of no bytes.
-constexpr const char* kEmptyInputHash = "da39a3ee5e6b4b0d3255bfef95601890afd80709";
+constexpr const wchar_t* kEmptyInputHash = L"da39a3ee5e6b4b0d3255bfef95601890afd80709";
 
 constexpr wchar_t kFirstLowSurrogate = 0xDC00;
 constexpr wchar_t kLastLowSurrogate = 0xDFFF;

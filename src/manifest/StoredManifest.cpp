@@ -3,11 +3,12 @@
 #include <algorithm>
 #include <cstring>
 #include <memory>
+#include <new>
 #include <utility>
 
-#include <wx/mstream.h>
-#include <wx/zstream.h>
+#include <zlib.h>
 
+#include "core/LogLine.h"
 #include "core/Utf8.h"
 #include "manifest/ManifestParser.h"
 
@@ -112,27 +113,65 @@ void TextDecoder::pass(char* begin, char* end)
     parser_.feed(begin, length);
 }
 
+// Inflates a blob. wxZlibInputStream reports that memory ran out as if the blob were damaged, and only after it has
+// formatted a log line.
+class Inflater {
+  public:
+    Inflater(const void* bytes, std::size_t length)
+    {
+        // zlib does not write to it.
+        stream_.next_in = static_cast<Bytef*>(const_cast<void*>(bytes));
+        stream_.avail_in = static_cast<uInt>(length);
+        constexpr int kZlibOrGzip = 32;
+        check(inflateInit2(&stream_, MAX_WBITS + kZlibOrGzip));
+    }
+    Inflater(const Inflater&) = delete;
+    Inflater& operator=(const Inflater&) = delete;
+    ~Inflater()
+    {
+        inflateEnd(&stream_);
+    }
+    // Returns how many bytes it wrote: less than asked for at the end, which damage may bring forward.
+    std::size_t read(char* to, std::size_t capacity)
+    {
+        stream_.next_out = reinterpret_cast<Bytef*>(to);
+        stream_.avail_out = static_cast<uInt>(capacity);
+        int result = Z_OK;
+        while (result == Z_OK && stream_.avail_out != 0)
+            result = inflate(&stream_, Z_SYNC_FLUSH);
+        check(result);
+        return capacity - stream_.avail_out;
+    }
+
+  private:
+    static void check(int result)
+    {
+        if (result == Z_MEM_ERROR)
+            throw std::bad_alloc();
+        if (result != Z_OK && result != Z_STREAM_END)
+            logError(L"The stored manifest is damaged (%d: %hs)", result, zError(result));
+    }
+
+    z_stream stream_{};
+};
+
 } // namespace
 
 ManifestRef parseStoredManifest(const void* bytes, std::size_t length)
 {
     ManifestParser parser;
     TextDecoder decoder(parser, std::exchange(leftOver, {}));
-    bool isComplete = true;
     if (length != 0) {
-        wxMemoryInputStream packed(bytes, length);
-        wxZlibInputStream text(packed, wxZLIB_AUTO);
-        for (bool more = true; more;) {
-            const std::size_t count = text.Read(decoder.slice(), kReadBytes).LastRead();
-            more = count != 0 && decoder.decodeSlice(count);
+        Inflater text(bytes, length);
+        for (std::size_t count = kReadBytes; count == kReadBytes;) {
+            count = text.read(decoder.slice(), kReadBytes);
+            if (!decoder.decodeSlice(count))
+                break;
         }
-        isComplete = text.GetLastError() != wxSTREAM_READ_ERROR;
     }
     ManifestRef manifest = parser.finish(decoder.units());
-    // Only now: a parse that runs out of memory must not leave bytes of its text to the next. wxWidgets reports zlib's
-    // lack of memory like a damaged blob.
-    if (isComplete)
-        leftOver = decoder.pending();
+    // Only now: a parse that runs out of memory must not leave bytes of its text to the next.
+    leftOver = decoder.pending();
     return manifest;
 }
 

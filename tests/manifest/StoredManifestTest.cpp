@@ -71,17 +71,31 @@ TEST(StoredManifest, IsWholeAfterALoadThatRanOutOfMemory)
     // The end of the first read cuts a character in two.
     const std::string blob = packed(kHead + std::string(64 * 1024 - kHead.size() - 1, 'x') + "\xC3\xA4\n\nother\n1");
     const std::string whole = dump(stored(blob));
-    std::string read;
     int succeeding = 0;
-    for (; read != whole; ++succeeding) {
+    for (ManifestRef read; !read; ++succeeding) {
         try {
             const FailingAllocations failing(succeeding, Heap::c, 1);
-            read = dump(stored(blob));
-        } catch (const std::exception&) {
+            read = stored(blob);
+        } catch (const std::bad_alloc&) {
         }
+        EXPECT_TRUE(!read || dump(read) == whole);
         ASSERT_EQ(dump(stored(blob)), whole) << "after allocation " << succeeding << " failed";
     }
     EXPECT_GT(succeeding, 20);
+}
+
+// The address space of a 32-bit host is fragmented.
+TEST(StoredManifest, NeedsNoLargeBlock)
+{
+    constexpr std::uint32_t kFiles = 300'000;
+    std::string text = "FILES\n";
+    for (std::uint32_t i = 0; i < kFiles; ++i) {
+        const std::string name = std::to_string(i * 7919 % kFiles);
+        text += name + "\\file\n1\n\nfolder\\" + name + "\n1\n\n";
+    }
+    const std::string blob = packed(text);
+    const FailingAllocations large(0, Heap::c, 1 << 30, (1 << 20) + 1);
+    EXPECT_EQ(stored(blob)->fileCount(), 2 * kFiles);
 }
 #endif
 

@@ -7,7 +7,7 @@ extern "C" {
 void* __real_malloc(std::size_t size);
 void* __wrap_malloc(std::size_t size)
 {
-    return FailingAllocations::fails(Heap::c) ? nullptr : __real_malloc(size);
+    return FailingAllocations::fails(Heap::c, size) ? nullptr : __real_malloc(size);
 }
 void __real_free(void* block);
 void __wrap_free(void* block)
