@@ -60,7 +60,7 @@ wxString VolumeTable::resolveLink(const wxString& device) const
 {
     if (!functions_.openLink)
         return device;
-    // The structure counts bytes. Its pointer is not to const, but the kernel only reads.
+    // The structure counts bytes. Its pointer is not to const, but the call only reads.
     UNICODE_STRING name{};
     name.Buffer = const_cast<wchar_t*>(static_cast<const wchar_t*>(device.wc_str()));
     name.Length = static_cast<USHORT>(device.length() * sizeof(wchar_t));

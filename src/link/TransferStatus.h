@@ -63,8 +63,7 @@ struct TransferStatus {
     std::atomic<std::int64_t> restoreDone{0};
     std::atomic<bool> restoreStarted{false};
 
-    // The backup. The module only keeps these values, for later readers.
-    // Its two texts.
+    // The backup, for others (see ARCHITECTURE.md). Its two texts.
     PublishedText statusTextA;
     PublishedText statusTextB;
     // The newest amounts of A, and those of B whose message says that they count.

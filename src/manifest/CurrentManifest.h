@@ -16,7 +16,7 @@ void setExclusionBuilder(ExclusionBuilder builder) noexcept;
 ManifestRef getCurrentManifest() noexcept;
 
 // Holds a reference to the manifest in force until the next call, for the next menu, or until the module is unmapped.
-// Starts the watcher like getCurrentManifest. Any thread.
+// For others (see ARCHITECTURE.md). Starts the watcher like getCurrentManifest. Any thread.
 void holdManifestForMenu() noexcept;
 
 // Asks the watcher to end, which it does within half a second. Does not wait.

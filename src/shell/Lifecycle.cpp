@@ -93,7 +93,7 @@ void attachToFileManager(HINSTANCE instance, const wchar_t* hostPath)
 void detachFromFileManager(bool processEnds)
 {
     releaseShellAllocator();
-    // At the end of a process the kernel has killed every other thread at an arbitrary instruction, perhaps inside a
+    // At the end of a process the system has killed every other thread at an arbitrary instruction, perhaps inside a
     // lock of the heap, of a C stream or of GDI. It frees the rest without those locks.
     if (processEnds)
         return;

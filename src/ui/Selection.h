@@ -19,7 +19,7 @@ enum class Coverage : std::int32_t { some = -1, none = 0, all = 1 };
 // The items that the host selected, and what the menu and the dialogs need to know of them.
 struct Selection {
     PathSet paths;
-    // The items below which everything is backed up. Nothing in the module reads it.
+    // The items below which everything is backed up. For others (see ARCHITECTURE.md).
     Coverage stateSummary = Coverage::none;
     // The items with versions in the manifest.
     Coverage restoreMode = Coverage::none;
