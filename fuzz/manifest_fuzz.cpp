@@ -60,7 +60,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t len
     if (length == 0)
         return 0;
     if (bytes[0] % 2 != 0) {
-        const ManifestRef manifest = parseStoredManifest(bytes + 1, length - 1);
+        const ManifestRef manifest =
+            parseStoredManifest(piecesOf({reinterpret_cast<const char*>(bytes) + 1, length - 1}));
         if (manifest)
             checkLookups(*manifest);
         return 0;
@@ -69,10 +70,10 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t len
     // depend on the one before.
     const std::uint8_t malformed[] = {0xFF};
     const std::string clearing = packed(malformed, 1);
-    parseStoredManifest(clearing.data(), clearing.size());
+    parseStoredManifest(piecesOf(clearing));
 
     const std::string blob = packed(bytes + 1, length - 1);
-    const ManifestRef stored = parseStoredManifest(blob.data(), blob.size());
+    const ManifestRef stored = parseStoredManifest(piecesOf(blob));
     if (stored)
         checkLookups(*stored);
     // If the whole text is well-formed, the wide text must give the same manifest.

@@ -1,6 +1,8 @@
 #include "core/DisplayFormat.h"
 
-#include <cmath>
+#include <cwchar>
+#include <iterator>
+#include <string>
 
 #include <wx/intl.h>
 #include <wx/translation.h>
@@ -33,24 +35,38 @@ void replaceAll(wxString& text, const Replacement (&table)[kSize])
         text.Replace(row.picture, row.conversion);
 }
 
-wxString dayText(unsigned long count)
+// Not wxString::Format(), which ends the host when memory runs out.
+wxString withOneDecimal(double value)
 {
-    return wxString::Format(wxPLURAL("%lu day", "%lu days", count), count);
+    wchar_t text[32] = L"";
+    std::swprintf(text, std::size(text), L"%.1f", value);
+    return wxString(text);
 }
 
-wxString hourText(unsigned long count)
+wxString withCount(wxString text, std::uint32_t count)
 {
-    return wxString::Format(wxPLURAL("%lu hour", "%lu hours", count), count);
+    text.Replace(L"%lu", std::to_wstring(count));
+    return text;
 }
 
-wxString minuteText(unsigned long count)
+wxString dayText(std::uint32_t count)
 {
-    return wxString::Format(wxPLURAL("%lu minute", "%lu minutes", count), count);
+    return withCount(wxPLURAL("%lu day", "%lu days", count), count);
 }
 
-wxString secondText(unsigned long count)
+wxString hourText(std::uint32_t count)
 {
-    return wxString::Format(wxPLURAL("%lu second", "%lu seconds", count), count);
+    return withCount(wxPLURAL("%lu hour", "%lu hours", count), count);
+}
+
+wxString minuteText(std::uint32_t count)
+{
+    return withCount(wxPLURAL("%lu minute", "%lu minutes", count), count);
+}
+
+wxString secondText(std::uint32_t count)
+{
+    return withCount(wxPLURAL("%lu second", "%lu seconds", count), count);
 }
 
 } // namespace
@@ -59,24 +75,24 @@ wxString formatSize(std::int64_t bytes)
 {
     const auto value = static_cast<double>(bytes);
     if (value > kGiga)
-        return wxString::Format(L"%.1f %s", value / kGiga, _("GB"));
+        return withOneDecimal(value / kGiga) + L" " + _("GB");
     if (value > kMega)
-        return wxString::Format(L"%.1f %s", value / kMega, _("MB"));
+        return withOneDecimal(value / kMega) + L" " + _("MB");
     if (value > kKilo)
-        return wxString::Format(L"%.1f %s", value / kKilo, _("KB"));
-    return wxString::Format("%" wxLongLongFmtSpec "d %s", static_cast<wxLongLong_t>(bytes), _("bytes"));
+        return withOneDecimal(value / kKilo) + L" " + _("KB");
+    return wxString(std::to_wstring(bytes)) + L" " + _("bytes");
 }
 
 wxString formatRate(std::uint64_t amountPerSecond)
 {
     const auto value = static_cast<double>(amountPerSecond);
     if (value >= kGiga)
-        return wxString::Format(L"%.1f %s/s", value / kGiga, _("Gb"));
+        return withOneDecimal(value / kGiga) + L" " + _("Gb") + L"/s";
     if (value >= kMega)
-        return wxString::Format(L"%.1f %s/s", value / kMega, _("Mb"));
+        return withOneDecimal(value / kMega) + L" " + _("Mb") + L"/s";
     if (value >= kKilo)
-        return wxString::Format(L"%.1f %s/s", value / kKilo, _("Kb"));
-    return wxString::Format(L"%.1f %s/s", value, _("b"));
+        return withOneDecimal(value / kKilo) + L" " + _("Kb") + L"/s";
+    return withOneDecimal(value) + L" " + _("b") + L"/s";
 }
 
 wxString formatDuration(std::uint32_t seconds)

@@ -89,6 +89,14 @@ struct FileTraits : InvalidIsNone {
 };
 using FileHandle = UniqueHandle<FileTraits>;
 
+struct LibraryTraits : NullIsNone<HMODULE> {
+    static void free(Handle library) noexcept
+    {
+        FreeLibrary(library);
+    }
+};
+using LibraryHandle = UniqueHandle<LibraryTraits>;
+
 struct RegistryTraits : NullIsNone<HKEY> {
     static void free(Handle key) noexcept
     {

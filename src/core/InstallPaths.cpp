@@ -24,7 +24,7 @@ RegistryKey openKey(const wchar_t* path, REGSAM access) noexcept
     return key;
 }
 
-// Logs the line that wxWidgets' own class for keys logs.
+// Logs the line that wxWidgets' own class for keys logs for a value that cannot be read.
 void logUnreadable(const wchar_t* value, LSTATUS status) noexcept
 {
     wchar_t reason[128] = L"";

@@ -24,7 +24,7 @@ constexpr unsigned long kInstallReadIntervalMs = 1000;
 constexpr const char* kTimeFormat = "%d%b%Y %H:%M:%S";
 // A message of 4095 characters, the time and the level.
 constexpr std::size_t kMaxLineChars = 4095 + 65;
-// No code page has more bytes for a UTF-16 unit.
+// No ANSI code page has more bytes for a UTF-16 unit.
 constexpr std::size_t kMaxLineBytes = 3 * kMaxLineChars;
 
 // Without a target wxWidgets creates one that opens a message box, which would block the host, in process attach
@@ -48,7 +48,6 @@ File openForAppending(const wxString& path)
                                 nullptr, OPEN_ALWAYS, FILE_ATTRIBUTE_NORMAL, nullptr));
     if (!file)
         return stream;
-    // Not inherited: otherwise a program that the host starts would keep the file open.
     const int descriptor = _open_osfhandle(reinterpret_cast<std::intptr_t>(file.get()), _O_TEXT | _O_NOINHERIT);
     if (descriptor < 0)
         return stream;
@@ -63,7 +62,8 @@ class FileLogTarget : public wxLogStderr {
   public:
     explicit FileLogTarget(File file) : wxLogStderr(file.get()), file_(std::move(file))
     {
-        // Holds the longest line, so that each line is one write.
+        // Holds the longest line, so that a line is one write; but one above 1,000 bytes is written in pieces, since
+        // text mode translates them in a buffer of that size.
         std::setvbuf(file_.get(), buffer_, _IOFBF, sizeof(buffer_));
     }
 

@@ -22,8 +22,8 @@ DWORD WINAPI runModuleThread(void* parameter)
 {
     ThreadStart start{};
     guarded("module thread", [&] {
-        // Allocates what the C++ runtime keeps for each thread: if memory has run out at the first exception, the lack
-        // of that would end the host.
+        // Makes the C++ runtime allocate its data for this thread now, not at the first exception, which may be that
+        // memory has run out.
         static_cast<void>(std::current_exception());
         std::unique_ptr<ThreadStart> owned(static_cast<ThreadStart*>(parameter));
         start = *owned;

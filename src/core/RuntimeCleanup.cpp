@@ -31,7 +31,7 @@ struct LastRelease {
 
 void releaseThreadRuntime() noexcept
 {
-    // The thread's exceptions are part of that data. One that is still being handled would be freed too early.
+    // The runtime's data of a thread include its exceptions. One that is still being handled would be freed too early.
     if (std::uncaught_exceptions() != 0 || std::current_exception())
         return;
     HMODULE module = nullptr;

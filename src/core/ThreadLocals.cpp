@@ -1,13 +1,15 @@
 #include "core/ThreadLocals.h"
 
+#include <algorithm>
 #include <atomic>
 #include <cstddef>
 #include <cstdint>
 #include <cstdlib>
 #include <cstring>
+#include <iterator>
+#include <memory>
 
 #include <windows.h>
-#include <malloc.h>
 
 #include "core/Boundary.h"
 #include "core/Handles.h"
@@ -28,16 +30,23 @@ struct Variable {
     const void* initial;
 };
 
-// The C++ runtime has three variables, a test program one more.
+// The C++ runtime has three small variables, a test program one more. A program with more than fit ends at the first
+// use of the one too many.
 constexpr std::uintptr_t kMaxVariables = 16;
+constexpr std::size_t kStorageBytes = 512;
 
-// The variables of one thread, by number. The threads form a list: when the module is unmapped it frees the variables
-// of threads that still run.
+// The variables of one thread, by number, and their storage. The threads form a list: when the module is unmapped it
+// frees the variables of threads that still run.
 struct ThreadVariables {
     ThreadVariables* next;
     ThreadVariables** link;
     void* variables[kMaxVariables];
+    std::size_t usedBytes;
+    alignas(std::max_align_t) std::byte storage[kStorageBytes];
 };
+
+// For threads of the host whose first exception is that memory has run out. One in use has a link.
+ThreadVariables reserve[8];
 
 struct SlotTraits {
     using Handle = DWORD;
@@ -72,10 +81,14 @@ std::uintptr_t numberOf(Variable& variable) noexcept
 // Creates the record of the calling thread; null without memory.
 ThreadVariables* addThread() noexcept
 {
-    auto* const thread = static_cast<ThreadVariables*>(std::calloc(1, sizeof(ThreadVariables)));
-    if (!thread)
-        return nullptr;
+    auto* thread = static_cast<ThreadVariables*>(std::calloc(1, sizeof(ThreadVariables)));
     AcquireSRWLockExclusive(&lock);
+    if (!thread)
+        thread = std::find_if(std::begin(reserve), std::end(reserve), [](const auto& spare) { return !spare.link; });
+    if (thread == std::end(reserve)) {
+        ReleaseSRWLockExclusive(&lock);
+        return nullptr;
+    }
     thread->next = allThreads;
     thread->link = &allThreads;
     if (allThreads)
@@ -85,21 +98,25 @@ ThreadVariables* addThread() noexcept
     return thread;
 }
 
-void* create(const Variable& variable) noexcept
+void* create(const Variable& variable, ThreadVariables& thread) noexcept
 {
-    void* const created = _aligned_malloc(variable.size, variable.alignment);
-    if (created && variable.initial)
+    void* created = thread.storage + thread.usedBytes;
+    std::size_t free = kStorageBytes - thread.usedBytes;
+    if (!std::align(variable.alignment, variable.size, created, free))
+        return nullptr;
+    thread.usedBytes = kStorageBytes - free + variable.size;
+    if (variable.initial)
         std::memcpy(created, variable.initial, variable.size);
-    else if (created)
-        std::memset(created, 0, variable.size);
     return created;
 }
 
+// The thread is in the list no more, or the list is.
 void freeVariables(ThreadVariables* thread) noexcept
 {
-    for (void* const variable : thread->variables)
-        _aligned_free(variable);
-    std::free(thread);
+    if (thread >= std::begin(reserve) && thread < std::end(reserve))
+        *thread = {};
+    else
+        std::free(thread);
 }
 
 // Returns null if the variable cannot be created.
@@ -117,7 +134,7 @@ void* variableOfThread(Variable& variable) noexcept
         return nullptr;
     void*& found = thread->variables[number - 1];
     if (!found)
-        found = create(variable);
+        found = create(variable, *thread);
     return found;
 }
 
@@ -132,8 +149,8 @@ void releaseThread() noexcept
     *thread->link = thread->next;
     if (thread->next)
         thread->next->link = thread->link;
-    ReleaseSRWLockExclusive(&lock);
     freeVariables(thread);
+    ReleaseSRWLockExclusive(&lock);
 }
 
 void NTAPI endOfThread(void*, DWORD reason, void*)

@@ -82,7 +82,7 @@ const PathTree* getGraylist(bool refresh)
 {
     Current current = currentOrNew(graylist, refresh);
     // A caller that waited for another builder gets no reference of its own; the published one keeps the tree until the
-    // next refresh. A caller counts on this rule: a reference given here too would never be released.
+    // next refresh. Callers outside of this tree (see ARCHITECTURE.md) release none then.
     return current.waited ? current.tree.get() : current.tree.release();
 }
 

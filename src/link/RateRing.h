@@ -14,7 +14,8 @@ using TickSource = std::uint32_t (*)();
 // sample before both its numbers are stored. Only the constructor allocates.
 class RateRing {
   public:
-    // The capacity is a power of two.
+    // The capacity is a power of two, so that one bit of a sample's number tells a lap, one pass over all slots, from
+    // the next.
     RateRing(std::uint32_t capacity, TickSource clock);
     RateRing(const RateRing&) = delete;
     RateRing& operator=(const RateRing&) = delete;

@@ -14,7 +14,8 @@
 // here grows by copying, no block is much above 1 MB, and no entry has a heap block of its own.
 namespace tavi::storage {
 
-// MurmurHash3 for 32 bits, but for the length, which comes first, and the last bytes, each of which is mixed as a word.
+// MurmurHash3 for 32 bits with two differences, which shorten it: the length is part of the seed, and each of the last
+// bytes is mixed as a word.
 constexpr std::uint32_t hashBytes(std::uint32_t seed, std::string_view bytes) noexcept
 {
     std::uint32_t hash = seed ^ static_cast<std::uint32_t>(bytes.size());

@@ -1,7 +1,9 @@
 #include "manifest/ManifestWatcher.h"
 
-#include <string>
+#include <new>
 #include <utility>
+
+#include <sqlite3.h>
 
 #include "core/Boundary.h"
 #include "core/InstallPaths.h"
@@ -19,14 +21,14 @@ constexpr int kSleepsPerPoll = 10;
 constexpr std::uint32_t kPollsPerExclusionBuild = 18;
 
 // Returns a copy: the service cannot commit while a statement reads the row, and parsing takes long.
-std::string readBlob()
+BlobPieces readBlob()
 {
     DbConnection database;
     database.open(getDataFilePath(DataFile::stateDatabase));
     DbQuery rows = database.execQuery(kSelectManifest);
     const char* blob = nullptr;
     const int length = rows.nextRow() ? rows.fieldText(0, blob) : 0;
-    return {blob, static_cast<std::size_t>(length)};
+    return piecesOf({blob, static_cast<std::size_t>(length)});
 }
 
 } // namespace
@@ -34,10 +36,11 @@ std::string readBlob()
 ManifestRef readStoredManifest()
 {
     try {
-        const std::string blob = readBlob();
-        return parseStoredManifest(blob.data(), blob.size());
+        return parseStoredManifest(readBlob());
     } catch (const DbException& error) {
         logWarning(L"Failed to retrieve stored manifest (%d: %ls)", error.code(), error.message().wc_str());
+        if (error.code() == SQLITE_NOMEM)
+            throw std::bad_alloc();
     }
     return Manifest::parse(wxString());
 }
@@ -80,7 +83,7 @@ void runManifestWatcher(WatcherState& state, const WatcherServices& services)
         loadIfChanged();
         if (++polls % kPollsPerExclusionBuild == 0) {
             guarded("exclusion build", [&] { services.buildExclusions(false); });
-            // Not in every poll: a load for which the host has not the memory takes processor time, too.
+            // Not in every poll: a load that fails for lack of memory takes processor time, too.
             if (state.isLoadDue)
                 load();
         }

@@ -9,12 +9,13 @@
 
 namespace tavi {
 
-// The data that the watcher thread shares with the rest of the module. They outlive it.
+// What outlives a watcher thread, for the next one. Any thread may read the manifest; the other members belong to the
+// watcher thread.
 struct WatcherState {
     PublishedPointer<const Manifest> manifest;
-    // The rest is only for the watcher thread. The local time of the last load in milliseconds since 1970.
+    // The local time of the last load in milliseconds since 1970.
     std::int64_t lastLoad = 0;
-    // Until a load has ended without an exception.
+    // True until a load has ended without an exception.
     bool isLoadDue = true;
 };
 
@@ -36,7 +37,7 @@ struct WatcherServices {
 void runManifestWatcher(WatcherState& state, const WatcherServices& services);
 
 // Returns the stored manifest; an empty one if there is none or the database fails, which is logged; null for an
-// invalid text.
+// invalid text. Throws std::bad_alloc, also if SQLite's memory does not suffice.
 ManifestRef readStoredManifest();
 
 } // namespace tavi

@@ -16,6 +16,7 @@ namespace tavi {
 namespace {
 
 constexpr std::size_t kReadBytes = 64 * 1024;
+constexpr std::size_t kPieceBytes = 256 * 1024;
 
 // The first bytes of a character that is cut in two.
 struct PartialSequence {
@@ -117,11 +118,8 @@ void TextDecoder::pass(char* begin, char* end)
 // formatted a log line.
 class Inflater {
   public:
-    Inflater(const void* bytes, std::size_t length)
+    explicit Inflater(const BlobPieces& blob) : next_(blob.begin()), end_(blob.end())
     {
-        // zlib does not write to it.
-        stream_.next_in = static_cast<Bytef*>(const_cast<void*>(bytes));
-        stream_.avail_in = static_cast<uInt>(length);
         constexpr int kZlibOrGzip = 32;
         check(inflateInit2(&stream_, MAX_WBITS + kZlibOrGzip));
     }
@@ -131,14 +129,21 @@ class Inflater {
     {
         inflateEnd(&stream_);
     }
-    // Returns how many bytes it wrote: less than asked for at the end, which damage may bring forward.
+    // Returns how many bytes it wrote: fewer than `capacity` at the end of the data, or where they are damaged.
     std::size_t read(char* to, std::size_t capacity)
     {
         stream_.next_out = reinterpret_cast<Bytef*>(to);
         stream_.avail_out = static_cast<uInt>(capacity);
         int result = Z_OK;
-        while (result == Z_OK && stream_.avail_out != 0)
+        while (result == Z_OK && stream_.avail_out != 0) {
+            if (stream_.avail_in == 0 && next_ != end_) {
+                // zlib does not write to it.
+                stream_.next_in = reinterpret_cast<Bytef*>(const_cast<char*>(next_->data()));
+                stream_.avail_in = static_cast<uInt>(next_->size());
+                ++next_;
+            }
             result = inflate(&stream_, Z_SYNC_FLUSH);
+        }
         check(result);
         return capacity - stream_.avail_out;
     }
@@ -153,16 +158,25 @@ class Inflater {
     }
 
     z_stream stream_{};
+    BlobPieces::const_iterator next_, end_;
 };
 
 } // namespace
 
-ManifestRef parseStoredManifest(const void* bytes, std::size_t length)
+BlobPieces piecesOf(std::string_view blob)
+{
+    BlobPieces pieces;
+    for (; !blob.empty(); blob.remove_prefix(pieces.back().size()))
+        pieces.emplace_back(blob.substr(0, kPieceBytes));
+    return pieces;
+}
+
+ManifestRef parseStoredManifest(const BlobPieces& blob)
 {
     ManifestParser parser;
     TextDecoder decoder(parser, std::exchange(leftOver, {}));
-    if (length != 0) {
-        Inflater text(bytes, length);
+    if (!blob.empty()) {
+        Inflater text(blob);
         for (std::size_t count = kReadBytes; count == kReadBytes;) {
             count = text.read(decoder.slice(), kReadBytes);
             if (!decoder.decodeSlice(count))

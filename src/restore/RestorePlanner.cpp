@@ -25,7 +25,7 @@ void insertFreeName(std::string& path, std::uint32_t number)
 
 // Names that differ in letter case only are one file. Letters beyond ASCII stay as they are: each file system has a
 // table of its own for them.
-void toKey(std::string& target)
+void foldAsciiCase(std::string& target)
 {
     for (char& c : target)
         c = c >= 'A' && c <= 'Z' ? static_cast<char>(c | 0x20) : c;
@@ -42,12 +42,12 @@ RestorePlan::RestorePlan(const RestoreRequest& request, const Manifest& manifest
     }
 }
 
-void RestorePlan::buildTarget(const std::string& manifestPath, std::uint32_t freeName, std::string& target) const
+void RestorePlan::buildTarget(const std::string& manifestPath, std::uint32_t nameNumber, std::string& target) const
 {
     target = destination_;
     target.append(manifestPath, utf8PrefixLength(manifestPath, removedUnits_), std::string::npos);
-    if (freeName != 0)
-        insertFreeName(target, freeName);
+    if (nameNumber != 0)
+        insertFreeName(target, nameNumber);
 }
 
 void RestorePlan::plan(std::uint32_t file, const RestoreRequest& request, const PathProbe& exists)
@@ -64,13 +64,13 @@ void RestorePlan::plan(std::uint32_t file, const RestoreRequest& request, const 
     }
     manifestPath_.clear();
     manifest_->appendFilePathUtf8(file, manifestPath_);
-    for (;; ++row.freeName) {
-        buildTarget(manifestPath_, row.freeName, target_);
+    for (;; ++row.nameNumber) {
+        buildTarget(manifestPath_, row.nameNumber, target_);
         key_ = target_;
-        toKey(key_);
+        foldAsciiCase(key_);
         row.hash = storage::hashBytes(0, key_);
         // If all numbers are taken, the next one is used without a check, so that the file still gets its row.
-        if (row.freeName > kMaxFreeName || !isTaken(row, exists))
+        if (row.nameNumber > kMaxFreeName || !isTaken(row, exists))
             break;
     }
     rows_.push(row);
@@ -86,8 +86,8 @@ bool RestorePlan::isTaken(const Row& row, const PathProbe& exists)
             return false;
         std::string path, key;
         manifest_->appendFilePathUtf8(earlier.file, path);
-        buildTarget(path, earlier.freeName, key);
-        toKey(key);
+        buildTarget(path, earlier.nameNumber, key);
+        foldAsciiCase(key);
         return key == key_;
     });
     return equal != storage::HashIndex::kNone || exists(target_);
@@ -98,7 +98,7 @@ void RestorePlan::readEntry(std::uint32_t row, RestoreFileEntry& entry) const
     const Row& numbers = rows_[row];
     entry.manifestPath.clear();
     manifest_->appendFilePathUtf8(numbers.file, entry.manifestPath);
-    buildTarget(entry.manifestPath, numbers.freeName, entry.targetPath);
+    buildTarget(entry.manifestPath, numbers.nameNumber, entry.targetPath);
     const ManifestPatch patch = manifest_->patches(numbers.file)[numbers.patch];
     entry.fileSize = patch.fileSize();
     entry.overwrite = overwrite_;
@@ -116,8 +116,8 @@ RestorePlan planRestore(const RestoreRequest& request, const Manifest& manifest,
         paths.push_back(&path);
     std::sort(paths.begin(), paths.end(), [](const wxString* a, const wxString* b) { return *a < *b; });
     for (const wxString* path : paths) {
-        // A plain prefix: a file's path also selects longer names that begin alike, and a folder's its siblings. The
-        // menu asks for a folder with its separator; here the service and its users rely on these rows.
+        // A plain prefix: C:\a.txt also selects C:\a.txt.bak, and the folder C:\a the folder C:\ab. The menu asks for a
+        // folder with its separator; here the service and its users rely on these rows.
         manifest.forEachUnder(view(*path), [&](std::uint32_t file) {
             plan.plan(file, request, exists);
             return true;

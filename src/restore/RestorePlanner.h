@@ -60,7 +60,7 @@ class RestorePlan {
         std::uint32_t file;
         std::uint32_t patch;
         // The number in the target's name, 0 for none.
-        std::uint32_t freeName;
+        std::uint32_t nameNumber;
         // Of the target's key. Unused if files may be overwritten.
         std::uint32_t hash;
     };
@@ -68,7 +68,7 @@ class RestorePlan {
     RestorePlan(const RestoreRequest& request, const Manifest& manifest);
     void plan(std::uint32_t file, const RestoreRequest& request, const PathProbe& exists);
     bool isTaken(const Row& row, const PathProbe& exists);
-    void buildTarget(const std::string& manifestPath, std::uint32_t freeName, std::string& target) const;
+    void buildTarget(const std::string& manifestPath, std::uint32_t nameNumber, std::string& target) const;
 
     const Manifest* manifest_;
     std::string destination_;
@@ -82,7 +82,8 @@ class RestorePlan {
 };
 
 // Chooses the version and the target of every file of the manifest whose path begins with a selected path. If existing
-// files are to be kept, no two targets are equal, and `exists` accepts none; else it is not called.
+// files are to be kept, `exists` accepts no target and no two are equal, unless all numbers of a name are taken; else
+// it is not called.
 RestorePlan planRestore(const RestoreRequest& request, const Manifest& manifest, const PathProbe& exists);
 
 } // namespace tavi

@@ -338,7 +338,7 @@ StatementSlot DbConnection::prepare(const char* sql) const
     check();
     auto slot = std::make_shared<sqlite3_stmt*>(nullptr);
     // Not the _v2 call, whose statements prepare themselves again after a change of the tables: the log shows such a
-    // change as DB_SCHEMA. The detail stays empty, because scripts that read the log recognise this failure by that.
+    // change as DB_SCHEMA. The detail stays empty, because scripts that read the log recognize this failure by that.
     if (const int result = sqlite3_prepare(connection_, sql, -1, slot.get(), nullptr); result != SQLITE_OK)
         throw DbException(result, wxString());
     return slot;

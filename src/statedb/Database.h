@@ -109,7 +109,7 @@ class DbStatement {
 };
 
 // How a transaction locks the database: plain and deferred ones when they first read or write, the others at once for
-// writing. Exclusive is immediate: an exclusive lock would keep the service from reading.
+// writing. Exclusive is immediate: an exclusive lock would keep the service from reading. The module uses plain ones.
 enum class TransactionMode { plain, deferred, immediate, exclusive };
 
 class DbConnection {

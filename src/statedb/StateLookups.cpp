@@ -27,7 +27,8 @@ FolderStateTable::FolderStateTable()
     delete_ = connection_.compileStatement(kFolderDelete);
 }
 
-// delete_ is finalized by its own destructor and so outlives the connection, which DbConnection::close allows.
+// The statement that has run is finalized first, so that its locks end with the connection. delete_, which never runs,
+// is finalized by its own destructor after the close; DbConnection::close allows that.
 FolderStateTable::~FolderStateTable()
 {
     try {

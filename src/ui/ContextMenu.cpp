@@ -58,7 +58,8 @@ struct Command {
 };
 
 // The index of a command is its offset from the first id that the host gives to the menu. The two backup commands do
-// nothing and are on no menu, but a host may ask for their verbs and help texts. Message catalogues have their labels.
+// nothing and are on no menu, but a host may ask for their verbs and help texts, and message catalogues translate their
+// labels.
 const Command kCommands[] = {
     {L"TaviRestore",
      hasVersions,
@@ -118,7 +119,7 @@ UINT insertMenuItems(HMENU menu, UINT indexMenu, UINT idCmdFirst, UINT flags, co
         return 0;
 
     const ActivationScope activation;
-    // A selection without versions gets the separator alone.
+    // Also for a selection without versions: the menu keeps its groups, whatever the backup holds.
     InsertMenuW(menu, indexMenu, MF_BYPOSITION | MF_SEPARATOR, 0, nullptr);
     UINT position = indexMenu;
     UINT usedIds = 0;

@@ -10,6 +10,7 @@
 
 #include "core/Boundary.h"
 #include "core/Handles.h"
+#include "core/InitializeOnce.h"
 #include "core/LogLine.h"
 #include "core/Module.h"
 #include "core/Utf8.h"
@@ -75,13 +76,7 @@ UINT CALLBACK pageCallback(HWND, UINT message, PROPSHEETPAGEW* description)
 HMODULE sheetControls() noexcept
 {
     static std::atomic<HMODULE> controls{nullptr};
-    if (!controls) {
-        const HMODULE loaded = LoadLibraryW(L"comctl32.dll");
-        HMODULE none = nullptr;
-        if (loaded && !controls.compare_exchange_strong(none, loaded))
-            FreeLibrary(loaded);
-    }
-    return controls;
+    return initializeOnce(controls, [] { return LibraryHandle(LoadLibraryW(L"comctl32.dll")); });
 }
 
 template <class Function>

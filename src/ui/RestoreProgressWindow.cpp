@@ -141,7 +141,7 @@ INT_PTR RestoreProgressWindow::handleMessage(HWND window, UINT message, WPARAM w
         KillTimer(window, kTimer);
         PostQuitMessage(0);
         dropAllRestores();
-        lock_.reset();
+        moduleLock_.reset();
         CoFreeUnusedLibraries();
         return TRUE;
     default:

@@ -57,12 +57,12 @@ class RestoreProgressWindow {
     wxString remainingLine_;
     wxString speedLine_;
     std::int32_t position_ = 0;
-    std::optional<ModuleLock> lock_{std::in_place};
+    std::optional<ModuleLock> moduleLock_{std::in_place};
 
-    // The lock of the current window guards the rest.
+    // `windowLock` guards the rest.
     // The restores that hold this window; 0 unless it is the current one.
     std::int32_t restores_ = 0;
-    // The messages since the dialog last looked: the ends of restores, and whether one makes every line outdated.
+    // Of the messages since the last handleArrivals: the ends of restores, and whether one makes every line outdated.
     std::int32_t ends_ = 0;
     bool linesAreOutdated_ = false;
     // Whether the dialog has been notified since then: once is enough, and keeps its message queue short.

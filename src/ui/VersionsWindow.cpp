@@ -43,9 +43,11 @@ INT_PTR CALLBACK windowProcedure(HWND window, UINT message, WPARAM wParam, LPARA
             return FALSE;
         switch (message) {
         case WM_INITDIALOG:
+            // First: without its window the dialog would ignore Cancel.
+            dialog->handleMessage(window, message, lParam);
             SetWindowTextW(window, _("Restore Files").wc_str());
             setWindowIcons(window);
-            break;
+            return FALSE;
         case WM_COMMAND:
             if (dialog->runCommand(LOWORD(wParam)))
                 DestroyWindow(window);

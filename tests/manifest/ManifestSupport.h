@@ -20,7 +20,7 @@ inline std::string packed(const std::string& text, int format = wxZLIB_ZLIB)
 
 inline ManifestRef stored(const std::string& blob)
 {
-    return parseStoredManifest(blob.data(), blob.size());
+    return parseStoredManifest(piecesOf(blob));
 }
 
 // Returns the versions in the layout of eight fields.

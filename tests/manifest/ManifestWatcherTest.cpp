@@ -103,12 +103,33 @@ TEST(readStoredManifest, LeavesTheDatabaseToTheServiceWhileItParses)
     EXPECT_EQ(changes, 1);
 }
 
+// The address space of a 32-bit host is fragmented.
+TEST(readStoredManifest, NeedsNoLargeBlock)
+{
+    constexpr std::uint32_t kFiles = 300'000;
+    std::string text = "FILES\n";
+    for (std::uint32_t i = 0; i < kFiles; ++i) {
+        const std::string name = std::to_string(i * 7919 % kFiles);
+        text += name + "\\file\n1\n\nfolder\\" + name + "\n1\n\n";
+    }
+    const InstalledService service;
+    service.createTables();
+    service.storeManifest(packed(text));
+    const FailingAllocations large(0, Heap::c, 1 << 30, (1 << 20) + 1);
+    EXPECT_EQ(readStoredManifest()->fileCount(), 2 * kFiles);
+}
+
 TEST(readStoredManifest, IsEmptyWhereThereIsNoneAndLogsFailures)
 {
     LogCapture log;
     const InstalledService service;
+    bool lackedMemory = false;
     const auto read = [&] {
-        EXPECT_EQ(dump(readStoredManifest()), "");
+        try {
+            EXPECT_EQ(dump(readStoredManifest()), "");
+        } catch (const std::bad_alloc&) {
+            lackedMemory = true;
+        }
         return log.takeText();
     };
     const std::string failed = "2: Warning: Failed to retrieve stored manifest ";
@@ -122,11 +143,14 @@ TEST(readStoredManifest, IsEmptyWhereThereIsNoneAndLogsFailures)
     database.execDML("UPDATE manifest SET contents=zeroblob(20000)");
     database.close();
     const std::string invalid = read();
+    EXPECT_FALSE(lackedMemory);
     int succeeding = 0;
     for (std::string lines; lines != invalid && succeeding < 1000; ++succeeding) {
+        lackedMemory = false;
         const FailingAllocations failing(succeeding, Heap::sqlite);
         lines = read();
-        ASSERT_TRUE(lines == invalid || lines.rfind(failed + "(7: DB_NOMEM[7]: ", 0) == 0) << succeeding << lines;
+        ASSERT_EQ(lackedMemory, lines.rfind(failed + "(7: DB_NOMEM[7]: ", 0) == 0) << succeeding << lines;
+        ASSERT_TRUE(lackedMemory || lines == invalid) << succeeding << lines;
     }
     EXPECT_GT(succeeding, 20);
     EXPECT_TRUE(DeleteFileW(service.file(L"tavistate.dat").c_str())) << "a connection has stayed open";

@@ -83,20 +83,6 @@ TEST(StoredManifest, IsWholeAfterALoadThatRanOutOfMemory)
     }
     EXPECT_GT(succeeding, 20);
 }
-
-// The address space of a 32-bit host is fragmented.
-TEST(StoredManifest, NeedsNoLargeBlock)
-{
-    constexpr std::uint32_t kFiles = 300'000;
-    std::string text = "FILES\n";
-    for (std::uint32_t i = 0; i < kFiles; ++i) {
-        const std::string name = std::to_string(i * 7919 % kFiles);
-        text += name + "\\file\n1\n\nfolder\\" + name + "\n1\n\n";
-    }
-    const std::string blob = packed(text);
-    const FailingAllocations large(0, Heap::c, 1 << 30, (1 << 20) + 1);
-    EXPECT_EQ(stored(blob)->fileCount(), 2 * kFiles);
-}
 #endif
 
 } // namespace
