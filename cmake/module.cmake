@@ -14,10 +14,12 @@ include(cmake/hardening.cmake)
 add_library(tavi_platform_flags INTERFACE)
 target_compile_definitions(tavi_platform_flags INTERFACE UNICODE _UNICODE _WIN32_WINNT=0x0600 WINVER=0x0600 NOMINMAX
     WIN32_LEAN_AND_MEAN)
-# wxWidgets' log calls store __FILE__. The module's bytes must not depend on the folder of the build; ccache makes its path relative.
+# The module stores __FILE__, and its build id depends on its symbols. Its bytes must not depend on the folders of the build and of the
+# libraries; ccache makes the first one's path relative.
 file(RELATIVE_PATH to_root ${CMAKE_BINARY_DIR} ${CMAKE_SOURCE_DIR})
 target_compile_options(tavi_platform_flags INTERFACE -ffunction-sections -fdata-sections
-    -fmacro-prefix-map=${CMAKE_SOURCE_DIR}/= -fmacro-prefix-map=${to_root}=)
+    -ffile-prefix-map=${CMAKE_SOURCE_DIR}/= -ffile-prefix-map=${to_root}=
+    -ffile-prefix-map=${TAVI_DEPS}/=libraries/)
 target_link_options(tavi_platform_flags INTERFACE -static -Wl,--gc-sections -Wl,--no-insert-timestamp)
 
 add_library(tavi_platform INTERFACE)
@@ -33,11 +35,23 @@ file(GLOB product_sources CONFIGURE_DEPENDS src/*/*.cpp)
 list(REMOVE_ITEM product_sources ${CMAKE_SOURCE_DIR}/src/shell/DllMain.cpp ${CMAKE_SOURCE_DIR}/src/shell/Exports.cpp)
 add_library(tavi_product STATIC ${product_sources})
 target_link_libraries(tavi_product PUBLIC tavi_platform PRIVATE tavi_warnings)
+# Functions and lines, which end up beside the module.
+target_compile_options(tavi_product PRIVATE $<$<CONFIG:Release>:-g1>)
 
 include(cmake/resources.cmake)
 
 add_library(tavishell SHARED src/shell/DllMain.cpp src/shell/Exports.cpp src/shell/tavishell.def src/ui/tavishell.rc)
-set_target_properties(tavishell PROPERTIES PREFIX "" LINK_FLAGS_RELEASE "-s")
+set_target_properties(tavishell PROPERTIES PREFIX "")
+target_compile_options(tavishell PRIVATE $<$<AND:$<CONFIG:Release>,$<COMPILE_LANGUAGE:CXX>>:-g1>)
+# The symbols go to a file of their own, which has the build id of the module. A section's name of more than eight characters would
+# need a table of strings behind the image.
+if(CMAKE_BUILD_TYPE STREQUAL "Release")
+    target_link_options(tavishell PRIVATE -Wl,--build-id)
+    add_custom_command(TARGET tavishell POST_BUILD
+        COMMAND ${CMAKE_OBJCOPY} -p --only-keep-debug tavishell.dll tavishell.debug
+        COMMAND ${CMAKE_OBJCOPY} -p --strip-all --rename-section .eh_frame=.eh_fram tavishell.dll
+        BYPRODUCTS tavishell.debug VERBATIM)
+endif()
 # Only 32-bit names are decorated.
 if(CMAKE_SIZEOF_VOID_P EQUAL 4)
     target_link_options(tavishell PRIVATE -Wl,--entry=_tavishellEntry@12)
