@@ -4,15 +4,11 @@
 
 #include <gtest/gtest.h>
 
-#include "link/CommandPipe.h"
 #include "tests/link/Frames.h"
 #include "tests/support/Pipes.h"
 
 using namespace tavi;
-
-namespace {
-
-using namespace test;
+using namespace tavi::test;
 
 TEST(StatusListener, ReconnectsKeepingTheStatusAndWaitsForAMissingServiceAndAfterAnException)
 {
@@ -46,21 +42,3 @@ TEST(StatusListener, ReconnectsKeepingTheStatusAndWaitsForAMissingServiceAndAfte
     setMessageSink(nullptr);
     EXPECT_EQ(log.take().size(), 2u);
 }
-
-TEST(StatusListener, SendsACommandThatIsKeptOnlyIfThePipeCannotBeOpened)
-{
-    LogCapture log;
-    auto command = cancelRestoreCommand();
-    EXPECT_FALSE(sendCommand(command));
-    EXPECT_EQ(log.takeText(), "1: Error: Unable to open command pipe: 2");
-    ASSERT_TRUE(command);
-    // A write that fails: the server hangs up and has read nothing.
-    const PipeServer deaf(kCommand, PIPE_ACCESS_INBOUND, 1, 0);
-    std::thread writer([&] { EXPECT_FALSE(sendCommand(command)); });
-    EXPECT_TRUE(deaf.waitClient());
-    deaf.hangUp();
-    writer.join();
-    EXPECT_FALSE(command);
-}
-
-} // namespace
