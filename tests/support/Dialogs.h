@@ -5,7 +5,6 @@
 
 #include <prsht.h>
 #include <gtest/gtest.h>
-#include <wx/translation.h>
 
 #include "core/Module.h"
 #include "manifest/CurrentManifest.h"
@@ -69,24 +68,10 @@ struct UiTest : testing::Test {
     {
         stopManifestWatcher();
         waitForThreads();
-        wxTranslations::Set(nullptr);
     }
     wxString in(const wxString& name) const
     {
         return service.file(name.wc_str());
-    }
-    // Loads a gettext catalogue of one text: a header, the length and offset of either text, the texts.
-    void translate(const std::string& text, const std::string& translation) const
-    {
-        const auto length = unsigned(text.size()), after = unsigned(translation.size());
-        const unsigned head[] = {0x950412de, 0, 1, 28, 36, 0, 0, length, 44, after, 45 + length};
-        CreateDirectoryW(in(L"de").wc_str(), nullptr);
-        std::ofstream(in(L"de\\tavi.mo").wc_str(), std::ios::binary)
-            << std::string(reinterpret_cast<const char*>(head), sizeof(head)) << text << '\0' << translation << '\0';
-        wxFileTranslationsLoader::AddCatalogLookupPathPrefix(service.file(L""));
-        wxTranslations::Set(new wxTranslations);
-        wxTranslations::Get()->SetLanguage("de");
-        wxTranslations::Get()->AddCatalog("tavi", wxLANGUAGE_ENGLISH);
     }
 
     LogCapture log;
