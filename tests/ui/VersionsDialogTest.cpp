@@ -2,6 +2,7 @@
 
 #include <cstdlib>
 #include <ctime>
+#include <thread>
 
 #include <commctrl.h>
 #include <dlgs.h>
@@ -9,8 +10,8 @@
 
 #include "tests/support/Dialogs.h"
 #include "ui/CopyTarget.h"
+#include "ui/PropertyPage.h"
 #include "ui/resource.h"
-#include "ui/RestoreProgressWindow.h"
 #include "ui/VersionsWindow.h"
 
 using namespace tavi;
@@ -47,7 +48,7 @@ TEST_F(VersionsDialogTest, ListsEachRunOnceAndSelectsTheNewest)
                            L"simple.map\n4:1:1:1:0::0:0\n5:1:1:1:0::0:0\n6:1:1:1:0::0:0";
     const std::tuple<PathSet, bool, std::wstring, int, int> cases[] = {
         {{L"C:\\d\\50% & more.txt"}, false, L"50% & more.txt are*", 2, 1},
-        {{L"C:\\d\\" + longName}, false, L"beginxx*xend.txt are*", 1, -1},
+        {{L"C:\\d\\" + longName}, false, L"beginxx*x\u2026x*xend.txt are*", 1, -1},
         {{L"C:\\d"}, true, L"the items you selected are*", 3, 2},
         {{L"C:\\a", L"C:\\b"}, true, L"some of the items you selected are*", 3, 2},
     };
@@ -55,15 +56,12 @@ TEST_F(VersionsDialogTest, ListsEachRunOnceAndSelectsTheNewest)
         open(paths, hasFolder, files);
         const wxString message = controlText(dialog, TAVI_VERSIONS_MESSAGE);
         EXPECT_TRUE(message.Matches(L"The following versions of " + pattern)) << message;
-        EXPECT_LT(message.length(), 250u);
         EXPECT_EQ(controlText(dialog, TAVI_VERSIONS_LABEL), hasFolder ? L"Available &Versions:" : L"File &Versions:");
         EXPECT_EQ(ListView_GetItemCount(list), rows);
         EXPECT_EQ(ListView_GetNextItem(list, -1, LVNI_SELECTED), selected);
         EXPECT_EQ(enabledActions(), selected < 0 ? 0 : 2);
-        for (const UINT state : {UINT{LVIS_SELECTED}, 0u}) {
-            ListView_SetItemState(list, rows - 1, state, LVIS_SELECTED);
-            EXPECT_EQ(enabledActions(), state == 0 ? 0 : 2);
-        }
+        ListView_SetItemState(list, rows - 1, selected < 0 ? LVIS_SELECTED : 0u, LVIS_SELECTED);
+        EXPECT_EQ(enabledActions(), selected < 0 ? 2 : 0);
         SIZE ideal{};
         EXPECT_TRUE(Button_GetIdealSize(GetDlgItem(dialog, IDCANCEL), &ideal)) << "a button of version 6";
         std::wstring columns;
@@ -85,19 +83,12 @@ TEST_F(VersionsDialogTest, ListsEachRunOnceAndSelectsTheNewest)
 TEST_F(VersionsDialogTest, CopiesFromTheFoldersThatAllPathsShare)
 {
     const wxString deep = L"C:\\" + wxString(L'd', 300);
-    const std::pair<PathSet, wxString> cases[] = {
-        {{}, L""},
-        {{L"C:\\a\\none"}, L"C:\\a\\none"}, // the target is the folder itself
-        {{L"C:\\a\\xx", L"C:\\a\\xy"}, L"C:\\a"},
-        {{L"C:\\a", L"C:\\a\\X"}, L"C:\\a"},
-        {{L"C:\\Dir\\N", L"c:\\dIR\\m"}, L"C:\\Dir"},
-        {{L"C:\\n", L"D:\\n"}, L""},
-        {{L"C:\\a\\x", L"C:\\a\\b\\n", L"C:\\a\\b\\m"}, L"C:\\a"},
-        {{L"C:\\a\\b\\n", L"C:\\a\\b\\m", L"C:\\a\\x"}, L"C:\\a"},
-        {{deep + L"\\n", deep + L"\\m"}, deep},
-    };
-    for (const auto& [paths, prefix] : cases)
-        EXPECT_TRUE(commonPrefix(paths).IsSameAs(prefix, false)) << commonPrefix(paths) << " for " << prefix;
+    EXPECT_EQ(commonPrefix({}), L"");
+    EXPECT_EQ(commonPrefix({L"C:\\a\\xx", L"C:\\a\\xy"}), L"C:\\a");
+    EXPECT_EQ(commonPrefix({L"C:\\a", L"C:\\a\\X"}), L"C:\\a");
+    EXPECT_EQ(commonPrefix({L"C:\\n", L"D:\\n"}), L"");
+    EXPECT_EQ(commonPrefix({L"C:\\a\\b\\n", L"C:\\a\\b\\m", L"C:\\a\\x"}), L"C:\\a");
+    EXPECT_EQ(commonPrefix({deep + L"\\n", deep + L"\\m"}), deep);
 }
 
 // In folder "f" there is a file, and it and one deeper are backed up. Folder "t" is for the targets.
@@ -155,11 +146,8 @@ TEST_F(VersionsDialogTest, StoresWhatTheAnswersSay)
             EXPECT_TRUE(each == IDOK || controlText(box, 0xFFFF).find(question) != std::wstring::npos);
             each == kCloseWindow ? PostMessageW(dialog, WM_CLOSE, 0, 0) : click(box, each);
         }
-        EXPECT_TRUE(waitUntil([&] { return !IsWindow(dialog); }));
-        const auto progress = RestoreProgressWindow::current();
-        EXPECT_EQ(progress != nullptr, *request != 0);
-        if (progress && waitUntil([&] { return progress->dialog() != nullptr; }))
-            PostMessageW(progress->dialog(), WM_CLOSE, 0, 0);
+        if (*request)
+            PostMessageW(waitDialog(L"Restoring..."), WM_CLOSE, 0, 0);
         waitForThreads();
         // Source, time, attributes, target, overwrite; relative to the folder.
         DbQuery stored = database.execQuery("SELECT ifnull(group_concat(manifest_path || ' ' || timestamp || ' ' || "
@@ -173,6 +161,77 @@ TEST_F(VersionsDialogTest, StoresWhatTheAnswersSay)
         database.execDML("DELETE FROM restore_files");
         EXPECT_EQ(std::filesystem::current_path(), currentFolder) << "of the host";
     }
+}
+
+using PropertyPageTest = UiTest;
+
+HPROPSHEETPAGE pageFor(const PathSet& paths, bool isAccepted = true)
+{
+    HPROPSHEETPAGE page = nullptr;
+    addPropertyPage({paths, {}, {}, false, {}},
+                    Manifest::parse(L"FILES\nC:\\f\n5:5:5:5:0::0:0\n\nC:\\gone\n5:5:5:5:0::0:0\n6:5:5:-1:0::0:0"),
+                    takePage, isAccepted ? reinterpret_cast<LPARAM>(&page) : 0);
+    return page;
+}
+
+HWND openSheet(HWND owner = nullptr)
+{
+    HPROPSHEETPAGE page = pageFor({L"C:\\f"});
+    PROPSHEETHEADERW header{sizeof(header), PSH_MODELESS, owner, nullptr, {}, nullptr, 1, {}, {}, nullptr, {}, {}, {}};
+    header.phpage = &page;
+    return reinterpret_cast<HWND>(PropertySheetW(&header));
+}
+
+// Wine ignores the page's reference counter. Windows adds one to each module count below while its page exists.
+TEST_F(PropertyPageTest, IsOfferedForABackedUpFileAndDestroyedOnce)
+{
+    for (const auto& [paths, count] :
+         {std::pair<PathSet, int>({L"C:\\"}, 0), {{L"C:\\gone"}, 0}, {{L"C:\\none", L"C:\\f"}, 1}}) {
+        const HPROPSHEETPAGE page = pageFor(paths);
+        EXPECT_EQ(moduleRefCount(), count);
+        DestroyPropertySheetPage(page);
+        EXPECT_EQ(moduleRefCount(), 0);
+    }
+    pageFor({L"C:\\f"}, false);
+    addPropertyPage(Selection(), ManifestRef(), takePage, 0);
+    EXPECT_EQ(moduleRefCount(), 0);
+}
+
+TEST_F(PropertyPageTest, EndsWithItsSheetAndNotBefore)
+{
+    for (const auto& [end, parameter] : {std::pair(WM_COMMAND, IDCANCEL), {PSM_PRESSBUTTON, PSBTN_OK}}) {
+        const HWND sheet = openSheet(), page = PropSheet_GetCurrentPageHwnd(sheet);
+        EXPECT_EQ(ListView_GetItemCount(GetDlgItem(page, TAVI_VERSIONS_LIST)), 1);
+        PostMessageW(page, WM_CLOSE, 0, 0); // must do nothing
+        PostMessageW(end == WM_COMMAND ? page : sheet, UINT(end), WPARAM(parameter), 0);
+        MSG message;
+        EXPECT_TRUE(waitUntil([&] {
+            EXPECT_TRUE(IsWindow(page));
+            if (PeekMessageW(&message, nullptr, 0, 0, PM_REMOVE))
+                DispatchMessageW(&message);
+            return !PropSheet_GetCurrentPageHwnd(sheet);
+        })) << "the sheet ends";
+        EXPECT_EQ(moduleRefCount(), 1);
+        DestroyWindow(sheet);
+        EXPECT_EQ(moduleRefCount(), 0) << end;
+        EXPECT_FALSE(PeekMessageW(&message, nullptr, WM_QUIT, WM_QUIT, PM_REMOVE)) << "the thread goes on";
+    }
+}
+
+TEST_F(PropertyPageTest, CountsUntilItsLastFrameHasReturned)
+{
+    const HWND owner = CreateWindowW(L"STATIC", L"", WS_POPUP, 0, 0, 9, 9, nullptr, nullptr, nullptr, nullptr);
+    const HWND page = PropSheet_GetCurrentPageHwnd(openSheet(owner));
+    std::thread host([&, thread = GetCurrentThreadId()] {
+        waitDialog(L"Tavi Remote Backup");
+        SendMessageW(owner, WM_CLOSE, 0, 0); // destroys the sheet
+        EXPECT_EQ(moduleRefCount(), 1) << "the frames of the question";
+        PostThreadMessageW(thread, WM_NULL, 0, 0); // wakes the question's message loop
+    });
+    SendMessageW(page, WM_COMMAND, TAVI_VERSIONS_RESTORE, 0);
+    host.join();
+    EXPECT_FALSE(IsWindow(page));
+    EXPECT_EQ(moduleRefCount(), 0);
 }
 
 } // namespace
