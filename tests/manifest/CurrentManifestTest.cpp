@@ -4,24 +4,21 @@
 
 #include <malloc.h>
 
-#include "tests/support/Counts.h"
 #include "tests/support/Dialogs.h"
+#include "tools/filemanager/Counts.h"
 
 namespace tavi {
 namespace {
 
 using namespace test;
 
-struct CurrentManifestTest : UiTest {};
+using CurrentManifestTest = UiTest;
 
-bool isLoaded()
-{
-    return static_cast<bool>(getCurrentManifest());
-}
+const auto isLoaded = [] { return static_cast<bool>(getCurrentManifest()); };
 
 TEST_F(CurrentManifestTest, IsNullAtOnceUntilOneWatcherHasLoadedIt)
 {
-    const std::size_t threads = countThreads();
+    const int threads = filemanager::threadCount();
     DbConnection database = service.database(L"tavistate.dat");
     database.execDML("BEGIN EXCLUSIVE"); // holds up the load
     std::vector<std::thread> callers(8);
@@ -29,7 +26,7 @@ TEST_F(CurrentManifestTest, IsNullAtOnceUntilOneWatcherHasLoadedIt)
         caller = std::thread([] { EXPECT_FALSE(isLoaded()); });
     for (std::thread& caller : callers)
         caller.join();
-    EXPECT_TRUE(waitUntil([&] { return countThreads() == threads + 1; }));
+    EXPECT_TRUE(waitUntil([&] { return filemanager::threadCount() == threads + 1; }));
     database.execDML("COMMIT");
     EXPECT_TRUE(waitUntil(isLoaded));
     stopManifestWatcher(); // takes the mutex of the start for this thread

@@ -1,12 +1,13 @@
 #include <fstream>
 
-#include "tests/support/Counts.h"
 #include "tests/support/LoadedModule.h"
 #include "tests/support/Pipes.h"
+#include "tools/filemanager/Counts.h"
 #include "ui/PropertyPage.h"
 
 using namespace tavi;
 using namespace tavi::test;
+using namespace filemanager;
 using ExportsTest = HostTest;
 
 TEST_F(ExportsTest, OfferTheModulesClassesAndTheirInterfacesOnly)
@@ -30,12 +31,8 @@ TEST_F(ExportsTest, OfferTheModulesClassesAndTheirInterfacesOnly)
         EXPECT_EQ(module.canUnload(), S_FALSE);
     }
     EXPECT_EQ(module.canUnload(), S_OK) << "a refused object or a lock counts";
-}
-
-TEST_F(ExportsTest, LeaveNothingOfAnObjectThatCannotBeCreated)
-{
-    LoadedModule module;
-    void* object = &module;
+    // An object that cannot be created.
+    object = &module;
     service.install().SetValue(L"ConfigPath", wxString(L"C:\\no such folder"));
     RefPtr<IClassFactory> factory;
     module.classObject(ShellExt::kClassId, IID_IClassFactory, factory.outVoid());
@@ -48,19 +45,19 @@ TEST_F(ExportsTest, LeaveNothingOfAnObjectThatCannotBeCreated)
 
 TEST_F(ExportsTest, KeepTheThreadsRunningForAnObjectAndServeAHostThatGoesOnWithoutOne)
 {
-    const std::size_t threads = countThreads();
+    const int threads = threadCount();
     const PipeServer servers[] = {{kStatus, PIPE_ACCESS_OUTBOUND, 2}, {kStatus, PIPE_ACCESS_OUTBOUND, 2}};
     LoadedModule module;
     ASSERT_TRUE(servers[0].waitClient());
     for (const CLSID& classId : {ShellExt::kClassId, StubFolder::kClassId}) {
         const auto object = module.object<IUnknown>(classId, IID_IUnknown);
-        const std::size_t running = countThreads();
+        const int running = threadCount();
         EXPECT_EQ(module.canUnload(), S_FALSE);
         Sleep(700); // a thread that was asked to stop has ended
-        EXPECT_EQ(countThreads(), running);
+        EXPECT_EQ(threadCount(), running);
     }
     EXPECT_EQ(module.canUnload(), S_OK);
-    EXPECT_TRUE(waitUntil([&] { return countThreads() == threads; })) << "a thread has not ended";
+    EXPECT_TRUE(waitUntil([&] { return threadCount() == threads; })) << "a thread has not ended";
     module.object<IUnknown>(ShellExt::kClassId, IID_IUnknown);
     EXPECT_TRUE(servers[1].waitClient());
 }
@@ -69,11 +66,12 @@ TEST_F(ExportsTest, LeaveNothingBehindInTwentyRoundsOfLoadAndUnload)
 {
     // Wine's printing library, which the common dialogs load, leaves a mutex behind at each of its own unloads.
     const HMODULE dialogs = LoadLibraryW(L"comdlg32.dll");
-    Counts before;
-    const std::size_t threads = countThreads();
+    const auto counts = [] { return objectCounts().substr(0, objectCounts().find(L", memory")); };
+    std::wstring before;
+    const int threads = threadCount();
     for (int round = -3; round < 20; ++round) { // the first three warm up
         if (round == 0)
-            before = countNow();
+            before = counts();
         {
             LoadedModule module;
             const auto menu = module.object<IContextMenu>(ShellExt::kClassId, IID_IContextMenu);
@@ -82,9 +80,9 @@ TEST_F(ExportsTest, LeaveNothingBehindInTwentyRoundsOfLoadAndUnload)
             EXPECT_TRUE(hasCommand() || round % 2 != 0 || waitUntil(hasCommand));
         }
         // The thread that unmapped the module needs a moment more.
-        ASSERT_TRUE(waitUntil([&] { return countThreads() == threads; })) << "round " << round;
+        ASSERT_TRUE(waitUntil([&] { return threadCount() == threads; })) << "round " << round;
     }
-    EXPECT_EQ(countNow(), before);
+    EXPECT_EQ(counts(), before);
     FreeLibrary(dialogs);
 }
 
@@ -104,10 +102,8 @@ TEST_F(ExportsTest, LetComUnloadTheModuleAtTheEndOfAPage)
     HPROPSHEETPAGE page = nullptr;
     addPropertyPage({{L"C:\\f"}, {}, {}, false, {}}, Manifest::parse(L"FILES\nC:\\f\n1:1:1:1:0::0:0"), takePage,
                     reinterpret_cast<LPARAM>(&page));
-    EXPECT_TRUE(GetModuleHandleW(L"tavishell.dll"));
+    findFunction(GetModuleHandleW(L"tavishell.dll"), "DllUnregisterServer", remove);
+    EXPECT_EQ(remove(), HRESULT{ERROR_FILE_NOT_FOUND}) << "the code of the system as it is";
     DestroyPropertySheetPage(page);
     EXPECT_TRUE(waitUntil([] { return !GetModuleHandleW(L"tavishell.dll"); }));
-    const LoadedModule module;
-    findFunction(module.module, "DllUnregisterServer", remove);
-    EXPECT_EQ(remove(), HRESULT{ERROR_FILE_NOT_FOUND}) << "the code of the system as it is";
 }

@@ -3,8 +3,8 @@
 #include <process.h>
 
 #include "tests/support/Allocations.h"
-#include "tests/support/Counts.h"
 #include "tests/support/LoadedModule.h"
+#include "tools/filemanager/Counts.h"
 
 using namespace tavi;
 using namespace tavi::test;
@@ -20,16 +20,14 @@ TEST_F(LifecycleTest, AdmitsProgramsByTheBeginningOfTheirName)
         for (const wchar_t* path : paths)
             EXPECT_EQ(hostKindOf(path), kind) << path;
     }
-    EXPECT_TRUE(!LoadLibraryW(modulePath().c_str()) && GetLastError() == ERROR_DLL_INIT_FAILED);
+    EXPECT_FALSE(LoadLibraryW(modulePath().c_str()));
+    EXPECT_EQ(GetLastError(), DWORD{ERROR_DLL_INIT_FAILED});
 }
 
 TEST_F(LifecycleTest, AttachesWithoutALogIfMemoryRunsOut)
 {
     const HINSTANCE program = GetModuleHandleW(nullptr);
-    {
-        const FailingAllocations all(0);
-        attachToFileManager(program, L"C:\\explorer.exe");
-    }
+    FailingAllocations(0), attachToFileManager(program, L"C:\\explorer.exe");
     EXPECT_EQ(moduleInstance(), program);
     EXPECT_TRUE(shellAllocator());
     detachFromFileManager(false);
@@ -47,9 +45,9 @@ TEST_F(LifecycleTest, GivesAToolTheClassesAndNothingElse)
         service.install().Create();
         return;
     }
-    const std::size_t before = countThreads();
+    const int before = filemanager::threadCount();
     const LoadedModule module;
     module.object<IContextMenu>(ShellExt::kClassId, IID_IContextMenu);
-    EXPECT_EQ(countThreads(), before);
+    EXPECT_EQ(filemanager::threadCount(), before);
     EXPECT_EQ(GetFileAttributesW(service.file(L"tavi.log").c_str()), INVALID_FILE_ATTRIBUTES);
 }

@@ -55,17 +55,6 @@ DWORD handles()
     return count;
 }
 
-int threads()
-{
-    const tools::Handle snapshot(CreateToolhelp32Snapshot(TH32CS_SNAPTHREAD, 0));
-    THREADENTRY32 entry = {};
-    entry.dwSize = sizeof entry;
-    int count = 0;
-    for (BOOL more = Thread32First(snapshot.get(), &entry); more; more = Thread32Next(snapshot.get(), &entry))
-        count += entry.th32OwnerProcessID == GetCurrentProcessId();
-    return count;
-}
-
 SIZE_T privateKilobytes()
 {
     PROCESS_MEMORY_COUNTERS memory = {};
@@ -91,10 +80,21 @@ void CALLBACK countUnload(ULONG reason, const LibraryNotice* notice, void*)
 
 } // namespace
 
+int threadCount()
+{
+    const tools::Handle snapshot(CreateToolhelp32Snapshot(TH32CS_SNAPTHREAD, 0));
+    THREADENTRY32 entry = {};
+    entry.dwSize = sizeof entry;
+    int count = 0;
+    for (BOOL more = Thread32First(snapshot.get(), &entry); more; more = Thread32Next(snapshot.get(), &entry))
+        count += entry.th32OwnerProcessID == GetCurrentProcessId();
+    return count;
+}
+
 std::wstring objectCounts()
 {
     return L"handles " + std::to_wstring(handles()) + L", gdi " + std::to_wstring(gdiObjects()) + L", threads " +
-           std::to_wstring(threads()) + L", memory " + std::to_wstring(privateKilobytes()) + L" KB, unloads " +
+           std::to_wstring(threadCount()) + L", memory " + std::to_wstring(privateKilobytes()) + L" KB, unloads " +
            std::to_wstring(timesUnmapped);
 }
 

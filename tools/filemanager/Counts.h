@@ -4,6 +4,9 @@
 
 namespace filemanager {
 
+// The threads of this process.
+int threadCount();
+
 // Returns this process's handles, GDI objects, threads, private memory and unloads of the watched library as one line.
 std::wstring objectCounts();
 
