@@ -1,30 +1,22 @@
 #include "core/BackgroundThread.h"
 
-#include <gtest/gtest.h>
 #include <wx/log.h>
 
-#include "core/Handles.h"
+#include "tests/support/Dialogs.h"
 
 using namespace tavi;
+using namespace tavi::test;
 
 namespace {
 
-std::atomic<int> bodies{0};
+std::atomic<int> entered{0}, left{0};
 std::atomic<DWORD> thread{0};
 std::atomic<bool> sawStop{false};
-const KernelHandle entered(CreateSemaphoreW(nullptr, 0, 100, nullptr));
-const KernelHandle leave(CreateSemaphoreW(nullptr, 0, 100, nullptr));
-
-bool waitFor(const KernelHandle& handle)
-{
-    return WaitForSingleObject(handle.get(), 60000) == WAIT_OBJECT_0;
-}
 
 BackgroundThread subject("test", [](const BackgroundThread& self) {
     thread = GetCurrentThreadId();
-    const int body = ++bodies;
-    ReleaseSemaphore(entered.get(), 1, nullptr);
-    waitFor(leave);
+    const int body = ++entered;
+    EXPECT_TRUE(waitUntil([&] { return left == body; }));
     sawStop = self.isStopping();
     if (body == 3)
         throw 1;
@@ -34,8 +26,8 @@ BackgroundThread subject("test", [](const BackgroundThread& self) {
 void expectEnd()
 {
     const KernelHandle ended(subject.releaseHandle());
-    ReleaseSemaphore(leave.get(), 1, nullptr);
-    EXPECT_TRUE(waitFor(ended));
+    left = entered.load();
+    EXPECT_EQ(WaitForSingleObject(ended.get(), 60000), WAIT_OBJECT_0);
     EXPECT_FALSE(subject.isActive());
 }
 
@@ -43,24 +35,24 @@ TEST(BackgroundThread, RunsOnceUntilItIsStoppedOrThrows)
 {
     const wxLogNull quiet;
     subject.start();
-    EXPECT_TRUE(waitFor(entered));
+    EXPECT_TRUE(waitUntil([] { return entered == 1; }));
     const DWORD first = thread;
     subject.requestStop();
     subject.start();
     EXPECT_FALSE(subject.isStopping());
-    ReleaseSemaphore(leave.get(), 1, nullptr);
-    EXPECT_TRUE(waitFor(entered)) << "a withdrawn stop runs the body again";
+    left = 1;
+    EXPECT_TRUE(waitUntil([] { return entered == 2; })) << "a withdrawn stop runs the body again";
     EXPECT_FALSE(sawStop);
     EXPECT_EQ(thread, first) << "a second thread would compete with the first";
     subject.start();
     subject.requestStop();
     expectEnd();
     EXPECT_TRUE(sawStop);
-    EXPECT_EQ(bodies, 2);
+    EXPECT_EQ(entered, 2);
     subject.requestStop(); // nothing to stop
     EXPECT_FALSE(subject.isStopping());
     subject.start();
-    EXPECT_TRUE(waitFor(entered));
+    EXPECT_TRUE(waitUntil([] { return entered == 3; }));
     expectEnd();
 }
 

@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include "core/Boundary.h"
+#include "core/Log.h"
 #include "tests/support/Allocations.h"
 #include "tests/support/LogCapture.h"
 #include "tests/support/Registry.h"
@@ -38,11 +39,13 @@ TEST_F(Options, AndPathsAreReadOrGivenUpWhereMemoryRunsOut)
     settings.SetValue(L"options.manifestmtime", wxString(L"1970-01-02 00:00:01"));
     std::optional<std::int64_t> time;
     wxString path;
+    ASSERT_TRUE(openLog(3)); // whose lines need no memory
     for (int succeeding = 0; path.empty() && succeeding < 1000; ++succeeding) {
         const test::FailingAllocations few(succeeding);
         guarded("time", [&] { time = readManifestTime(); });
         guarded("path", [&] { path = getDataFilePath(DataFile::log); });
     }
+    closeLog();
     EXPECT_EQ(time, 86401000);
     EXPECT_EQ(path, service.file(L"tavi.log"));
     EXPECT_TRUE(settings.HasValue(L"options.manifestmtime"));

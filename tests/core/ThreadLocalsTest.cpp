@@ -6,6 +6,8 @@
 #include <malloc.h>
 #include <gtest/gtest.h>
 
+#include "core/RuntimeCleanup.h"
+
 alignas(64) thread_local int counted = 7;
 
 TEST(ThreadLocals, BelongToTheirThreadAndAreFreedWithIt)
@@ -28,4 +30,14 @@ TEST(ThreadLocals, BelongToTheirThreadAndAreFreedWithIt)
         before = i == 0 ? busyBlocks() : before; // the runtime allocates some blocks once
     }
     EXPECT_LT(busyBlocks(), before + 50);
+}
+
+TEST(ThreadLocals, StayWhileAnExceptionIsInFlight)
+{
+    try {
+        throw 1;
+    } catch (...) {
+        tavi::releaseThreadRuntime();
+        EXPECT_TRUE(std::current_exception());
+    }
 }

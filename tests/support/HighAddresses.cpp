@@ -6,13 +6,9 @@
 
 #include <windows.h>
 
-static bool isLow(const void* pointer)
-{
-    return reinterpret_cast<std::uintptr_t>(pointer) >> 32 == 0;
-}
-
 [[gnu::constructor]] static void takeLowAddresses()
 {
+    const auto isLow = [](const void* pointer) { return reinterpret_cast<std::uintptr_t>(pointer) >> 32 == 0; };
     // Address space is reserved in units of 64 KB.
     for (std::size_t size = std::size_t{1} << 31; size >= 0x10000; size /= 2) {
         while (isLow(VirtualAlloc(nullptr, size, MEM_RESERVE, PAGE_NOACCESS))) {
