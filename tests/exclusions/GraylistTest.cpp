@@ -2,11 +2,11 @@
 
 #include <future>
 
+#include <malloc.h>
 #include <gtest/gtest.h>
 
 #include "core/Options.h"
 #include "exclusions/UserProfiles.h"
-#include "tests/support/Allocations.h"
 #include "tests/support/LogCapture.h"
 #include "tests/support/Registry.h"
 
@@ -105,11 +105,11 @@ TEST_F(Graylists, AreBuiltOneAtATimeAndPublishedBeforeTheHivesAreUnloaded)
     EXPECT_EQ(log.take().back(), "1: Error: Unable to unload temp reg hive " + toUtf8(hive) + ": 2");
     // The waiter has no reference: the builder's and the published one are the last.
     EXPECT_EQ(waiter.get(), built);
-    FailingAllocations::watched = built;
+    const auto isFreed = [&] { return !HeapValidate(reinterpret_cast<HANDLE>(_get_heap_handle()), 0, built); };
     built->Release();
-    EXPECT_EQ(FailingAllocations::watched, built);
+    EXPECT_FALSE(isFreed());
     dropGraylist();
-    EXPECT_EQ(FailingAllocations::watched, nullptr);
+    EXPECT_TRUE(isFreed());
 }
 
 } // namespace
