@@ -49,18 +49,6 @@ TEST_F(RestoreRequests, AreStoredWithTheirFiles)
               1);
 }
 
-TEST_F(RestoreRequests, AreRolledBackAfterAFailureOfAnyKind)
-{
-    // ROLLBACK: SQLite has ended the transaction by itself.
-    for (const char* const failure : {"ABORT", "ROLLBACK"}) {
-        database.execDML("CREATE TRIGGER t BEFORE INSERT ON restore_files WHEN new.file_size=6 BEGIN SELECT RAISE(" +
-                         wxString(failure) + ",'no'); END");
-        EXPECT_EQ(perform(), "1: Error: Error requesting restore: DB_CONSTRAINT[19]: no");
-        database.execDML("DROP TRIGGER t");
-        EXPECT_EQ(count(), 0) << failure;
-    }
-}
-
 TEST_F(RestoreRequests, WaitAMinuteForOtherTransactions)
 {
     static int waited;

@@ -63,7 +63,6 @@ TEST(Database, ReadsRowsAndKeepsBindings)
     insert.execDML(); // the last binding again
     insert.bind(1, std::int64_t{0x7FFFFFFFFFFFFFFF});
     EXPECT_EQ(insert.execDML(), 1);
-    EXPECT_EQ(connection.lastRowId(), 3);
     EXPECT_EQ(connection.execDML("INSERT INTO t(b) VALUES(''),(NULL),(x'6100C3A9')"), 3);
     DbQuery rows = connection.execQuery("SELECT b FROM t ORDER BY a");
     const std::pair<int, std::string> expected[] = {
@@ -96,12 +95,6 @@ TEST(Database, TransactionsLockByTheirModeAndEndWithTheirScope)
             EXPECT_TRUE(Transaction(other, TransactionMode::immediate).rollback()) << mode;
         connection.execDML("INSERT INTO t DEFAULT VALUES");
     }
-    {
-        Transaction transaction(connection);
-        connection.execDML("INSERT INTO t DEFAULT VALUES");
-        transaction.commit();
-    }
-    EXPECT_TRUE(other.execQuery("SELECT * FROM t").nextRow());
     connection.close();
     other.close();
     std::filesystem::remove(file);
