@@ -34,8 +34,8 @@ struct LoadedModule {
     {
         RefPtr<IClassFactory> factory;
         RefPtr<Interface> made;
-        EXPECT_TRUE(classObject(classId, IID_IClassFactory, factory.outVoid()) == S_OK &&
-                    factory->CreateInstance(nullptr, interfaceId, made.outVoid()) == S_OK);
+        EXPECT_EQ(classObject(classId, IID_IClassFactory, factory.outVoid()), S_OK);
+        EXPECT_EQ(factory->CreateInstance(nullptr, interfaceId, made.outVoid()), S_OK);
         return made;
     }
 
