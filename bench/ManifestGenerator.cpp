@@ -115,7 +115,7 @@ ManifestRef checked(ManifestRef manifest, std::uint32_t files)
 ManifestRef loadSet(const std::string& file, std::uint32_t files)
 {
     const std::vector<char> blob = readBlob(file);
-    return checked(parseStoredManifest(piecesOf(blob)), files);
+    return checked(parseStoredManifest(piecesOf({blob.data(), blob.size()})), files);
 }
 
 } // namespace tavi::bench

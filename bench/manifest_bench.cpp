@@ -49,7 +49,8 @@ void loadFigures(Bench& bench, std::uint32_t files, FileOrder order)
 {
     const StoredText text = storedText(bench.dataFolder, files, order);
     std::vector<char> blob = readBlob(text.file);
-    const auto load = [&] { return checked(parseStoredManifest(piecesOf(blob)), files); };
+    const BlobPieces pieces = piecesOf({blob.data(), blob.size()});
+    const auto load = [&] { return checked(parseStoredManifest(pieces), files); };
     const auto times = loadTimes(bench, text, blob, load);
     bench.report("blob to manifest / inflating" + text.title, times[1] / times[0], order == FileOrder::walk ? 1.6 : 1.8,
                  "x");
