@@ -114,8 +114,10 @@ ManifestRef checked(ManifestRef manifest, std::uint32_t files)
 
 ManifestRef loadSet(const std::string& file, std::uint32_t files)
 {
-    const std::vector<char> blob = readBlob(file);
-    return checked(parseStoredManifest(piecesOf({blob.data(), blob.size()})), files);
+    std::vector<char> blob = readBlob(file);
+    const BlobPieces pieces = piecesOf({blob.data(), blob.size()});
+    blob = {};
+    return checked(parseStoredManifest(pieces), files);
 }
 
 } // namespace tavi::bench
