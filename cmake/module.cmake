@@ -60,6 +60,7 @@ else()
 endif()
 set_property(SOURCE src/ui/tavishell.rc APPEND PROPERTY OBJECT_DEPENDS "${resource_files}")
 target_include_directories(tavishell PRIVATE ${resource_folder})
+add_dependencies(tavishell tavi_version)
 target_link_libraries(tavishell PRIVATE tavi_product tavi_warnings)
 
 # Built by scripts/check only: each header in a source of its own, which shows that it compiles alone.

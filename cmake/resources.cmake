@@ -5,7 +5,9 @@ find_program(ICOTOOL icotool REQUIRED)
 
 set(resource_folder ${CMAKE_BINARY_DIR}/resources)
 file(MAKE_DIRECTORY ${resource_folder})
-configure_file(cmake/version.h.in ${resource_folder}/version.h @ONLY)
+add_custom_target(tavi_version BYPRODUCTS ${resource_folder}/version.h
+    COMMAND ${CMAKE_COMMAND} -DSOURCE=${CMAKE_SOURCE_DIR} -DVERSION=${PROJECT_VERSION} -DOUT=${resource_folder}/version.h
+        -P ${CMAKE_SOURCE_DIR}/cmake/version.cmake VERBATIM)
 configure_file(src/ui/module.manifest.in ${resource_folder}/module.manifest @ONLY)
 set(resource_files ${resource_folder}/module.manifest ${resource_folder}/version.h ${CMAKE_SOURCE_DIR}/src/ui/resource.h)
 # 13, 15 and 19 are check-mark sizes of menus.
@@ -45,3 +47,4 @@ foreach(source IN LISTS icon_sources)
     list(APPEND resource_files ${icon})
 endforeach()
 add_custom_target(tavi_resources DEPENDS ${resource_files})
+add_dependencies(tavi_resources tavi_version)
