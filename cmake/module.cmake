@@ -19,7 +19,7 @@ target_compile_definitions(tavi_platform_flags INTERFACE UNICODE _UNICODE _WIN32
 file(RELATIVE_PATH to_root ${CMAKE_BINARY_DIR} ${CMAKE_SOURCE_DIR})
 target_compile_options(tavi_platform_flags INTERFACE -ffunction-sections -fdata-sections
     -ffile-prefix-map=${CMAKE_SOURCE_DIR}/= -ffile-prefix-map=${to_root}=
-    -ffile-prefix-map=${TAVI_DEPS}/=libraries/)
+    -ffile-prefix-map=${CMAKE_BINARY_DIR}=. -ffile-prefix-map=${TAVI_DEPS}/=libraries/)
 target_link_options(tavi_platform_flags INTERFACE -static -Wl,--gc-sections -Wl,--no-insert-timestamp)
 
 add_library(tavi_platform INTERFACE)
