@@ -7,6 +7,7 @@
 #include <gtest/gtest.h>
 
 #include "core/RuntimeCleanup.h"
+#include "tests/support/Allocations.h"
 
 alignas(64) thread_local int counted = 7;
 
@@ -30,6 +31,16 @@ TEST(ThreadLocals, BelongToTheirThreadAndAreFreedWithIt)
         before = i == 0 ? busyBlocks() : before; // the runtime allocates some blocks once
     }
     EXPECT_LT(busyBlocks(), before + 50);
+}
+
+TEST(ThreadLocals, ExistInAThreadWithoutMemory)
+{
+    for (int i = 0; i < 20; ++i) {
+        std::thread([] {
+            const tavi::test::FailingAllocations all(0);
+            EXPECT_EQ(++counted, 8);
+        }).join();
+    }
 }
 
 TEST(ThreadLocals, StayWhileAnExceptionIsInFlight)

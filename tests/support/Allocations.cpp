@@ -9,6 +9,11 @@ void* __wrap_malloc(std::size_t size)
 {
     return FailingAllocations::fails(Heap::c, size) ? nullptr : __real_malloc(size);
 }
+void* __real_calloc(std::size_t count, std::size_t size);
+void* __wrap_calloc(std::size_t count, std::size_t size)
+{
+    return FailingAllocations::fails(Heap::c, count * size) ? nullptr : __real_calloc(count, size);
+}
 void __real_free(void* block);
 void __wrap_free(void* block)
 {
