@@ -115,7 +115,7 @@ TEST_F(VersionsDialogTest, StoresWhatTheAnswersSay)
         {one, 1, kRestore, {kCloseWindow}, L"Restoring this file", L""},
         {whole, 0, kRestore, {IDYES}, L"they were last backed up", LR"(f\5% 100 32 f\5% 1;f\b\c 100 0 f\b\c 1)"},
         // The save box itself asks about an existing file.
-        {one, 1, kCopy, {IDOK, IDYES}, L"", LR"(f\5% 200 33 t\was 1)"},
+        {one, 1, kCopy, {IDOK, IDYES}, L"already exists", LR"(f\5% 200 33 t\was 1)"},
         {one, 1, kCopy, {IDCANCEL}, L"", L""},
         {fresh, 0, kCopy, {IDOK}, L"", LR"(f\b\c 100 0 t\\b\c 0)"},
         {several, 0, kCopy, {IDOK, IDYES}, L"already exist", LR"(f\5% 100 32 t\\5% 1;f\b\c 100 0 t\\b\c 1)"},
@@ -202,9 +202,10 @@ TEST_F(PropertyPageTest, EndsWithItsSheetAndNotBefore)
     for (const auto& [end, parameter] : {std::pair(WM_COMMAND, IDCANCEL), {PSM_PRESSBUTTON, PSBTN_OK}}) {
         const HWND sheet = openSheet(), page = PropSheet_GetCurrentPageHwnd(sheet);
         EXPECT_EQ(ListView_GetItemCount(GetDlgItem(page, TAVI_VERSIONS_LIST)), 1);
-        PostMessageW(page, WM_CLOSE, 0, 0); // must do nothing
-        PostMessageW(end == WM_COMMAND ? page : sheet, UINT(end), WPARAM(parameter), 0);
         MSG message;
+        SendMessageW(page, WM_CLOSE, 0, 0);
+        EXPECT_FALSE(PeekMessageW(&message, page, WM_COMMAND, WM_COMMAND, PM_REMOVE)) << "it is no Cancel";
+        PostMessageW(end == WM_COMMAND ? page : sheet, UINT(end), WPARAM(parameter), 0);
         EXPECT_TRUE(waitUntil([&] {
             EXPECT_TRUE(IsWindow(page));
             if (PeekMessageW(&message, nullptr, 0, 0, PM_REMOVE))
@@ -214,7 +215,6 @@ TEST_F(PropertyPageTest, EndsWithItsSheetAndNotBefore)
         EXPECT_EQ(moduleRefCount(), 1);
         DestroyWindow(sheet);
         EXPECT_EQ(moduleRefCount(), 0) << end;
-        EXPECT_FALSE(PeekMessageW(&message, nullptr, WM_QUIT, WM_QUIT, PM_REMOVE)) << "the thread goes on";
     }
 }
 
@@ -223,11 +223,16 @@ TEST_F(PropertyPageTest, CountsUntilItsLastFrameHasReturned)
     const HWND owner = CreateWindowW(L"STATIC", L"", WS_POPUP, 0, 0, 9, 9, nullptr, nullptr, nullptr, nullptr);
     const HWND page = PropSheet_GetCurrentPageHwnd(openSheet(owner));
     std::thread host([&, thread = GetCurrentThreadId()] {
-        waitDialog(L"Tavi Remote Backup");
+        const HWND first = waitDialog(L"Tavi Remote Backup");
+        click(first, IDCANCEL);
+        waitDialog(L"Tavi Remote Backup", first);
         SendMessageW(owner, WM_CLOSE, 0, 0); // destroys the sheet
         EXPECT_EQ(moduleRefCount(), 1) << "the frames of the question";
         PostThreadMessageW(thread, WM_NULL, 0, 0); // wakes the question's message loop
     });
+    SendMessageW(page, WM_COMMAND, TAVI_VERSIONS_RESTORE, 0);
+    MSG message;
+    EXPECT_FALSE(PeekMessageW(&message, GetParent(page), PSM_PRESSBUTTON, PSM_PRESSBUTTON, PM_REMOVE)) << "no Cancel";
     SendMessageW(page, WM_COMMAND, TAVI_VERSIONS_RESTORE, 0);
     host.join();
     EXPECT_FALSE(IsWindow(page));
