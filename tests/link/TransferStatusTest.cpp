@@ -162,9 +162,10 @@ TEST(RateRing, CountsTheSamplesSinceTheLastClearOnceTheyAreStored)
             addAfterAMillisecond(i);
     });
     int wrong = 0;
-    for (unsigned before = 0; (before = added) < 600000;) {
-        if (before % 4 == 0)
+    for (unsigned i = 0, before = 0; before < 600000; ++i) {
+        if (i % 8 == 0)
             ring.clearRing();
+        before = added;
         const double rate = ring.rateOver(2);
         wrong += rate != 0 && rate < before - 1.0 ? 1 : 0;
     }

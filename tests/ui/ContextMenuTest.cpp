@@ -40,7 +40,6 @@ TEST_F(ContextMenuTest, CopiesVerbsAndHelpTextsAndInvokesByOffset)
     const std::tuple<UINT, UINT, const Selection&, UINT, HRESULT, wxString> cases[] = {
         {1, GCS_VERBW, kFile, 11, S_OK, L"TaviBackup"},
         {2, GCS_VERBA, kFile, 14, HRESULT(0x8007007A), L"TaviDontBacku"},
-        {0, GCS_VERBW, kFile, 0, E_INVALIDARG, L"?"},
         {0, GCS_HELPTEXTW, kFile, 100, S_OK, L"Restore an older version of 50%s & more.txt from the Tavi servers."},
         {0, GCS_HELPTEXTA, kFolder, 22, HRESULT(0x8007007A), L"Restore files in caf\u00e9"},
         {1, GCS_VALIDATEW, kFile, 100, S_OK, L"?"},
