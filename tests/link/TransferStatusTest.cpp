@@ -47,7 +47,6 @@ TEST(TransferStatus, MessagesChangeTheirFieldsOnly)
     const auto snapshot = [](std::uint32_t state) { return std::make_shared<SnapshotMessage>(state, 5, 2, 3, 4); };
     std::vector<std::pair<std::shared_ptr<PipeMessage>, std::string>> cases = {
         {event(E::backupReset), restore},
-        {event(E::backupEnded0), "ended " + restore},
         {event(E::backupEnded2), "ended " + restore},
         {event(E::backupEnded10, 7), "ended 10 mark totalA=7 totalB=7 " + restore},
         {event(E::doneB, 90), backup + restore}, // beyond the total

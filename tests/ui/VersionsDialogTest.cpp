@@ -56,6 +56,7 @@ TEST_F(VersionsDialogTest, ListsEachRunOnceAndSelectsTheNewest)
         open(paths, hasFolder, files);
         const wxString message = controlText(dialog, TAVI_VERSIONS_MESSAGE);
         EXPECT_TRUE(message.Matches(L"The following versions of " + pattern)) << message;
+        EXPECT_LT(message.length(), 250u);
         EXPECT_EQ(controlText(dialog, TAVI_VERSIONS_LABEL), hasFolder ? L"Available &Versions:" : L"File &Versions:");
         EXPECT_EQ(ListView_GetItemCount(list), rows);
         EXPECT_EQ(ListView_GetNextItem(list, -1, LVNI_SELECTED), selected);
