@@ -106,8 +106,7 @@ TEST_F(VersionsDialogTest, StoresWhatTheAnswersSay)
     const PathSet one = {in(L"f\\5%")}, whole = {in(L"f")}, several = {in(L"f\\5%"), in(L"f\\b")},
                   fresh = {in(L"f\\b"), in(L"f\\x")};
     const auto currentFolder = std::filesystem::current_path();
-    // The selection, the row, the button, the answer to each box, words of the last question, the request. A chosen
-    // folder ends in a backslash; the rest of a path below it begins with one.
+    // The selection, row, button, answers, words of the last question, request. A chosen folder ends in a backslash.
     const std::tuple<const PathSet&, int, int, std::vector<int>, const wchar_t*, const wchar_t*> cases[] = {
         {one, 0, kRestore, {IDYES}, L"Restoring this file", LR"(f\5% 100 32 f\5% 1)"},
         {one, 1, kRestore, {IDNO}, L"Restoring this file", LR"(f\5% 200 33 f\5% (1) 0)"},
@@ -223,6 +222,7 @@ TEST_F(PropertyPageTest, CountsUntilItsLastFrameHasReturned)
     const HWND page = PropSheet_GetCurrentPageHwnd(openSheet(owner));
     std::thread host([&, thread = GetCurrentThreadId()] {
         const HWND first = waitDialog(L"Tavi Remote Backup");
+        EXPECT_TRUE(SendMessageTimeoutW(page, WM_COMMAND, TAVI_VERSIONS_RESTORE, 0, 0, 60000, nullptr)); // no other box
         click(first, IDCANCEL);
         waitDialog(L"Tavi Remote Backup", first);
         SendMessageW(owner, WM_CLOSE, 0, 0); // destroys the sheet
