@@ -191,7 +191,6 @@ TEST_F(PropertyPageTest, IsOfferedForABackedUpFileAndDestroyedOnce)
         EXPECT_EQ(moduleRefCount(), 0);
     }
     pageFor({L"C:\\f"}, false);
-    addPropertyPage(Selection(), ManifestRef(), takePage, 0);
     EXPECT_EQ(moduleRefCount(), 0);
 }
 
