@@ -102,7 +102,6 @@ TEST(MessageReader, ReadsOneFrameOrNone)
         {"a header cut short", {kHead.substr(0, 5)}, 0, false, 2, 8},
         {"no payload", {kHead}, 0, false, 2, 8},
         {"an announced length of 0", {bytes("34000000 00000000"), kBody}, 0, false, 1, 8},
-        {"an unknown type", {bytes("1e000000 14000000") + kBody}, 0, false, 1, 20},
         {"a length of 0xffffffff", {bytes("34000000 ffffffff") + kBody}, 0, true, 1, 1024},
         {"a length that is there", {bytes("34000000 00002000") + std::string(0x200000, '\0')}, 0, true, 1, 0x200000},
         {"a stop before the header", {"", kHead, kBody}, 1, false, 1, 0},

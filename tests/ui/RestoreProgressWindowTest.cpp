@@ -68,8 +68,8 @@ TEST_F(RestoreProgressWindowTest, ShowsItselfLateAndTheStatusOfEachRestoreUntilT
     EXPECT_TRUE(waitUntil([&] { return ring.rateOver(60000) > 0; }));
     dispatch(event(kItem, 0, "A"));
     EXPECT_EQ(ring.rateOver(60000), 0);
-    dispatch(event(EventType::restoreTotal, 1 << 20));
-    dispatch(event(EventType::restoreDone, 1 << 19));
+    dispatch(event(EventType::restoreTotal, 1 << 30));
+    dispatch(event(EventType::restoreDone, 1 << 29));
     dispatch(event(kItem, 0, "C:\\d\\A & B.txt"));
     EXPECT_TRUE(waitUntil([&] { return ring.rateOver(60000) > 0; })) << "only the first item clears it";
     EXPECT_TRUE(shows(L"C:\\d\\A & B.txt"));
@@ -80,7 +80,9 @@ TEST_F(RestoreProgressWindowTest, ShowsItselfLateAndTheStatusOfEachRestoreUntilT
     EXPECT_EQ(LOWORD(SendMessageW(dialog, DM_GETDEFID, 0, 0)), TAVI_PROGRESS_CANCEL);
     EXPECT_TRUE(waitUntil([&] {
         dispatch(event(EventType::restoreDone, 1)); // never a silence that outlasts the speed
-        return ticks >= 8 && controlText(dialog, TAVI_PROGRESS_SPEED) != L"0.0 b/s";
+        transferStatus().restoreRateLong = 1000;    // as after ten seconds
+        return ticks >= 8 && controlText(dialog, TAVI_PROGRESS_SPEED) != L"0.0 b/s" &&
+               controlText(dialog, TAVI_PROGRESS_REMAINING) == L"49 days, 17 hours";
     }));
     EXPECT_LE(ticks, (GetTickCount() - start) / 250 + 2);
     dispatch(event(kEnded));
