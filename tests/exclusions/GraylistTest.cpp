@@ -44,17 +44,22 @@ TEST_F(Graylists, HoldTheSystemsPlacesAndTheUsersUnlessSwitchedOff)
 {
     service.install().SetValue(L"DataPath", L"C:\\served");
     std::filesystem::create_directory(L"C:\\windows\\$tavi");
+    constexpr const wchar_t* kMemory = L"System\\CurrentControlSet\\Control\\Session Manager\\Memory Management";
+    const wchar_t files[] = L"C:\\one.sys 1 2\0C:\\two.sys 1 2\0";
+    RegSetKeyValueW(HKEY_LOCAL_MACHINE, kMemory, L"PagingFiles", REG_MULTI_SZ, files, sizeof(files));
     for (const bool keeps : {true, false}) {
         settingsKey().SetValue(L"options.graylist", long{keeps});
         getGraylist(true)->Release();
-        for (const wxString& place : {wxString(L"C:\\windows\\Temp\\x"), wxString(L"C:\\served"),
-                                      wxString(L"C:\\scratch\\x"), wxString(L"C:\\windows\\$tavi\\x")})
+        for (const wxString& place :
+             {wxString(L"C:\\windows\\Temp\\x"), wxString(L"C:\\served"), wxString(L"C:\\two.sys"),
+              wxString(L"C:\\scratch\\x"), wxString(L"C:\\windows\\$tavi\\x")})
             EXPECT_TRUE(isGrayed(place)) << place.utf8_string();
         EXPECT_EQ(isGrayed(L"C:\\windows\\notepad.exe"), !keeps);
         EXPECT_EQ(isGrayed(here), !keeps);
         EXPECT_FALSE(isGrayed(L"C:\\users"));
         EXPECT_FALSE(isGrayed(here + L"\\3\\Microsoft\\Outlook\\mail.pst"));
     }
+    RegDeleteKeyValueW(HKEY_LOCAL_MACHINE, kMemory, L"PagingFiles");
 }
 
 TEST_F(Graylists, AnswerByState)

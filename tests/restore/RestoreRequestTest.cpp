@@ -13,9 +13,9 @@ namespace {
 
 struct RestoreRequests : testing::Test {
     // Returns what was logged.
-    std::string perform(const wchar_t* selected = L"C:\\one", bool isNamed = true)
+    std::string perform(const wchar_t* selected = L"C:\\one", bool isNamed = true, bool overwrites = true)
     {
-        RestoreRequest request{{selected}, 100, L"", L"", true, L"id", L"alias", L"key"};
+        RestoreRequest request{{selected}, 100, L"", L"", overwrites, L"id", L"alias", L"key"};
         if (!isNamed)
             request.machineId = request.machineAlias = request.encryptionKey = wxString();
         performRestore(request, *manifest);
@@ -31,7 +31,8 @@ struct RestoreRequests : testing::Test {
     test::InstalledService service;
     DbConnection database = (service.createTables(), service.database(L"tavistate.dat"));
     const ManifestRef manifest =
-        Manifest::parse(L"FILES\nC:\\one\\a.txt\n100:1:4000000000:5:0:x:0:40\n\nC:\\one\\b.txt\n100:1:2:6:0:x:0:41");
+        Manifest::parse(L"FILES\nC:\\one\\a.txt\n100:1:4000000000:5:0:x:0:40\n\nC:\\one\\b.txt\n100:1:2:6:0:x:0:41\n\n"
+                        L"C:\\windows\n1:1:1:1:0::0:0\n\nC:\\windows\\none\n1:1:1:1:0::0:0");
 };
 
 TEST_F(RestoreRequests, AreStoredWithTheirFiles)
@@ -47,6 +48,10 @@ TEST_F(RestoreRequests, AreStoredWithTheirFiles)
                     "encryption_key='key' AND file_size=5 AND timestamp=100 AND ctime=-294967296 AND attributes=32 AND "
                     "manifest_path='C:\\one\\a.txt' AND target_path=manifest_path AND overwrite=1"),
               1);
+    EXPECT_EQ(perform(L"C:\\windows", true, false), "");
+    EXPECT_EQ(count("SELECT count(*) FROM restore_files WHERE overwrite=0 AND target_path=manifest_path||CASE "
+                    "manifest_path WHEN 'C:\\windows' THEN ' (1)' ELSE '' END"),
+              2);
 }
 
 TEST_F(RestoreRequests, WaitAMinuteForOtherTransactions)

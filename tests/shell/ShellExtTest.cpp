@@ -37,7 +37,7 @@ TEST_F(ShellExtTest, OffersWhatItsLastInitializeWasGiven)
     RefPtr<IUnknown> object;
     menu->QueryInterface(IID_IUnknown, object.outVoid());
     auto* const sheet = reinterpret_cast<IShellPropSheetExt*>(object.get());
-    for (const auto& [folder, used] : {std::pair(L"C:\\windows", 1), {L"C:\\windows\\system32", 0}, {nullptr, 0}}) {
+    for (const auto& [folder, used] : {std::pair(L"C:\\windows", 1), {nullptr, 0}, {L"C:\\windows\\system32", 0}}) {
         EXPECT_TRUE(waitUntil([&, from = folder, expected = used] { return commandsFor(*menu, from) == expected; }))
             << "with the manifest loaded";
         HPROPSHEETPAGE page = nullptr;
