@@ -10,6 +10,7 @@
 
 #include "core/Boundary.h"
 #include "core/LogLine.h"
+#include "core/ScopeGuard.h"
 #include "tests/support/LogCapture.h"
 #include "tests/support/Registry.h"
 
@@ -28,12 +29,9 @@ std::string contentOf(const std::wstring& path)
 }
 
 struct Log : testing::Test {
-    ~Log() override
-    {
-        closeLog();
-    }
     test::InstalledService service;
     const std::wstring path = service.file(L"tavi.log");
+    const ScopeGuard<void (*)() noexcept> closing{closeLog};
 };
 
 TEST_F(Log, LinesAreInTheFileAtOnceInOneEncoding)

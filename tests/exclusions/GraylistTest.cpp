@@ -50,10 +50,9 @@ TEST_F(Graylists, HoldTheSystemsPlacesAndTheUsersUnlessSwitchedOff)
     for (const bool keeps : {true, false}) {
         settingsKey().SetValue(L"options.graylist", long{keeps});
         getGraylist(true)->Release();
-        for (const wxString& place :
-             {wxString(L"C:\\windows\\Temp\\x"), wxString(L"C:\\served"), wxString(L"C:\\two.sys"),
-              wxString(L"C:\\scratch\\x"), wxString(L"C:\\windows\\$tavi\\x")})
-            EXPECT_TRUE(isGrayed(place)) << place.utf8_string();
+        for (const wchar_t* const place :
+             {L"C:\\windows\\Temp\\x", L"C:\\served", L"C:\\two.sys", L"C:\\scratch\\x", L"C:\\windows\\$tavi\\x"})
+            EXPECT_TRUE(isGrayed(place)) << place;
         EXPECT_EQ(isGrayed(L"C:\\windows\\notepad.exe"), !keeps);
         EXPECT_EQ(isGrayed(here), !keeps);
         EXPECT_FALSE(isGrayed(L"C:\\users"));
