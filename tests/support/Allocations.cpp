@@ -14,13 +14,6 @@ void* __wrap_calloc(std::size_t count, std::size_t size)
 {
     return FailingAllocations::fails(Heap::c, count * size) ? nullptr : __real_calloc(count, size);
 }
-void __real_free(void* block);
-void __wrap_free(void* block)
-{
-    const void* freed = block;
-    FailingAllocations::watched.compare_exchange_strong(freed, nullptr);
-    __real_free(block);
-}
 // An exception gets its memory. The C++ runtime has a reserve for it, but behind a lock that it allocates, too.
 void* __real___cxa_allocate_exception(std::size_t size) noexcept;
 void* __wrap___cxa_allocate_exception(std::size_t size) noexcept

@@ -40,8 +40,6 @@ class FailingAllocations {
             thread_ = own;
         return block;
     }
-    // The heap sets it to null when this block is freed.
-    static inline std::atomic<const void*> watched{nullptr};
 
   private:
     static inline std::atomic<DWORD> thread_{0};
