@@ -39,6 +39,15 @@ std::atomic<IMalloc*> theShellAllocator{nullptr};
 BackgroundThread statusThread("status listener",
                               [](const BackgroundThread& self) { listenToStatus([&] { return self.isStopping(); }); });
 
+// Makes the C++ runtime allocate what the first exception of a process needs: that one may say that no memory is left.
+void prepareExceptions() noexcept
+{
+    try {
+        throw 0;
+    } catch (...) {
+    }
+}
+
 void acquireShellAllocator() noexcept
 {
     IMalloc* allocator = nullptr;
@@ -77,6 +86,7 @@ HostKind hostKindOf(const wchar_t* executablePath) noexcept
 
 void attachToFileManager(HINSTANCE instance, const wchar_t* hostPath)
 {
+    prepareExceptions();
     // Memory that runs out here costs the log only. No later step throws.
     guarded("log", [] { openLog(kLogLevel); });
     logInfo(L"Attaching to %ls", hostPath);

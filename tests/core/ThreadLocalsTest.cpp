@@ -37,7 +37,7 @@ TEST(ThreadLocals, ExistInAThreadWithoutMemory)
 {
     for (int i = 0; i < 20; ++i) {
         std::thread([] {
-            const tavi::test::FailingAllocations all(0);
+            const tavi::test::FailingAllocations all(0, tavi::test::Heap::zeroed);
             EXPECT_EQ(++counted, 8);
         }).join();
     }

@@ -12,7 +12,7 @@ void* __wrap_malloc(std::size_t size)
 void* __real_calloc(std::size_t count, std::size_t size);
 void* __wrap_calloc(std::size_t count, std::size_t size)
 {
-    return FailingAllocations::fails(Heap::c, count * size) ? nullptr : __real_calloc(count, size);
+    return FailingAllocations::fails(Heap::zeroed, count * size) ? nullptr : __real_calloc(count, size);
 }
 // An exception gets its memory. The C++ runtime has a reserve for it, but behind a lock that it allocates, too.
 void* __real___cxa_allocate_exception(std::size_t size) noexcept;

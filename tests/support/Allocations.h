@@ -7,10 +7,10 @@
 
 namespace tavi::test {
 
-enum class Heap { c, sqlite };
+enum class Heap { c, zeroed, sqlite };
 
 // During its lifetime `failing` allocations of its thread from one heap, of at least `smallest` bytes each, fail after
-// `succeeding` ones that succeed. The C heap serves operator new, too.
+// `succeeding` ones that succeed. The C heap serves operator new, too; `zeroed` is its calloc.
 class FailingAllocations {
   public:
     explicit FailingAllocations(int succeeding, Heap heap = Heap::c, int failing = 1 << 30, std::size_t smallest = 0)
