@@ -1,5 +1,5 @@
-# Generates what src/ui/tavishell.rc includes: the version, the manifest, and one file per icon, rendered from its SVG drawing in
-# every size that Windows asks for.
+# Generates what src/ui/tavishell.rc includes: the version, the manifest, the message catalogues, and one file per icon, rendered from
+# its SVG drawing in every size that Windows asks for.
 find_program(RSVG_CONVERT rsvg-convert REQUIRED)
 find_program(ICOTOOL icotool REQUIRED)
 
@@ -46,5 +46,27 @@ foreach(source IN LISTS icon_sources)
         DEPENDS ${depends} VERBATIM)
     list(APPEND resource_files ${icon})
 endforeach()
-add_custom_target(tavi_resources DEPENDS ${resource_files})
+
+# Each catalogue po/LANGUAGE.po becomes a resource. The tests alone get a pseudo language as well, once as a language that is read from
+# right to left.
+find_program(MSGFMT msgfmt REQUIRED)
+file(GLOB catalogues CONFIGURE_DEPENDS po/*.po)
+set(catalogue_list)
+foreach(source IN LISTS catalogues)
+    cmake_path(GET source STEM name)
+    set(binary ${resource_folder}/${name}.mo)
+    add_custom_command(OUTPUT ${binary} COMMAND ${MSGFMT} --no-hash -o ${binary} ${source} DEPENDS ${source} VERBATIM)
+    list(APPEND resource_files ${binary})
+    string(APPEND catalogue_list "tavi_${name} MOFILE \"${name}.mo\"\n")
+endforeach()
+file(CONFIGURE OUTPUT ${resource_folder}/catalogues.rc CONTENT "${catalogue_list}" @ONLY)
+list(APPEND resource_files ${resource_folder}/catalogues.rc)
+set(pseudo_catalogue ${resource_folder}/pseudo.mo)
+add_custom_command(OUTPUT ${pseudo_catalogue}
+    COMMAND ${CMAKE_SOURCE_DIR}/scripts/messages --pseudo ${pseudo_catalogue}
+    DEPENDS docs/tavishell.pot scripts/messages VERBATIM)
+file(CONFIGURE OUTPUT ${resource_folder}/pseudo.rc
+    CONTENT "tavi_qps MOFILE \"pseudo.mo\"\ntavi_he MOFILE \"pseudo.mo\"\n" @ONLY)
+
+add_custom_target(tavi_resources DEPENDS ${resource_files} ${pseudo_catalogue})
 add_dependencies(tavi_resources tavi_version)

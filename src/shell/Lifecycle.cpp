@@ -16,6 +16,7 @@
 #include "manifest/CurrentManifest.h"
 #include "statedb/Database.h"
 #include "ui/MenuBitmap.h"
+#include "ui/Translations.h"
 
 namespace tavi {
 namespace {
@@ -112,6 +113,7 @@ void detachFromFileManager(bool processEnds)
     dropGraylist();
     statusThread.requestStop();
     stopStatusThread();
+    freeTranslations();
     shutDownDatabaseLibrary();
     closeLog();
 }

@@ -13,6 +13,7 @@
 #include "ui/ActivationScope.h"
 #include "ui/MenuBitmap.h"
 #include "ui/resource.h"
+#include "ui/Translations.h"
 #include "ui/VersionsWindow.h"
 
 namespace tavi {
@@ -118,6 +119,7 @@ UINT insertMenuItems(HMENU menu, UINT indexMenu, UINT idCmdFirst, UINT flags, co
     if (flags & (CMF_DEFAULTONLY | CMF_NOVERBS))
         return 0;
 
+    loadTranslations();
     const ActivationScope activation;
     // Also for a selection without versions: the menu keeps its groups, whatever the backup holds.
     InsertMenuW(menu, indexMenu, MF_BYPOSITION | MF_SEPARATOR, 0, nullptr);
@@ -137,6 +139,7 @@ HRESULT commandString(UINT_PTR offset, UINT type, LPSTR buffer, UINT size, const
 {
     if (offset >= std::size(kCommands))
         return E_INVALIDARG;
+    loadTranslations();
     const Command& command = kCommands[offset];
     std::wstring text;
     switch (type) {

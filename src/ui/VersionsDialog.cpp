@@ -20,6 +20,7 @@
 #include "ui/LocalePattern.h"
 #include "ui/resource.h"
 #include "ui/RestoreProgressWindow.h"
+#include "ui/Translations.h"
 
 namespace tavi {
 namespace {
@@ -71,6 +72,7 @@ wxString shortenMiddle(const wxString& name, std::size_t kept)
 VersionsDialog::VersionsDialog(Selection selection, ManifestRef manifest)
     : paths_(std::move(selection.paths)), coverage_(selection.restoreMode), manifest_(std::move(manifest))
 {
+    loadTranslations();
     if (paths_.size() == 1 && !selection.hasFolder)
         singleFile_ = *paths_.begin();
 }

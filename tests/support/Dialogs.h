@@ -10,6 +10,7 @@
 #include "manifest/CurrentManifest.h"
 #include "tests/support/LogCapture.h"
 #include "tests/support/Registry.h"
+#include "ui/Translations.h"
 
 // The tests drive this process's dialogs from another thread, by the messages that a user's actions cause.
 namespace tavi::test {
@@ -68,6 +69,7 @@ struct UiTest : testing::Test {
     {
         stopManifestWatcher();
         waitForThreads();
+        freeTranslations();
     }
     wxString in(const wxString& name) const
     {
