@@ -4,6 +4,7 @@
 #include <atomic>
 #include <memory>
 #include <utility>
+#include <vector>
 
 #include <objbase.h>
 #include <wx/intl.h>
@@ -15,7 +16,9 @@
 #include "core/Module.h"
 #include "core/Utf8.h"
 #include "ui/ActivationScope.h"
+#include "ui/DialogLayout.h"
 #include "ui/resource.h"
+#include "ui/Translations.h"
 #include "ui/VersionsDialog.h"
 
 namespace tavi {
@@ -32,6 +35,8 @@ struct Page {
     const ModuleLock lock;
     VersionsDialog dialog;
     const wxString title;
+    // The sheet's until it has created the page.
+    std::vector<std::uint32_t> layout = dialogTemplate(TAVI_DIALOG_VERSIONS);
 };
 // The page description owns a reference until the sheet releases the page, shown or not. Each frame of the page's
 // procedure has another: the sheet may be destroyed in the message loop of a box that the frame has opened.
@@ -104,6 +109,10 @@ void addPropertyPage(const Selection& selection, ManifestRef manifest, LPFNADDPR
     description.dwFlags = PSP_USETITLE | PSP_USEREFPARENT | PSP_USECALLBACK;
     description.hInstance = moduleInstance();
     description.pszTemplate = MAKEINTRESOURCEW(TAVI_DIALOG_VERSIONS);
+    if (isRightToLeft()) {
+        description.dwFlags |= PSP_DLGINDIRECT;
+        description.pResource = reinterpret_cast<LPCDLGTEMPLATEW>((*page)->layout.data());
+    }
     description.pszTitle = (*page)->title.wc_str();
     description.pfnDlgProc = pageProcedure;
     description.lParam = reinterpret_cast<LPARAM>(page.get());

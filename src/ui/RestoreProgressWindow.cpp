@@ -17,7 +17,9 @@
 #include "link/CommandPipe.h"
 #include "link/StatusListener.h"
 #include "ui/ActivationScope.h"
+#include "ui/DialogLayout.h"
 #include "ui/resource.h"
+#include "ui/Translations.h"
 #include "ui/WindowFrame.h"
 
 namespace tavi {
@@ -55,8 +57,9 @@ void runProgressWindow(void* argument)
     const std::unique_ptr<const WindowReference> window(static_cast<const WindowReference*>(argument));
     ++moduleRefCount();
     const ActivationScope activation;
-    const HWND dialog = CreateDialogParamW(moduleInstance(), MAKEINTRESOURCEW(TAVI_DIALOG_PROGRESS), nullptr,
-                                           progressProcedure, reinterpret_cast<LPARAM>(window->get()));
+    const auto layout = dialogTemplate(TAVI_DIALOG_PROGRESS);
+    const HWND dialog = CreateDialogIndirectParamW(moduleInstance(), reinterpret_cast<LPCDLGTEMPLATEW>(layout.data()),
+                                                   nullptr, progressProcedure, reinterpret_cast<LPARAM>(window->get()));
     if (!dialog) {
         // The count stays raised: the window stays registered for its restores and needs the module's code.
         logError(L"Unable to create the progress window (%lu)", GetLastError());
@@ -158,6 +161,14 @@ void RestoreProgressWindow::initialize(HWND window)
     SetWindowTextW(window, _("Restoring...").wc_str());
     SetDlgItemTextW(window, TAVI_PROGRESS_CLOSE, _("C&lose").wc_str());
     SetDlgItemTextW(window, TAVI_PROGRESS_CANCEL, _("&Cancel").wc_str());
+    if (isTranslated()) {
+        fitButtons(window, {TAVI_PROGRESS_CANCEL, TAVI_PROGRESS_CLOSE});
+        extendLabel(window, TAVI_PROGRESS_REMAINING, TAVI_PROGRESS_CLOSE);
+        // The widest rate of each unit.
+        fitLabel(window, TAVI_PROGRESS_SPEED,
+                 {formatRate(1023), formatRate((1u << 20) - 1), formatRate((1u << 30) - 1), formatRate(~0u)});
+        extendLabel(window, TAVI_PROGRESS_STATUS, TAVI_PROGRESS_SPEED);
+    }
     setWindowIcons(window);
     placeWindow(window, nullptr);
 }

@@ -17,6 +17,7 @@
 #include "restore/RestoreRequest.h"
 #include "ui/ActivationScope.h"
 #include "ui/CopyTarget.h"
+#include "ui/DialogLayout.h"
 #include "ui/LocalePattern.h"
 #include "ui/resource.h"
 #include "ui/RestoreProgressWindow.h"
@@ -131,6 +132,10 @@ void VersionsDialog::setTexts()
             _("The following versions of some of the items you selected are backed up on the Tavi servers.  You can "
               "select one and restore the available files, or copy them to a different location.");
     SetDlgItemTextW(window_, TAVI_VERSIONS_MESSAGE, message.wc_str());
+    if (!isTranslated())
+        return;
+    fitMessage(window_, TAVI_VERSIONS_MESSAGE, TAVI_VERSIONS_LABEL, TAVI_VERSIONS_LIST);
+    fitButtons(window_, {IDCANCEL, TAVI_VERSIONS_RESTORE, TAVI_VERSIONS_COPY_TO, TAVI_VERSIONS_VIEW});
 }
 
 wxString VersionsDialog::fitName(const wxString& text, const wxString& name) const
@@ -138,18 +143,10 @@ wxString VersionsDialog::fitName(const wxString& text, const wxString& name) con
     const HWND control = GetDlgItem(window_, TAVI_VERSIONS_MESSAGE);
     RECT room{};
     GetClientRect(control, &room);
-    const ScreenDc dc(GetDC(nullptr));
-    const auto font = reinterpret_cast<HGDIOBJ>(SendMessageW(control, WM_GETFONT, 0, 0));
-    const HGDIOBJ previous = font ? SelectObject(dc.get(), font) : nullptr;
-    const ScopeGuard deselect([&] {
-        if (previous)
-            SelectObject(dc.get(), previous);
-    });
+    const TextRuler ruler(control);
     const auto fits = [&](std::size_t kept) {
-        const wxString whole = withName(text, shortenMiddle(name, kept));
-        RECT needed = room;
-        DrawTextW(dc.get(), whole.wc_str(), -1, &needed, DT_CALCRECT | DT_WORDBREAK | DT_NOPREFIX);
-        return needed.right <= room.right && needed.bottom <= room.bottom;
+        const SIZE needed = ruler.measure(withName(text, shortenMiddle(name, kept)), room.right, DT_NOPREFIX);
+        return needed.cx <= room.right && needed.cy <= room.bottom;
     };
     // A binary search for the most characters with which the text still fits.
     std::size_t kept = name.length();
@@ -251,7 +248,9 @@ bool VersionsDialog::runCommand(UINT id)
 
 std::optional<bool> VersionsDialog::askOverwrite(const wxString& question, UINT icon) const
 {
-    const int answer = MessageBoxW(window_, question.wc_str(), _("Tavi Remote Backup").wc_str(), MB_YESNOCANCEL | icon);
+    const UINT direction = isRightToLeft() ? MB_RTLREADING | MB_RIGHT : 0;
+    const int answer =
+        MessageBoxW(window_, question.wc_str(), _("Tavi Remote Backup").wc_str(), MB_YESNOCANCEL | icon | direction);
     if (answer != IDYES && answer != IDNO)
         return std::nullopt;
     return answer == IDYES;

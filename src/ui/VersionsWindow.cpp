@@ -12,6 +12,7 @@
 #include "core/Module.h"
 #include "core/ModuleThread.h"
 #include "ui/ActivationScope.h"
+#include "ui/DialogLayout.h"
 #include "ui/resource.h"
 #include "ui/VersionsDialog.h"
 #include "ui/WindowFrame.h"
@@ -80,9 +81,11 @@ void runVersionsWindow(void* argument)
     const OleScope ole;
     const ActivationScope activation;
     VersionsDialog dialog(std::move(start->selection), std::move(start->manifest));
+    const auto layout = dialogTemplate(TAVI_DIALOG_VERSIONS);
     // No owner: Windows would join the input queues of this thread and the owner's.
-    const WindowHandle window(CreateDialogParamW(moduleInstance(), MAKEINTRESOURCEW(TAVI_DIALOG_VERSIONS), nullptr,
-                                                 windowProcedure, reinterpret_cast<LPARAM>(&dialog)));
+    const WindowHandle window(CreateDialogIndirectParamW(moduleInstance(),
+                                                         reinterpret_cast<LPCDLGTEMPLATEW>(layout.data()), nullptr,
+                                                         windowProcedure, reinterpret_cast<LPARAM>(&dialog)));
     if (!window) {
         logError(L"Unable to create the versions dialog (%lu)", GetLastError());
         return;
