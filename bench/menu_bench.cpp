@@ -17,6 +17,7 @@
 #include "tests/support/Registry.h"
 #include "ui/ContextMenu.h"
 #include "ui/Selection.h"
+#include "ui/Translations.h"
 
 namespace tavi::bench {
 namespace {
@@ -131,16 +132,35 @@ void runMenu(Bench& bench)
         insertMenuItems(menu, 0, 1, CMF_NORMAL, selection);
         DestroyMenu(menu);
     };
+    const auto shortMenu = [&] {
+        const HMENU menu = CreatePopupMenu();
+        insertMenuItems(menu, 0, 1, CMF_NORMAL, {{}, {}, Coverage::all, false, {}});
+        DestroyMenu(menu);
+    };
     const auto collectSome = [&] { collectPaths(nullptr, some.get(), GetDriveTypeW); };
     const auto collectMany = [&] { all = collectPaths(nullptr, many.get(), GetDriveTypeW).size(); };
     const auto times = leastProcessorSeconds(bench.repetitions, {requiredCalls, menuQuery, collectSome, collectMany});
+    double inEnglish = kNoBound, inGerman = kNoBound;
+    const auto leastIn = [&](const wchar_t* language, double& least) {
+        freeTranslations();
+        loadTranslations({language});
+        least = std::min(least, leastProcessorSeconds(1, {shortMenu})[0]);
+    };
+    for (int i = 0; i < bench.repetitions; ++i) {
+        leastIn(L"en", inEnglish);
+        leastIn(L"de", inGerman);
+    }
     sqlite3_finalize(query);
     sqlite3_close(database);
+    if (!isTranslated())
+        throw std::runtime_error("no German texts");
     if (found != kFiles || selected != kFiles || all != kManyItems)
         throw std::runtime_error("files are missing from the selection");
     bench.report("menu query / required calls, 10000 files", times[1] / times[0], 1.6, "x");
     bench.report("an item of 70000 / an item of 10000", times[3] / times[2] * kFiles / kManyItems, 1.3, "x");
+    bench.report("a menu in German / a menu in English", inGerman / inEnglish, 1.2, "x");
     bench.report("menu query, 10000 files", times[1] * 1e3, kNoBound, "ms");
+    freeTranslations();
     stopManifestWatcher();
     for (int polls = 0; polls < 500 && isWatcherActive(); ++polls)
         Sleep(10);
