@@ -1,10 +1,12 @@
-"""scripts/demo [--64] [--stay]: shows the module from start to end with real mouse and key input.
+"""scripts/demo [--64] [--language LANGUAGE] [--stay]: shows the module from start to end with real mouse and key input.
 
 Installation, menus, dialogs, restores, a copy, the progress window with a service that dies, a cancel, and
 the removal. Leaves a picture of each step in build/demo/; fails if a menu, a dialog or a restored file is not as expected.
-  --64    shows the 64-bit file manager on a 64-bit Windows; its pictures are in build/x86_64/demo/
-  --stay  leaves the file manager open afterwards"""
+  --64        shows the 64-bit file manager on a 64-bit Windows; its pictures are in build/x86_64/demo/
+  --language  shows the module to a user of that language, for example de, with pictures in build/demo-de/
+  --stay      leaves the file manager open afterwards"""
 import argparse
+import gettext
 import os
 import re
 import shutil
@@ -17,6 +19,9 @@ from session import MODULE_CLASS, VERSION, Failure, Session, build, build_of, ma
 LIMIT_S = 120
 LIMIT_MS = 1000 * LIMIT_S
 DAY_S = 86400
+# Of each language: the locale of its user, and how that shows a time.
+LANGUAGES = {"en": ("C", "%m/%d/%Y %I:%M %p"), "de": ("de_DE", "%d.%m.%Y %H:%M")}
+YES, NO = 6, 7
 TODAY = int(time.time()) // DAY_S * DAY_S + DAY_S * 3 // 4
 RUNS = [TODAY - days * DAY_S for days in (21, 14, 7)]
 # Before which run, how many seconds before it: file, text, lines.
@@ -52,10 +57,6 @@ def expect(what, expected, found):
     else:
         failures.append(what)
         print(f"  NOT AS EXPECTED: {what}\n    expected:\n{expected}\n    found:\n{found}")
-
-
-def shown(moment):
-    return time.strftime("%m/%d/%Y %I:%M %p", time.localtime(moment))
 
 
 def content(path):
@@ -108,8 +109,21 @@ class Screen:
 
 
 class Demo:
-    def __init__(self, session, screen, package):
+    def __init__(self, session, screen, package, language):
         self.session, self.screen, self.package = session, screen, package
+        locale, self.time_format = LANGUAGES[language]
+        self.texts = gettext.NullTranslations()
+        if language != "en":
+            # Without such a locale on this machine, Wine would take names for ASCII.
+            locales = build / "locales"
+            if not (locales / f"{locale}.UTF-8").exists():
+                locales.mkdir(exist_ok=True)
+                subprocess.run(["localedef", "-i", locale, "-f", "UTF-8", str(locales / f"{locale}.UTF-8")], check=True)
+            session.environment |= {"LOCPATH": str(locales), "TAVISHELL_LOCALE": f"{locale}.UTF-8"}
+            with open(session.folder / f"resources/{language}.mo", "rb") as catalogue:
+                self.texts = gettext.GNUTranslations(catalogue)
+        self.text = self.texts.gettext
+        self.dialog, self.progress, self.question = map(self.text, ("Restore Files", "Restoring...", "Tavi Remote Backup"))
         self.documents = session.drive / "users/demo/Documents"
         self.data = session.drive / "ProgramData/Tavi/data"
         self.installed = session.drive / "Program Files/Tavi/tavishell.dll"
@@ -206,6 +220,13 @@ class Demo:
     def click(self, control):
         self.screen.click(self.order(f"where {control}"))
 
+    def shown(self, moment):
+        return time.strftime(self.time_format, time.localtime(moment))
+
+    def key(self, text):
+        """Returns the key of a button with that English text."""
+        return "alt+" + re.search("&(.)", self.text(text))[1].lower()
+
     def open_menu(self, place, command=""):
         """Opens a menu, highlights the command and returns the menu's lines. The list of backed-up files is read in the background:
         a menu that opens right after the module was loaded lacks the command."""
@@ -227,104 +248,111 @@ class Demo:
         self.screen.press("Escape")
         wait_for(LIMIT_S, "the end of the menu", lambda: self.screen.windows() <= self.windows)
 
-    def check_menu(self, picture, place, command="", help_text=""):
-        lines = [f'  {command} [bitmap] verb=TaviRestore help="{help_text}"'] if command else []
+    def check_menu(self, picture, place, command="", help_text="", name=""):
+        lines = []
+        if command:
+            command, help_text = self.text(command), self.text(help_text).replace("%s", name)
+            lines = [f'  {command} [bitmap] verb=TaviRestore help="{help_text}"']
         menu = self.open_menu(place, command)
-        expect(picture[3:], lines, [line for line in menu if "Restore" in line])
+        expect(picture[3:], lines, [line for line in menu if "verb=Tavi" in line])
         self.screen.picture(picture)
         self.close_menu()
 
     def open_dialog(self, name, command):
-        self.open_menu(self.place(name), command)
+        self.open_menu(self.place(name), self.text(command))
         self.screen.press("Return")
-        self.await_window("Restore Files")
-        show(self.order("text Restore Files | 1001"))
-        show(self.order("dump-list Restore Files | 1002"))
+        self.await_window(self.dialog)
+        show(self.order(f"text {self.dialog} | 1001"))
+        show(self.order(f"dump-list {self.dialog} | 1002"))
 
     def check_rows(self, title, *rows):
         """Compares the rows of the dialog; the last one is selected."""
         rows = "".join(f"\n{'*' if row == rows[-1] else ' '} {row}" for row in rows)
-        expect("the dialog's rows", f"  {title}{rows}", self.order("dump-list Restore Files | 1002"))
+        expect("the dialog's rows", f"  {title}{rows}", self.order(f"dump-list {self.dialog} | 1002"))
 
     def await_window(self, title):
         self.order(f"wait-window {title}")
         self.screen.focus(title)
 
-    def answer(self, key):
-        self.screen.press(key)
-        self.order("wait-closed Restore Files")
-        self.order("wait-window Restoring...")
+    def await_restore(self):
+        self.order(f"wait-closed {self.dialog}")
+        self.order(f"wait-window {self.progress}")
+
+    def answer(self, button):
+        self.await_window(self.question)
+        self.click(f"{self.question} | {button}")
+        self.await_restore()
 
     def close_progress(self, picture=None):
         """Closes the progress window while no service runs: the restore stays requested."""
-        expect("the progress window", "Waiting to begin restore...", self.order("text Restoring... | 1010"))
-        self.screen.focus("Restoring...")
+        expect("the progress window", self.text("Waiting to begin restore..."), self.order(f"text {self.progress} | 1010"))
+        self.screen.focus(self.progress)
         if picture:
             self.screen.picture(picture)
-        self.screen.press("alt+l")
-        self.order("wait-closed Restoring...")
+        self.screen.press(self.key("C&lose"))
+        self.order(f"wait-closed {self.progress}")
 
     def await_progress(self, control, text, picture):
-        self.order(f"wait-text Restoring... | {control} | {text}")
+        self.order(f"wait-text {self.progress} | {control} | {text}")
         self.screen.picture(picture, moving=True)
 
     # --- the chapters
 
     def menus(self):
-        one, two, folder = "Restore Previous Version", "Restore Previous Versions", "Restore Files in Folder"
-        self.check_menu("02-menu-of-a-file", self.place("Budget.txt"), one,
-                        "Restore an older version of Budget.txt from the Tavi servers.")
+        folder, folder_help = "Restore Files in Folder", "Restore files in %s from the Tavi servers."
+        self.check_menu("02-menu-of-a-file", self.place("Budget.txt"), "Restore Previous Version",
+                        "Restore an older version of %s from the Tavi servers.", "Budget.txt")
         self.check_menu("03-menu-of-a-new-file", self.place("Scratch.txt"))
         self.screen.click(self.place("Budget.txt"))
         self.screen.tool("xdotool", "keydown", "ctrl")
         self.screen.click(self.place("Résumé.txt"))
         self.screen.tool("xdotool", "keyup", "ctrl")
-        self.check_menu("04-menu-of-two-files", self.place("Résumé.txt"), two, "Restore older versions of the selected files.")
-        self.check_menu("05-menu-of-a-folder", self.place("Reports"), folder, "Restore files in Reports from the Tavi servers.")
-        self.check_menu("06-menu-of-the-background", self.order("where . | 1000"), folder,
-                        "Restore files in Documents from the Tavi servers.")
+        self.check_menu("04-menu-of-two-files", self.place("Résumé.txt"), "Restore Previous Versions",
+                        "Restore older versions of the selected files.")
+        self.check_menu("05-menu-of-a-folder", self.place("Reports"), folder, folder_help, "Reports")
+        self.check_menu("06-menu-of-the-background", self.order("where . | 1000"), folder, folder_help, "Documents")
 
     def requests(self):
-        times = [shown(moment) for moment in RUNS]
+        times = [self.shown(moment) for moment in RUNS]
         chapter("one file, restored in place")
         self.open_dialog("Budget.txt", "Restore Previous Version")
         versions = [files["Budget.txt"] for files in self.versions]
-        self.check_rows("Backup Time\tModified Time\tFile Size",
-                        *(f"{at}\t{shown(modified)}\t{len(text) / 1024:.1f} KB" for at, (text, modified) in zip(times, versions)))
+        self.check_rows("\t".join(map(self.text, ("Backup Time", "Modified Time", "File Size"))),
+                        *(f"{at}\t{self.shown(modified)}\t{len(data) / 1024:.1f} {self.text('KB')}"
+                          for at, (data, modified) in zip(times, versions)))
         self.screen.picture("07-versions-of-a-file")
-        self.click("Restore Files | 1002 | 1")
-        self.click("Restore Files | 1003")
-        self.await_window("Tavi Remote Backup")
+        self.click(f"{self.dialog} | 1002 | 1")
+        self.click(f"{self.dialog} | 1003")
+        self.await_window(self.question)
         self.screen.picture("08-question")
-        self.answer("alt+y")
+        self.answer(YES)
         self.close_progress("09-waiting")
 
         chapter("one file, copied elsewhere")
         self.open_dialog("Résumé.txt", "Restore Previous Version")
-        self.click("Restore Files | 1002 | 0")
-        self.screen.press("alt+c")
-        self.await_window("Restore File As")
+        self.click(f"{self.dialog} | 1002 | 0")
+        self.screen.press(self.key("&Copy To..."))
+        self.await_window(self.text("Restore File As"))
         self.screen.press("ctrl+a")
         self.screen.tool("xdotool", "type", "--clearmodifiers", r"C:\users\demo\Desktop\Resume of last month.txt")
         self.screen.picture("10-copy-to")
-        self.answer("Return")
+        self.screen.press("Return")
+        self.await_restore()
         self.close_progress()
 
         chapter("a folder, restored as it was at the first run")
         self.open_dialog("Reports", "Restore Files in Folder")
-        self.check_rows("Backup Time", *times)
+        self.check_rows(self.text("Backup Time"), *times)
         self.screen.press("Home")
         self.screen.picture("11-versions-of-a-folder")
-        self.screen.press("alt+r")
-        self.await_window("Tavi Remote Backup")
-        self.answer("alt+n")
+        self.screen.press(self.key("&Restore"))
+        self.answer(NO)
         self.close_progress()
 
     def request_photos(self):
         self.open_dialog(LAKE, "Restore Files in Folder")
-        self.screen.press("alt+r")
-        self.await_window("Tavi Remote Backup")
-        self.answer("alt+y")
+        self.screen.press(self.key("&Restore"))
+        self.answer(YES)
 
     def photos(self):
         return [photo for photo in PHOTOS if (self.documents / photo).exists()]
@@ -346,11 +374,11 @@ class Demo:
         chapter("a large restore")
         service = self.session.start_service(1000000, 15000)
         self.request_photos()
-        self.await_progress(1010, "Finding", "12-search")
-        self.await_progress(1013, "Mb/s", "13-speed")
-        self.await_progress(1011, "second", "14-time-left")
+        self.await_progress(1010, self.text("Finding file on server..."), "12-search")
+        self.await_progress(1013, f"{self.text('Mb')}/s", "13-speed")
+        self.await_progress(1011, self.texts.ngettext("%lu second", "%lu seconds", 2).split()[1], "14-time-left")
         service.order("rate 0")
-        self.order("wait-closed Restoring...")
+        self.order(f"wait-closed {self.progress}")
         for photo in PHOTOS:
             self.check_restored(photo, f"Documents/{photo}", 2)
             (self.documents / photo).unlink()
@@ -361,11 +389,11 @@ class Demo:
         wait_for(LIMIT_S, "the first photo", self.photos)
         service.order("rate 1")
         service.kill()
-        self.await_progress(1013, "0.0 b/s", "15-service-gone")
+        self.await_progress(1013, f"0.0 {self.text('b')}/s", "15-service-gone")
         service = self.session.start_service(0, 1000 * LIMIT_S)
-        self.await_progress(1010, "Finding", "16-service-back")
-        self.click("Restoring... | 2")
-        self.order("wait-closed Restoring...")
+        self.await_progress(1010, self.text("Finding file on server..."), "16-service-back")
+        self.click(f"{self.progress} | 2")
+        self.order(f"wait-closed {self.progress}")
         service.await_output(LIMIT_S, "^restore [0-9]*: cancelled")
         expect("some photos are there, some are not", True, 0 < len(self.photos()) < len(PHOTOS))
         for photo in self.photos():
@@ -406,8 +434,9 @@ class Demo:
 
 
 def main():
-    parser = argparse.ArgumentParser(usage="scripts/demo [--64] [--stay]")
+    parser = argparse.ArgumentParser(usage="scripts/demo [--64] [--language LANGUAGE] [--stay]")
     parser.add_argument("--64", dest="arch", action="store_const", const="x86_64", default="i686")
+    parser.add_argument("--language", choices=LANGUAGES, default="en")
     parser.add_argument("--stay", action="store_true")
     options = parser.parse_args()
     word_size = {"i686": "x86", "x86_64": "x64"}[options.arch]
@@ -418,9 +447,10 @@ def main():
     make("", "package", word_size)
     os.environ["TAVISHELL_SCREEN"] = "1"
     folder = build_of(options.arch)
-    with Session(folder / "demo-prefix", folder / "demo", options.arch) as session:
+    name = "demo" if options.language == "en" else f"demo-{options.language}"
+    with Session(folder / f"{name}-prefix", folder / name, options.arch) as session:
         screen = Screen(session)
-        demo = Demo(session, screen, build / f"tavishell-{VERSION}-{word_size}.msi")
+        demo = Demo(session, screen, build / f"tavishell-{VERSION}-{word_size}.msi", options.language)
         try:
             demo.play()
             if options.stay:
