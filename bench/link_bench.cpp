@@ -9,13 +9,13 @@
 #include <wx/datetime.h>
 
 #include "bench/Bench.h"
+#include "bench/InstalledService.h"
 #include "core/Handles.h"
 #include "core/Options.h"
 #include "link/MessageReader.h"
 #include "link/PipeIo.h"
 #include "link/StatusListener.h"
 #include "manifest/ManifestWatcher.h"
-#include "tests/support/Registry.h"
 
 namespace tavi::bench {
 namespace {

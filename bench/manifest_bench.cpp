@@ -7,11 +7,11 @@
 #include <zlib.h>
 
 #include "bench/Bench.h"
+#include "bench/InstalledService.h"
 #include "bench/ManifestGenerator.h"
 #include "core/Utf8.h"
 #include "manifest/ManifestWatcher.h"
 #include "manifest/StoredManifest.h"
-#include "tests/support/Registry.h"
 
 namespace tavi::bench {
 namespace {

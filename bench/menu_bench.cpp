@@ -9,12 +9,12 @@
 #include <sqlite3.h>
 
 #include "bench/Bench.h"
+#include "bench/InstalledService.h"
 #include "core/Handles.h"
 #include "core/Module.h"
 #include "core/ScopeGuard.h"
 #include "manifest/CurrentManifest.h"
 #include "statedb/StateLookups.h"
-#include "tests/support/Registry.h"
 #include "ui/ContextMenu.h"
 #include "ui/Selection.h"
 #include "ui/Translations.h"

@@ -1,9 +1,9 @@
 #include <stdexcept>
 
 #include "bench/Bench.h"
+#include "bench/InstalledService.h"
 #include "bench/ManifestGenerator.h"
 #include "restore/RestoreRequest.h"
-#include "tests/support/Registry.h"
 
 namespace tavi::bench {
 namespace {
