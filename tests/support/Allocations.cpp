@@ -3,6 +3,7 @@
 using namespace tavi::test;
 
 // The linker redirects the calls of the whole program here, also those of operator new and of the libraries.
+// NOLINTBEGIN(readability-identifier-naming): the linker makes these names.
 extern "C" {
 void* __real_malloc(std::size_t size);
 void* __wrap_malloc(std::size_t size)
@@ -21,3 +22,4 @@ void* __wrap___cxa_allocate_exception(std::size_t size) noexcept
     return FailingAllocations::exempt([=] { return __real___cxa_allocate_exception(size); });
 }
 }
+// NOLINTEND(readability-identifier-naming)

@@ -3,6 +3,7 @@
 #include <fstream>
 #include <functional>
 
+#include <windows.h>
 #include <prsht.h>
 #include <gtest/gtest.h>
 
