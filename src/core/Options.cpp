@@ -32,7 +32,11 @@ std::optional<std::int64_t> readManifestTime()
     }
     wxDateTime time;
     wxString::const_iterator end;
-    if (!time.ParseDateTime(text, &end) || !time.IsValid())
+    // The service's own form first: to look for words such as "today", ParseDateTime translates them, in tables of
+    // wxWidgets that end the host without memory.
+    if (!time.ParseISOCombined(text, L' ') && !time.ParseDateTime(text, &end))
+        return std::nullopt;
+    if (!time.IsValid())
         return std::nullopt;
     return time.GetValue().GetValue();
 }

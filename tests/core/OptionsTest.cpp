@@ -40,10 +40,13 @@ TEST_F(Options, AndPathsAreReadOrGivenUpWhereMemoryRunsOut)
     std::optional<std::int64_t> time;
     wxString path;
     ASSERT_TRUE(openLog(3)); // whose lines need no memory
-    for (int succeeding = 0; path.empty() && succeeding < 1000; ++succeeding) {
-        const test::FailingAllocations few(succeeding);
-        guarded("time", [&] { time = readManifestTime(); });
-        guarded("path", [&] { path = getDataFilePath(DataFile::log); });
+    for (const test::Heap heap : {test::Heap::zeroed, test::Heap::c}) {
+        path.clear();
+        for (int succeeding = 0; path.empty() && succeeding < 1000; ++succeeding) {
+            const test::FailingAllocations few(succeeding, heap);
+            guarded("time", [&] { time = readManifestTime(); });
+            guarded("path", [&] { path = getDataFilePath(DataFile::log); });
+        }
     }
     closeLog();
     EXPECT_EQ(time, 86401000);
