@@ -1,6 +1,7 @@
 #pragma once
 
 #include <filesystem>
+#include <stdexcept>
 #include <string>
 #include <string_view>
 
@@ -10,8 +11,10 @@
 #include <wx/string.h>
 #include <wx/msw/registry.h>
 // clang-format on
+#include <sqlite3.h>
 
 #include "core/InstallPaths.h"
+#include "core/Utf8.h"
 #include "statedb/Database.h"
 
 // The service's files and keys, for benchmarks and tests.
@@ -94,10 +97,17 @@ class InstalledService {
     // Stores a compressed manifest text.
     void storeManifest(std::string_view blob) const
     {
-        std::string hex;
-        for (const char byte : blob)
-            (hex += "0123456789ABCDEF"[byte >> 4 & 15]) += "0123456789ABCDEF"[byte & 15];
-        database(L"tavistate.dat").execDML(("INSERT INTO manifest VALUES(x'" + hex + "')").c_str());
+        sqlite3* database = nullptr;
+        sqlite3_stmt* insert = nullptr;
+        const bool stored =
+            sqlite3_open(toUtf8(file(L"tavistate.dat")).c_str(), &database) == SQLITE_OK &&
+            sqlite3_prepare_v2(database, "INSERT INTO manifest VALUES(?)", -1, &insert, nullptr) == SQLITE_OK &&
+            sqlite3_bind_blob(insert, 1, blob.data(), static_cast<int>(blob.size()), SQLITE_STATIC) == SQLITE_OK &&
+            sqlite3_step(insert) == SQLITE_DONE;
+        sqlite3_finalize(insert);
+        sqlite3_close(database);
+        if (!stored)
+            throw std::runtime_error("cannot store the manifest");
     }
 
   private:

@@ -82,14 +82,21 @@ struct TranslationsTest : UiTest {
     void expectEveryWindow() const
     {
         const ManifestRef manifest = Manifest::parse(L"FILES\nC:\\f\n5:5:5:5:0::0:0\n\nsimple.map\n4:1:1:1:0::0:0");
-        const Selection one{{L"C:\\f"}, {}, Coverage::all, false, L"f"}, several{{L"C:\\d"}, {}, {}, true, {}};
+        const Selection one{{L"C:\\f"}, {}, Coverage::all, false, L"f"}, several{{L"C:\\d"}, {}, Coverage{1}, true, {}};
         for (const Selection& selection : {one, several}) {
+            wchar_t text[100] = L"";
+            const HMENU menu = CreatePopupMenu();
+            insertMenuItems(menu, 0, 1, CMF_NORMAL, selection);
+            GetMenuStringW(menu, 1, text, 100, MF_BYPOSITION);
+            DestroyMenu(menu);
+            expectTranslated(text);
+            commandString(0, GCS_HELPTEXTW, reinterpret_cast<LPSTR>(text), 100, selection);
+            expectTranslated(text);
             for (const int button : {TAVI_VERSIONS_RESTORE, TAVI_VERSIONS_COPY_TO}) {
                 openVersionsWindow(selection, manifest, nullptr);
                 const HWND dialog = waitDialog(nullptr);
                 expectCaption(dialog);
                 expectLayout(dialog, TAVI_DIALOG_VERSIONS);
-                wchar_t text[50] = L"";
                 LVCOLUMNW column{LVCF_TEXT, 0, 0, text, 50, 0, 0, 0, 0, 0, 0};
                 ListView_GetColumn(GetDlgItem(dialog, TAVI_VERSIONS_LIST), 0, &column);
                 expectTranslated(text);
