@@ -116,7 +116,7 @@ ManifestRef loadSet(const std::string& file, std::uint32_t files)
 {
     std::vector<char> blob = readBlob(file);
     const BlobPieces pieces = piecesOf({blob.data(), blob.size()});
-    blob = {};
+    std::vector<char>().swap(blob); // an empty list would keep the memory
     return checked(parseStoredManifest(pieces), files);
 }
 
