@@ -16,7 +16,8 @@ namespace tavi {
 namespace {
 
 constexpr std::size_t kReadBytes = 64 * 1024;
-constexpr std::size_t kPieceBytes = 256 * 1024;
+// So large that the heap takes each piece from the system and returns it at once; with the heap's header, 1 MB.
+constexpr std::size_t kPieceBytes = 1024 * 1024 - 64;
 
 // The first bytes of a character that is cut in two.
 struct PartialSequence {

@@ -8,7 +8,7 @@
 
 namespace tavi {
 
-// A stored blob in pieces of at most 256 KB, none of them empty: the address space of a 32-bit host is fragmented.
+// A stored blob in pieces of less than 1 MB, none of them empty: the address space of a 32-bit host is fragmented.
 using BlobPieces = std::vector<std::string>;
 BlobPieces piecesOf(std::string_view blob);
 
