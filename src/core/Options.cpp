@@ -34,9 +34,7 @@ std::optional<std::int64_t> readManifestTime()
     wxString::const_iterator end;
     // The service's own form first: to look for words such as "today", ParseDateTime translates them, in tables of
     // wxWidgets that end the host without memory.
-    if (!time.ParseISOCombined(text, L' ') && !time.ParseDateTime(text, &end))
-        return std::nullopt;
-    if (!time.IsValid())
+    if ((!time.ParseISOCombined(text, L' ') && !time.ParseDateTime(text, &end)) || !time.IsValid())
         return std::nullopt;
     return time.GetValue().GetValue();
 }

@@ -18,7 +18,6 @@
 #include "ui/ActivationScope.h"
 #include "ui/DialogLayout.h"
 #include "ui/resource.h"
-#include "ui/Translations.h"
 #include "ui/VersionsDialog.h"
 
 namespace tavi {
@@ -106,13 +105,9 @@ void addPropertyPage(const Selection& selection, ManifestRef manifest, LPFNADDPR
     auto page = std::make_unique<PageReference>(std::make_shared<Page>(selection, std::move(manifest)));
     PROPSHEETPAGEW description{};
     description.dwSize = sizeof(description);
-    description.dwFlags = PSP_USETITLE | PSP_USEREFPARENT | PSP_USECALLBACK;
+    description.dwFlags = PSP_DLGINDIRECT | PSP_USETITLE | PSP_USEREFPARENT | PSP_USECALLBACK;
     description.hInstance = moduleInstance();
-    description.pszTemplate = MAKEINTRESOURCEW(TAVI_DIALOG_VERSIONS);
-    if (isRightToLeft()) {
-        description.dwFlags |= PSP_DLGINDIRECT;
-        description.pResource = reinterpret_cast<LPCDLGTEMPLATEW>((*page)->layout.data());
-    }
+    description.pResource = reinterpret_cast<LPCDLGTEMPLATEW>((*page)->layout.data());
     description.pszTitle = (*page)->title.wc_str();
     description.pfnDlgProc = pageProcedure;
     description.lParam = reinterpret_cast<LPARAM>(page.get());

@@ -35,12 +35,10 @@ TEST(ThreadLocals, BelongToTheirThreadAndAreFreedWithIt)
 
 TEST(ThreadLocals, ExistInAThreadWithoutMemory)
 {
-    for (int i = 0; i < 20; ++i) {
+    for (int i = 0; i < 20; ++i)
         std::thread([] {
-            const tavi::test::FailingAllocations all(0, tavi::test::Heap::zeroed);
-            EXPECT_EQ(++counted, 8);
+            EXPECT_EQ((tavi::test::FailingAllocations(0, tavi::test::Heap::zeroed), ++counted), 8);
         }).join();
-    }
 }
 
 TEST(ThreadLocals, StayWhileAnExceptionIsInFlight)
